@@ -1,0 +1,92 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <expected>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <sys/stat.h>
+
+#include "platform/value/Error.h"
+
+namespace platform {
+
+// An open descriptor that closes itself. Movable, owned by one.
+class UniqueFd {
+public:
+    UniqueFd() = default;
+
+    explicit UniqueFd(int fd) noexcept : fd_(fd) {}
+
+    UniqueFd(UniqueFd&& other) noexcept : fd_(other.release()) {}
+
+    UniqueFd& operator=(UniqueFd&& other) noexcept {
+        if (this != &other)
+            reset(other.release());
+        return *this;
+    }
+
+    ~UniqueFd() { reset(); }
+
+    [[nodiscard]] int get() const noexcept { return fd_; }
+
+    [[nodiscard]] explicit operator bool() const noexcept { return fd_ >= 0; }
+
+    [[nodiscard]] int release() noexcept {
+        const int fd = fd_;
+        fd_ = -1;
+        return fd;
+    }
+
+    void reset(int fd = -1) noexcept;
+
+private:
+    int fd_ = -1;
+};
+
+// What tells whether a file is still the one that was read: device, inode, size and change time.
+struct FileStamp {
+    std::uint64_t device = 0;
+    std::uint64_t inode = 0;
+    std::uint64_t size = 0;
+    std::int64_t changedNanoseconds = 0; // since the Unix epoch
+    [[nodiscard]] static FileStamp of(const struct ::stat& status) noexcept;
+    friend bool operator==(const FileStamp&, const FileStamp&) = default;
+};
+
+// Opens a regular file for reading without ever blocking on it (a FIFO or device is refused).
+[[nodiscard]] std::expected<UniqueFd, Error> openRegularFile(const std::string& path);
+
+struct FileContent {
+    std::string bytes;
+    FileStamp stamp;
+};
+
+// Reads a whole regular file of at most `largest` bytes. Errors are in fileErrorDomain
+// (fileErrorNoSuchFile for a missing file).
+[[nodiscard]] std::expected<FileContent, Error> readRegularFile(const std::string& path,
+                                                                std::size_t largest);
+
+// Replaces `path` by a complete new file: written beside it, synced, renamed, folder synced.
+[[nodiscard]] std::optional<Error>
+writeFileAtomically(const std::string& path, std::string_view bytes, unsigned mode = 0644);
+
+// The canonical absolute path of an existing file or folder. A text with NUL in it never
+// resolves. On failure the errno value.
+[[nodiscard]] std::expected<std::string, int> canonicalPath(std::string_view path);
+
+// Makes a folder and the missing ones above it. Nothing when it is there afterwards.
+[[nodiscard]] std::optional<Error> makeFolders(const std::string& path, unsigned mode);
+
+// Who may change a path: passes when the file and every folder above it belong to root or to the
+// daemon's user and nobody else can write them (sticky folders aside). On refusal the reason.
+class OwnershipTest {
+public:
+    [[nodiscard]] std::optional<std::string> refusal(const std::string& canonicalPath) const;
+    // The same for the file alone.
+    [[nodiscard]] static std::optional<std::string> refusalOf(const struct ::stat& status,
+                                                              std::string_view path);
+};
+
+} // namespace platform

@@ -1,0 +1,31 @@
+#pragma once
+
+#include <cstddef>
+#include <expected>
+#include <string>
+#include <string_view>
+
+#include "platform/value/Error.h"
+#include "platform/value/Value.h"
+
+namespace platform {
+
+// Property lists: XML (version 1.0 of the PropertyList DTD) and binary ("bplist00") are read,
+// XML is written. A list holds strings, numbers, booleans, dates, data, arrays and dictionaries
+// with text keys. Integers >= 0 become unsigned values. Reading is bounded in nesting and never
+// expands XML entities other than the five predefined ones and character references; a declared
+// entity is an error. Any thread; no state.
+namespace plist {
+
+inline constexpr std::size_t deepestNesting = 32;
+
+[[nodiscard]] std::expected<Value, Error> parse(std::string_view bytes,
+                                                std::size_t deepest = deepestNesting);
+
+// Fails for a value that a property list cannot hold (null, UUID, URL, encoded records,
+// non-finite numbers and dates, text with characters that XML 1.0 forbids), at any depth.
+[[nodiscard]] std::expected<std::string, Error> writeXml(const Value& value);
+
+} // namespace plist
+
+} // namespace platform

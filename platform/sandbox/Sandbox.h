@@ -1,0 +1,33 @@
+#pragma once
+
+#include <cstdint>
+#include <expected>
+#include <string>
+#include <string_view>
+#include <sys/types.h>
+
+namespace platform {
+
+// The sandbox service: tells how confined a process is and issues capabilities as text tokens.
+// A token names class, flags, and a canonical path or a service name, and is authenticated with
+// a secret made at each start. Issuing the same thing twice gives the same text. Any thread.
+class Sandbox {
+public:
+    static constexpr std::uint32_t canonicalPathFlag = 1; // resolve the path when issuing
+    static constexpr std::string_view readOnlyClass = "com.tovana.app-sandbox.read";
+
+    virtual ~Sandbox() = default;
+
+    // True when the process is more confined than the daemon itself.
+    [[nodiscard]] virtual bool isSandboxed(pid_t pid) = 0;
+
+    // A token, or the errno value.
+    [[nodiscard]] virtual std::expected<std::string, int>
+    issueFileExtension(std::string_view extensionClass, std::string_view path,
+                       std::uint32_t flags) = 0;
+    [[nodiscard]] virtual std::expected<std::string, int>
+    issueServiceExtension(std::string_view extensionClass, std::string_view serviceName,
+                          std::uint32_t flags) = 0;
+};
+
+} // namespace platform
