@@ -1,0 +1,31 @@
+#!/bin/sh
+# fuzz.sh SECONDS: runs each fuzz target of build/fuzz for that long, as many at a time as JOBS says.
+# New inputs are kept in build/fuzz/corpus/, seeds come from fuzz/corpus/TARGET/, and what made a
+# target fail is left in build/fuzz/failures/.
+set -eu
+cd "$(dirname "$0")/.."
+
+seconds=$1
+mkdir -p build/fuzz/failures
+
+set -- build/fuzz/bin/fuzz_*
+if [ ! -x "$1" ]; then
+    echo "fuzz.sh: no fuzz target is built" >&2
+    exit 1
+fi
+
+printf '%s\n' "$@" | xargs -P "${JOBS:-$(nproc)}" -I '{}' sh -c '
+    target=$(basename "$1")
+    corpus=build/fuzz/corpus/$target
+    mkdir -p "$corpus"
+    seeds=fuzz/corpus/$target
+    [ -d "$seeds" ] || seeds=
+    log=build/fuzz/$target.log
+    if "$1" -max_total_time="$2" -timeout=10 -rss_limit_mb=2048 -print_final_stats=1 \
+        -artifact_prefix=build/fuzz/failures/"$target"- "$corpus" $seeds >"$log" 2>&1; then
+        echo "$target: clean, $(sed -n "s/^stat::number_of_executed_units: *//p" "$log") inputs"
+    else
+        tail -n 40 "$log"
+        echo "$target: FAILED, see $log"
+        exit 1
+    fi' fuzz '{}' "$seconds"
