@@ -1,0 +1,32 @@
+#!/bin/sh
+# lint.sh [format] [includes] [tidy]: the checks that need no running program; all without arguments.
+set -eu
+cd "$(dirname "$0")/.."
+
+jobs=${JOBS:-$(nproc)}
+
+check_format() {
+    echo "== clang-format"
+    git ls-files -z '*.h' '*.cpp' | xargs -0 -r clang-format-19 --dry-run --Werror
+}
+
+check_includes() {
+    echo "== include directions"
+    git ls-files '*.h' '*.cpp' | awk -f scripts/check-includes.awk
+}
+
+# Only the project's own sources that the release build compiles; headers are seen through them.
+# -w: the compiler's own warnings are g++'s business, whose options clang does not all know.
+check_tidy() {
+    echo "== clang-tidy"
+    cmake --preset release >/dev/null
+    sed -n 's/^ *"file": "\(.*\)".*/\1/p' build/release/compile_commands.json | sort -u |
+        xargs -r -P "$jobs" -n 4 clang-tidy-19 -p build/release --quiet \
+            --extra-arg=-w --extra-arg=-Wno-unknown-warning-option
+}
+
+[ $# -gt 0 ] || set -- format includes tidy
+for check in "$@"; do
+    "check_$check"
+done
+echo "lint: clean"
