@@ -17,12 +17,17 @@ check_includes() {
 
 # Only the project's own sources that the release build compiles; headers are seen through them.
 # -w: the compiler's own warnings are g++'s business, whose options clang does not all know.
+# What clang-tidy says besides its findings (progress, counts) goes to a file.
 check_tidy() {
     echo "== clang-tidy"
     cmake --preset release >/dev/null
     sed -n 's/^ *"file": "\(.*\)".*/\1/p' build/release/compile_commands.json | sort -u |
         xargs -r -P "$jobs" -n 4 clang-tidy-19 -p build/release --quiet \
-            --extra-arg=-w --extra-arg=-Wno-unknown-warning-option
+            --extra-arg=-w --extra-arg=-Wno-unknown-warning-option 2>build/release/clang-tidy.log ||
+        {
+            echo "clang-tidy failed; its other output is in build/release/clang-tidy.log" >&2
+            return 1
+        }
 }
 
 [ $# -gt 0 ] || set -- format includes tidy
