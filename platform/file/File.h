@@ -52,8 +52,15 @@ struct FileStamp {
     std::uint64_t size = 0;
     std::int64_t changedNanoseconds = 0; // since the Unix epoch
     [[nodiscard]] static FileStamp of(const struct ::stat& status) noexcept;
+    // False while another write could still happen within the same tick of the file system's
+    // clock: such a stamp must not be taken as proof of an unchanged file later.
+    [[nodiscard]] bool settled() const noexcept;
+
     friend bool operator==(const FileStamp&, const FileStamp&) = default;
 };
+
+// The stamp of whatever a path leads to now; nothing when there is nothing.
+[[nodiscard]] std::optional<FileStamp> stampOf(const std::string& path);
 
 // Opens a regular file for reading without ever blocking on it (a FIFO or device is refused).
 [[nodiscard]] std::expected<UniqueFd, Error> openRegularFile(const std::string& path);
@@ -68,7 +75,8 @@ struct FileContent {
 [[nodiscard]] std::expected<FileContent, Error> readRegularFile(const std::string& path,
                                                                 std::size_t largest);
 
-// Replaces `path` by a complete new file: written beside it, synced, renamed, folder synced.
+// Replaces `path` by a complete new file of exactly this mode: written beside it under a name that
+// begins with a dot, synced, renamed, folder synced. On failure nothing is left beside it.
 [[nodiscard]] std::optional<Error>
 writeFileAtomically(const std::string& path, std::string_view bytes, unsigned mode = 0644);
 
@@ -76,17 +84,8 @@ writeFileAtomically(const std::string& path, std::string_view bytes, unsigned mo
 // resolves. On failure the errno value.
 [[nodiscard]] std::expected<std::string, int> canonicalPath(std::string_view path);
 
-// Makes a folder and the missing ones above it. Nothing when it is there afterwards.
+// Makes a folder and the missing ones above it, each with `mode` (less the umask). Nothing when it
+// is there afterwards.
 [[nodiscard]] std::optional<Error> makeFolders(const std::string& path, unsigned mode);
-
-// Who may change a path: passes when the file and every folder above it belong to root or to the
-// daemon's user and nobody else can write them (sticky folders aside). On refusal the reason.
-class OwnershipTest {
-public:
-    [[nodiscard]] std::optional<std::string> refusal(const std::string& canonicalPath) const;
-    // The same for the file alone.
-    [[nodiscard]] static std::optional<std::string> refusalOf(const struct ::stat& status,
-                                                              std::string_view path);
-};
 
 } // namespace platform

@@ -1,0 +1,130 @@
+#include "platform/file/File.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdlib>
+#include <ctime>
+#include <fcntl.h>
+#include <memory>
+#include <system_error>
+#include <unistd.h>
+
+namespace platform {
+
+namespace {
+
+constexpr std::int64_t nanosecondsPerSecond = 1'000'000'000;
+// Longer than the coarsest clock that file systems of a Linux box stamp changes with.
+constexpr std::int64_t clockTick = 20'000'000;
+
+bool hasNul(std::string_view path) {
+    return path.find('\0') != std::string_view::npos;
+}
+
+Error readError(int number, const std::string& path) {
+    const auto code = number == ENOENT ? fileErrorNoSuchFile : fileErrorReadUnknown;
+    return {&fileErrorDomain, code, path + ": " + std::generic_category().message(number)};
+}
+
+Error tooLarge(const std::string& path) {
+    return {&fileErrorDomain, fileErrorTooLarge, path + ": larger than allowed"};
+}
+
+// Reads to the end of the file, but no further than one byte past `largest`.
+std::optional<Error> readUpTo(int fd, std::size_t largest, const std::string& path,
+                              std::string& out) {
+    std::size_t filled = 0;
+    for (;;) {
+        if (filled > largest)
+            return tooLarge(path);
+        if (filled == out.size())
+            out.resize(std::min(largest + 1, filled * 2 + 4096));
+        const ssize_t got = ::read(fd, out.data() + filled, out.size() - filled);
+        if (got < 0 && errno == EINTR)
+            continue;
+        if (got < 0)
+            return readError(errno, path);
+        if (got == 0)
+            break;
+        filled += static_cast<std::size_t>(got);
+    }
+    out.resize(filled);
+    return std::nullopt;
+}
+
+} // namespace
+
+void UniqueFd::reset(int fd) noexcept {
+    if (fd_ >= 0)
+        ::close(fd_);
+    fd_ = fd;
+}
+
+FileStamp FileStamp::of(const struct ::stat& status) noexcept {
+    return {status.st_dev, status.st_ino, static_cast<std::uint64_t>(status.st_size),
+            status.st_ctim.tv_sec * nanosecondsPerSecond + status.st_ctim.tv_nsec};
+}
+
+bool FileStamp::settled() const noexcept {
+    struct ::timespec now{};
+
+    ::clock_gettime(CLOCK_REALTIME, &now);
+    const std::int64_t age = now.tv_sec * nanosecondsPerSecond + now.tv_nsec - changedNanoseconds;
+    return age > clockTick;
+}
+
+std::optional<FileStamp> stampOf(const std::string& path) {
+    struct ::stat status{};
+
+    if (hasNul(path) || ::stat(path.c_str(), &status) != 0)
+        return std::nullopt;
+    return FileStamp::of(status);
+}
+
+std::expected<UniqueFd, Error> openRegularFile(const std::string& path) {
+    if (hasNul(path))
+        return std::unexpected(readError(EINVAL, path));
+    UniqueFd file(::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC | O_NOCTTY));
+    if (!file)
+        return std::unexpected(readError(errno, path));
+
+    struct ::stat status{};
+
+    if (::fstat(file.get(), &status) != 0)
+        return std::unexpected(readError(errno, path));
+    if (!S_ISREG(status.st_mode)) {
+        return std::unexpected(
+            Error{&fileErrorDomain, fileErrorNotRegular, path + ": not a regular file"});
+    }
+    return file;
+}
+
+std::expected<FileContent, Error> readRegularFile(const std::string& path, std::size_t largest) {
+    const auto file = openRegularFile(path);
+    if (!file)
+        return std::unexpected(file.error());
+
+    struct ::stat status{};
+
+    if (::fstat(file->get(), &status) != 0)
+        return std::unexpected(readError(errno, path));
+    FileContent content{{}, FileStamp::of(status)};
+    if (content.stamp.size > largest)
+        return std::unexpected(tooLarge(path));
+    content.bytes.resize(content.stamp.size + 1); // one more, to see the end in the first read
+    if (auto error = readUpTo(file->get(), largest, path, content.bytes))
+        return std::unexpected(std::move(*error));
+    return content;
+}
+
+std::expected<std::string, int> canonicalPath(std::string_view path) {
+    if (hasNul(path))
+        return std::unexpected(ENOENT);
+    const std::unique_ptr<char, decltype(&std::free)> found(
+        ::realpath(std::string(path).c_str(), nullptr), &std::free);
+    if (!found)
+        return std::unexpected(errno);
+    return std::string(found.get());
+}
+
+} // namespace platform
