@@ -22,6 +22,8 @@ mount_kernel_files() {
     mount -t proc proc "$root/proc"
     mount -t sysfs -o ro sysfs "$root/sys"
     mount --bind /dev "$root/dev"
+    # Else what is mounted below would show up in the machine's own /dev.
+    mount --make-private "$root/dev"
     mount -t tmpfs tmpfs "$root/dev/shm"
     mount -t tmpfs tmpfs "$root/run"
 }
@@ -41,6 +43,7 @@ make_base() {
         sed -n "s/ $suite\$//p" | head -n 1)
     debootstrap --variant=minbase --include=git,make,ca-certificates \
         "$suite" "$folder/base" "$mirror"
+    rm -f "$folder/base/etc/apt/sources.list"
     cp -a /etc/apt/sources.list* /etc/apt/apt.conf.d "$folder/base/etc/apt/"
     cp /etc/resolv.conf "$folder/base/etc/"
     : >"$folder/base/.complete"
