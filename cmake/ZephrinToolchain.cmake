@@ -22,7 +22,13 @@ if(NOT CMAKE_BUILD_TYPE)
 endif()
 
 # Line tables in releases, so that a crash on a box can be read.
-set(CMAKE_CXX_FLAGS_RELEASE "-O2 -g1 -DNDEBUG")
+set(CMAKE_CXX_FLAGS_RELEASE
+  "-O2 -g1 -DNDEBUG -D_FORTIFY_SOURCE=2 -fstack-protector-strong")
+set(CMAKE_CXX_FLAGS_DEBUG "-g -D_GLIBCXX_ASSERTIONS")
+add_link_options(-Wl,-z,relro,-z,now)
+
+# Calls inside the shared library stay inside it, and can be inlined.
+add_compile_options(-fno-semantic-interposition)
 
 # Includes are written from the root of the repository.
 include_directories(${PROJECT_SOURCE_DIR})
