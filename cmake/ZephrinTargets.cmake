@@ -106,6 +106,17 @@ function(zephrin_test name)
   endif()
 endfunction()
 
+# zephrin_fuzz_target(NAME SOURCES... LIBS...)
+# The libFuzzer program fuzz_NAME; `make fuzz` runs every one. Seeds are in fuzz/corpus/fuzz_NAME/.
+function(zephrin_fuzz_target name)
+  cmake_parse_arguments(PARSE_ARGV 1 arg "" "" "SOURCES;LIBS")
+  zephrin_reject_unparsed("${arg_UNPARSED_ARGUMENTS}")
+  string(REGEX REPLACE "^fuzz_" "" area ${name})
+  add_executable(fuzz_${area} ${arg_SOURCES})
+  target_link_libraries(fuzz_${area} PRIVATE ${arg_LIBS})
+  target_link_options(fuzz_${area} PRIVATE -fsanitize=fuzzer)
+endfunction()
+
 function(zephrin_reject_unparsed arguments)
   if(arguments)
     message(FATAL_ERROR "unknown arguments: ${arguments}")
