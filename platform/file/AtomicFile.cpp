@@ -61,8 +61,7 @@ bool syncFolder(const std::string& folder) {
 }
 
 bool isFolder(const std::string& path) {
-    struct ::stat status{};
-
+    struct ::stat status = {};
     return ::stat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
 }
 

@@ -66,16 +66,14 @@ FileStamp FileStamp::of(const struct ::stat& status) noexcept {
 }
 
 bool FileStamp::settled() const noexcept {
-    struct ::timespec now{};
-
+    struct ::timespec now = {};
     ::clock_gettime(CLOCK_REALTIME, &now);
     const std::int64_t age = now.tv_sec * nanosecondsPerSecond + now.tv_nsec - changedNanoseconds;
     return age > clockTick;
 }
 
 std::optional<FileStamp> stampOf(const std::string& path) {
-    struct ::stat status{};
-
+    struct ::stat status = {};
     if (hasNul(path) || ::stat(path.c_str(), &status) != 0)
         return std::nullopt;
     return FileStamp::of(status);
@@ -87,9 +85,7 @@ std::expected<UniqueFd, Error> openRegularFile(const std::string& path) {
     UniqueFd file(::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC | O_NOCTTY));
     if (!file)
         return std::unexpected(readError(errno, path));
-
-    struct ::stat status{};
-
+    struct ::stat status = {};
     if (::fstat(file.get(), &status) != 0)
         return std::unexpected(readError(errno, path));
     if (!S_ISREG(status.st_mode)) {
@@ -103,9 +99,7 @@ std::expected<FileContent, Error> readRegularFile(const std::string& path, std::
     const auto file = openRegularFile(path);
     if (!file)
         return std::unexpected(file.error());
-
-    struct ::stat status{};
-
+    struct ::stat status = {};
     if (::fstat(file->get(), &status) != 0)
         return std::unexpected(readError(errno, path));
     FileContent content{{}, FileStamp::of(status)};

@@ -14,8 +14,7 @@ std::string folderAbove(const std::string& path) {
 }
 
 std::optional<std::string> ownRefusal(const std::string& path) {
-    struct ::stat status{};
-
+    struct ::stat status = {};
     if (::lstat(path.c_str(), &status) != 0)
         return path + ": " + std::generic_category().message(errno);
     return OwnershipTest::refusalOf(status, path);
