@@ -13,7 +13,9 @@ namespace platform::log {
 
 namespace {
 
+// Lines are gathered for this long or up to this size, whichever is first.
 constexpr auto gatherTime = std::chrono::milliseconds(10);
+constexpr std::size_t gatheredSize = 64 * 1024;
 // How long the end of the process waits for a reader of standard error that does not read.
 constexpr auto flushPatience = std::chrono::seconds(2);
 // Room that is kept between batches; what a burst needed beyond it is given back.
@@ -74,7 +76,7 @@ void Writer::append(Level level, const char* category, std::int64_t time, std::s
             return;
         }
         store(level, category, time, text);
-        const bool hurry = level == Level::error && !urgent_;
+        const bool hurry = !urgent_ && (level == Level::error || pending_.size() > gatheredSize);
         urgent_ = urgent_ || hurry;
         wakes = idle_ || hurry;
         idle_ = false;

@@ -1,0 +1,156 @@
+#include "platform/file/File.h"
+
+#include <cerrno>
+#include <fcntl.h>
+#include <filesystem>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <gtest/gtest.h>
+
+#include "platform/file/OwnershipTest.h"
+#include "tests/platform/TestFolder.h"
+
+namespace fs = std::filesystem;
+using namespace platform;
+
+TEST(ReadRegularFile, TellsWhyAFileCannotBeRead) {
+    const TestFolder folder;
+    ASSERT_EQ(::mkfifo((folder / "fifo").c_str(), 0600), 0);
+    folder.write("big", std::string(101, 'x'));
+    folder.write("plain", "");
+
+    const struct {
+        std::string path;
+        std::int64_t code;
+    } cases[] = {
+        {folder / "missing", fileErrorNoSuchFile},
+        {folder / "fifo", fileErrorNotRegular},
+        {folder.path(), fileErrorNotRegular},
+        {"/dev/zero", fileErrorNotRegular},
+        {folder / "big", fileErrorTooLarge},
+        {folder / "plain/below", fileErrorReadUnknown},
+        {(folder / "plain") + std::string("\0x", 2), fileErrorReadUnknown},
+    };
+
+    for (const auto& c : cases) {
+        const auto content = readRegularFile(c.path, 100);
+        ASSERT_FALSE(content) << c.path;
+        EXPECT_EQ(content.error().code, c.code) << c.path;
+        EXPECT_TRUE(content.error().description->find(c.path) == 0);
+    }
+}
+
+TEST(ReadRegularFile, ReadsUpToItsLimit) {
+    const TestFolder folder;
+    for (const std::size_t size : {0, 1, 99, 100}) {
+        const auto path = folder.write("file", std::string(size, 'y'));
+        const auto content = readRegularFile(path, 100);
+        ASSERT_TRUE(content) << size;
+        EXPECT_EQ(content->bytes, std::string(size, 'y'));
+        EXPECT_EQ(content->stamp, stampOf(path));
+    }
+    EXPECT_FALSE(readRegularFile("/proc/self/maps", 10)) << "of unknown size, but longer";
+}
+
+TEST(FileStamp, TellsAChangedFile) {
+    const TestFolder folder;
+    const auto path = folder.write("file", "one");
+    const auto first = stampOf(path);
+    ASSERT_TRUE(first);
+    EXPECT_FALSE(first->settled()) << "written just now";
+    ::usleep(30'000);
+    EXPECT_TRUE(first->settled());
+    folder.write("file", "two");
+    EXPECT_NE(stampOf(path), first);
+    EXPECT_FALSE(stampOf(folder / "missing"));
+}
+
+TEST(WriteFileAtomically, ReplacesContentAndModeWhole) {
+    const TestFolder folder;
+    const auto path = folder.write("store", "old");
+    ASSERT_FALSE(writeFileAtomically(path, "new content", 0640));
+    EXPECT_EQ(readRegularFile(path, 100)->bytes, "new content");
+    EXPECT_EQ(fs::status(path).permissions(), fs::perms(0640));
+    EXPECT_EQ(std::distance(fs::directory_iterator(folder.path()), {}), 1) << "nothing beside it";
+}
+
+TEST(WriteFileAtomically, LeavesTheOldFileAloneOnFailure) {
+    const TestFolder folder;
+    fs::create_directories(folder / "taken/inside");
+    EXPECT_TRUE(writeFileAtomically(folder / "taken", "x")) << "a folder stands in its place";
+    EXPECT_TRUE(writeFileAtomically(folder / "missing/file", "x"));
+    EXPECT_TRUE(writeFileAtomically("", "x"));
+    EXPECT_TRUE(writeFileAtomically((folder / "a") + std::string("\0b", 2), "x"));
+    EXPECT_EQ(std::distance(fs::directory_iterator(folder.path()), {}), 1) << "nothing left over";
+}
+
+TEST(CanonicalPath, ResolvesOnlyWhatIsThere) {
+    const TestFolder folder;
+    const auto file = folder.write("real/file", "");
+    fs::create_directory_symlink("real", folder / "link");
+    fs::create_symlink("loop", folder / "loop");
+    EXPECT_EQ(canonicalPath(folder / "link/../real/./file"), file);
+    EXPECT_EQ(canonicalPath(folder / "link/file"), file);
+    EXPECT_EQ(canonicalPath(folder / "missing").error(), ENOENT);
+    EXPECT_EQ(canonicalPath(folder / "loop").error(), ELOOP);
+    EXPECT_EQ(canonicalPath(file + std::string("\0x", 2)).error(), ENOENT);
+    EXPECT_EQ(canonicalPath("").error(), ENOENT);
+}
+
+TEST(MakeFolders, MakesWhatIsMissing) {
+    const TestFolder folder;
+    EXPECT_FALSE(makeFolders(folder / "a/b//c", 0755));
+    EXPECT_TRUE(fs::is_directory(folder / "a/b/c"));
+    EXPECT_FALSE(makeFolders(folder / "a/b/c/", 0755)) << "it is there";
+    folder.write("a/file", "");
+    EXPECT_TRUE(makeFolders(folder / "a/file/d", 0755));
+    EXPECT_TRUE(makeFolders(folder / "a/file", 0755));
+}
+
+TEST(OwnershipTest, RefusesWhatOthersCanChange) {
+    const TestFolder folder;
+    const auto file = folder.write("outer/inner/file", "");
+
+    const struct {
+        const char* changed;
+        mode_t mode;
+        bool passes;
+    } cases[] = {
+        {"outer/inner/file", 0644, true},
+        {"outer/inner/file", 0664, false},
+        {"outer/inner/file", 0646, false},
+        {"outer/inner/file", 01666, false},
+        {"outer/inner", 0777, false},
+        {"outer/inner", 01777, true},
+        {"outer", 0775, false},
+        {"outer", 01775, true},
+    };
+
+    for (const auto& c : cases) {
+        fs::permissions(file, fs::perms(0644));
+        fs::permissions(folder / "outer/inner", fs::perms(0755));
+        fs::permissions(folder / "outer", fs::perms(0755));
+        ASSERT_EQ(::chmod((folder / c.changed).c_str(), c.mode), 0);
+        const auto reason = OwnershipTest().refusal(file);
+        EXPECT_EQ(!reason, c.passes) << c.changed << " " << std::oct << c.mode;
+        EXPECT_EQ(reason.value_or(""),
+                  c.passes ? "" : (folder / c.changed) + " can be written by others");
+    }
+    EXPECT_TRUE(OwnershipTest().refusal(folder / "missing"));
+    EXPECT_TRUE(OwnershipTest().refusal("relative"));
+}
+
+TEST(OwnershipTest, RefusesWhatBelongsToAnotherUser) {
+    struct ::stat status = {};
+    status.st_mode = S_IFREG | 0644;
+    status.st_uid = 0;
+    EXPECT_FALSE(OwnershipTest::refusalOf(status, "/f"));
+    status.st_uid = ::geteuid();
+    EXPECT_FALSE(OwnershipTest::refusalOf(status, "/f"));
+    status.st_uid = ::geteuid() + 1;
+    EXPECT_EQ(OwnershipTest::refusalOf(status, "/f"),
+              "/f belongs to user " + std::to_string(status.st_uid));
+    status.st_mode = S_IFDIR | 01777;
+    EXPECT_TRUE(OwnershipTest::refusalOf(status, "/d")) << "its owner could rename in it";
+}
