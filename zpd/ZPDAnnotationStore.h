@@ -1,0 +1,56 @@
+#pragma once
+
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "platform/value/Error.h"
+#include "platform/value/Value.h"
+
+namespace platform {
+class Containers;
+}
+
+class ZPDPlugIn;
+
+// The annotations of plug-ins that outlive the daemon, above all the user's elections: one
+// property-list file, read once and written whole after every change (docs/annotation-store.md).
+//
+// Owned by the database and called only on its queue; no lock.
+class ZPDAnnotationStore {
+public:
+    // Reads the store at `databasePath`, or at the usual place. Whatever is found there, the store
+    // is usable afterwards.
+    ZPDAnnotationStore(const std::optional<std::string>& databasePath,
+                       platform::Containers& containers);
+
+    [[nodiscard]] static std::string defaultDatabasePath();
+    [[nodiscard]] static std::string globalPath();
+
+    [[nodiscard]] const std::string& annotationsPath() const { return path_; }
+
+    [[nodiscard]] std::optional<platform::Dictionary>
+    annotationForIdentifier(std::string_view key) const;
+    [[nodiscard]] std::optional<platform::Dictionary>
+    annotationForPlugIn(const ZPDPlugIn& plugIn) const;
+    // Adds the entries of `annotation` to what is stored for the plug-in, or takes all of that
+    // away, and saves what changed.
+    void setAnnotation(const std::optional<platform::Dictionary>& annotation,
+                       const ZPDPlugIn& plugIn);
+
+    // Takes over the annotations of a file. On failure nothing changes.
+    [[nodiscard]] std::optional<platform::Error> loadDb(const std::string& path);
+    [[nodiscard]] std::optional<platform::Error> saveDb();
+
+private:
+    void migrate();
+    void reportUnlessWritable() const;
+    void store(std::string_view key, const std::optional<platform::Dictionary>& annotation);
+    [[nodiscard]] std::optional<platform::Dictionary>
+    merged(std::string_view key, const platform::Dictionary& changes) const;
+
+    platform::Containers& containers_;
+    std::string path_;
+    platform::Dictionary annotations_; // annotation key to annotation dictionary
+    bool unsaved_ = false;
+};

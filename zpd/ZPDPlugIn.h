@@ -1,0 +1,149 @@
+#pragma once
+
+#include <atomic>
+#include <cstdint>
+#include <expected>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "AppRegistry/ARZephrinProxy.h"
+#include "Zephrin/ZPPlugInCore.h"
+#include "zpd/ZPDPlugInContext.h"
+
+class ZPDEntitlementHolder;
+
+// The daemon's record of one plug-in: the shared record and what only the registry knows of it,
+// with an information dictionary that follows the registry. One that exists has a bundle path and
+// passed `diagnose`.
+//
+// Made by the database on its queue, owned by its cache and by whoever holds it in a result. The
+// context that it was made with outlives it. Used on the service queue; the refresh and the kept
+// form are guarded by the record's own re-entrant lock, so that any thread may use it.
+class ZPDPlugIn final : public ZPPlugInCore {
+public:
+    using Ptr = std::shared_ptr<ZPDPlugIn>;
+
+    // The record of what the registry holds; empty when that makes no acceptable plug-in.
+    [[nodiscard]] static Ptr create(const ARZephrinProxy::Ptr& proxy,
+                                    const ZPDPlugInContext& context);
+
+    // ---- What the registry knows
+
+    // A fresh view of the plug-in, by UUID, else by path; empty when it has gone.
+    [[nodiscard]] ARZephrinProxy::Ptr getProxy() const;
+
+    [[nodiscard]] bool isStillValid() const { return true; }
+
+    // The registry's knowledge when the information dictionary was last fetched.
+    [[nodiscard]] std::optional<platform::Uuid> arKnowledgeUUID() const;
+
+    // The information dictionary as it was last fetched.
+    [[nodiscard]] std::optional<platform::Dictionary> infoPlist() const;
+
+    [[nodiscard]] std::optional<std::string> dataContainerPath() const override {
+        return dataContainerPath_;
+    }
+
+    // Declared for later use; never set.
+    [[nodiscard]] std::optional<std::int64_t> containerAgeRestriction() const { return {}; }
+
+    [[nodiscard]] bool ageRestricted() const { return false; }
+
+    [[nodiscard]] std::optional<std::uint64_t> vNode() const { return {}; }
+
+    // ---- Dictionaries that follow the registry
+
+    [[nodiscard]] std::optional<platform::Dictionary> bundleInfoDictionary() const override;
+    [[nodiscard]] std::optional<platform::Value> infoKey(std::string_view key) const override;
+    [[nodiscard]] std::optional<platform::Value> pluginKey(std::string_view key) const override;
+    [[nodiscard]] std::optional<platform::Value> attribute(std::string_view key) const override;
+    // Every entry but those with keys that begin with "DT".
+    [[nodiscard]] static platform::Dictionary
+    prunedInfoDictionaryFor(const std::optional<platform::Dictionary>& info);
+
+    // ---- Entitlements
+
+    [[nodiscard]] std::optional<platform::Value> valueForEntitlement(std::string_view key) const;
+    // True when there is a value and it does not equal false.
+    [[nodiscard]] bool hasEntitlement(std::string_view key) const;
+    // The key of the plug-in's annotation: what it replaces, else its identifier.
+    [[nodiscard]] std::string annotationKey() const;
+
+    [[nodiscard]] std::optional<platform::Error> diagnose() const override;
+
+    // ---- Forms
+
+    // An error when the bundle's information dictionary has gone.
+    [[nodiscard]] std::expected<platform::Dictionary, platform::Error> exportForm() const override;
+    // Adds what lets the client read the plug-in's shared files and look its service up. Answers
+    // whether everything was granted.
+    bool augmentForm(platform::Dictionary& form) const;
+    // Tokens for the shared resources (a string, or an array of which strings count), by resource.
+    [[nodiscard]] platform::Dictionary
+    issueResourceExtensions(const platform::Value& resources) const;
+
+    // The whole form that a reply carries: exported, with this annotation, augmented.
+    [[nodiscard]] std::expected<platform::Dictionary, platform::Error>
+    replyForm(const platform::Dictionary& annotation) const;
+    // The same in its wire encoding, one complete item. Kept until the annotation, a name or the
+    // registry's entry changes: asking again costs next to nothing.
+    [[nodiscard]] std::expected<platform::SharedBytes, platform::Error>
+    encodedReplyForm(const platform::Dictionary& annotation) const;
+
+    void setLocalizedName(std::optional<std::string> name) override;
+    void setLocalizedShortName(std::optional<std::string> name) override;
+    void setLocalizedContainingName(std::optional<std::string> name) override;
+
+    // ---- Rules (ZPDPlugInMatching.cpp)
+
+    // True when every rule holds; without rules they do.
+    [[nodiscard]] bool match(const std::optional<platform::Dictionary>& rules) const;
+    [[nodiscard]] bool matchKey(std::string_view key, const platform::Value& pattern) const;
+    [[nodiscard]] bool matchValue(const platform::Value& value,
+                                  const platform::Value& patterns) const;
+    [[nodiscard]] bool matchDictionary(const platform::Value& value,
+                                       const platform::Dictionary& pattern) const;
+
+    // ---- Authorization (ZPDPlugInAuthorization.cpp)
+
+    // Nothing when the client may see and use the plug-in, else the reason why not.
+    [[nodiscard]] std::optional<std::string> allowForClient(ZPDEntitlementHolder& client) const;
+
+private:
+    // What is kept of an encoded form, and what it was made of.
+    struct KeptForm {
+        platform::SharedBytes encoded;
+        platform::Dictionary annotation;
+    };
+
+    explicit ZPDPlugIn(const ZPDPlugInContext& context) : context_(context) {}
+
+    [[nodiscard]] bool setupWithProxy(const ARZephrinProxy::Ptr& proxy);
+    void takeNames(const ARZephrinProxy& proxy);
+    void refresh(const std::optional<platform::Uuid>& knowledge) const;
+    void takeProxy(const ARZephrinProxy::Ptr& proxy) const;
+    void forgetForm() const;
+
+    [[nodiscard]] std::optional<platform::Value> ruleValue(std::string_view key) const;
+    [[nodiscard]] std::string electionText() const;
+    [[nodiscard]] bool matchPattern(std::string_view value, std::string_view pattern) const;
+
+    [[nodiscard]] std::optional<platform::Value> sharedResources() const;
+    [[nodiscard]] bool addResourceExtensions(platform::Dictionary& form) const;
+    [[nodiscard]] bool addServiceExtension(platform::Dictionary& form) const;
+    [[nodiscard]] std::expected<std::string, int>
+    issueFileExtension(const std::string& resourcePath) const;
+    [[nodiscard]] std::expected<std::string, int>
+    issueServiceExtension(const std::string& bundleIdentifier) const;
+
+    const ZPDPlugInContext& context_;
+    std::optional<std::string> dataContainerPath_;
+
+    // Guarded by the record's lock; refreshed behind const readers.
+    mutable std::weak_ptr<const ARZephrinProxy> known_; // whose data this is
+    mutable std::optional<platform::Uuid> arKnowledgeUUID_;
+    mutable std::optional<platform::Dictionary> infoPlist_;
+    mutable std::optional<KeptForm> keptForm_;
+};

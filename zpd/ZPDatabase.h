@@ -1,0 +1,116 @@
+#pragma once
+
+#include <atomic>
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+#include <vector>
+
+#include "AppRegistry/ARApplicationWorkspace.h"
+#include "platform/queue/SerialQueue.h"
+#include "platform/value/Error.h"
+#include "platform/value/Uuid.h"
+#include "platform/value/Value.h"
+#include "zpd/Platform.h"
+#include "zpd/ZPDAnnotationStore.h"
+#include "zpd/ZPDPlugIn.h"
+#include "zpd/ZPDPlugInContext.h"
+
+// Told of plug-ins that the registry removed, outside the database's queue.
+class ZPDatabaseDelegate {
+public:
+    virtual ~ZPDatabaseDelegate() = default;
+    virtual void removedPlugIns(const std::vector<ARZephrinProxy::Ptr>& plugIns) = 0;
+};
+
+// The daemon's view of the installed plug-ins: a bounded cache of records over the registry, and
+// the annotations. The server is one.
+//
+// Cache and annotations are touched only on the serial queue "ZPDatabase". Look-ups may come from
+// any thread, but never from a block on that queue; they enter it synchronously, once per
+// candidate, and ask the registry outside it except while a record is made. The platform services
+// outlive the database; the database outlives its records. No observer or delegate call comes
+// after its destruction, which is on the main thread.
+class ZPDatabase : public ZPDAnnotationSource, private ARWorkspaceObserver {
+public:
+    using PlugIns = std::vector<ZPDPlugIn::Ptr>;
+
+    static constexpr std::uint32_t defaultCacheLimit = 1'000'000;
+    static constexpr const char* annotationChangeNotification =
+        "com.tovana.zephrin.annotation-change";
+
+    // `databasePath` is the annotation store's; without one it is at its usual place.
+    ZPDatabase(const Platform& platform, const std::optional<std::string>& databasePath);
+    ZPDatabase(const ZPDatabase&) = delete;
+    ZPDatabase& operator=(const ZPDatabase&) = delete;
+    ~ZPDatabase() override;
+
+    // Not owned; set before the registry can report anything, taken away before it goes.
+    void setDelegate(ZPDatabaseDelegate* delegate) { delegate_ = delegate; }
+
+    void setCacheLimit(std::uint32_t limit) { cacheLimit_ = limit; }
+
+    [[nodiscard]] std::uint32_t cacheLimit() const { return cacheLimit_; }
+
+    [[nodiscard]] ARApplicationWorkspace& workspace() const { return platform_.workspace; }
+
+    // ---- Look-ups
+
+    // The plug-ins that the rules could accept, each once, in the registry's order; nothing when
+    // the registry's query fails. Without rules all.
+    [[nodiscard]] std::optional<PlugIns>
+    findPlugIns(const std::optional<platform::Dictionary>& query);
+    [[nodiscard]] ZPDPlugIn::Ptr findPlugIn(const platform::Uuid& uuid);
+    [[nodiscard]] ZPDPlugIn::Ptr findPlugInAtPath(std::string_view canonicalPath);
+    // Nothing when the application is unknown or has no plug-ins.
+    [[nodiscard]] std::optional<PlugIns> plugInsWithinApplication(std::string_view canonicalPath);
+    [[nodiscard]] ZPDPlugIn::Ptr plugInForProxy(const ARZephrinProxy::Ptr& proxy);
+
+    // ---- Registration; nothing on success
+
+    [[nodiscard]] std::optional<platform::Error> addPlugIn(std::string_view path);
+    [[nodiscard]] std::optional<platform::Error> removePlugIn(std::string_view path);
+
+    // ---- Annotations
+
+    [[nodiscard]] std::optional<platform::Dictionary>
+    annotationForPlugIn(const ZPDPlugIn& plugIn) override;
+    // Merges and saves; never an error. Tells nobody: see notifyAnnotationChange.
+    std::optional<platform::Error>
+    setAnnotation(const std::optional<platform::Dictionary>& annotation, const ZPDPlugIn& plugIn);
+    void notifyAnnotationChange();
+    // Elects a plug-in that has no election yet.
+    // REQUIRES: on the database queue
+    void autoElect(const ZPDPlugIn& plugIn);
+
+protected:
+    [[nodiscard]] const Platform& platformServices() const { return platform_; }
+
+private:
+    class ElectionFilter;
+
+    void pluginsDidInstall(const std::vector<ARZephrinProxy::Ptr>& plugIns) override;
+    void pluginsWillUninstall(const std::vector<ARZephrinProxy::Ptr>& plugIns) override;
+
+    // REQUIRES: on the database queue
+    [[nodiscard]] ZPDPlugIn::Ptr cachedPlugIn(const platform::Uuid& uuid);
+    [[nodiscard]] ZPDPlugIn::Ptr createPlugInForProxy(const ARZephrinProxy::Ptr& proxy);
+    void purgeCachesToLimit(std::uint32_t limit);
+
+    void localeChanged();
+    [[nodiscard]] std::optional<ARApplicationWorkspace::PlugIns>
+    candidates(const std::optional<platform::Dictionary>& query);
+    [[nodiscard]] ZPDPlugIn::Ptr plugInForCandidate(const ARZephrinProxy::Ptr& proxy);
+    [[nodiscard]] std::size_t cacheSize();
+
+    const Platform platform_;
+    const ZPDPlugInContext context_;
+    std::atomic<ZPDatabaseDelegate*> delegate_ = nullptr;
+    std::atomic<std::uint32_t> cacheLimit_ = defaultCacheLimit;
+    ZPDAnnotationStore annotations_;
+    std::unordered_map<platform::Uuid, ZPDPlugIn::Ptr> cache_;
+    platform::SerialQueue sync_; // last: its blocks use all of the above
+};
