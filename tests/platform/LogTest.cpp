@@ -21,7 +21,6 @@ using namespace platform::log;
 using testing::ContainsRegex;
 using testing::HasSubstr;
 using testing::MatchesRegex;
-using testing::Not;
 
 namespace {
 
