@@ -6,7 +6,7 @@
 #include <string>
 #include <string_view>
 
-#include "platform/log/Log.h"
+#include "platform/log/Render.h"
 #include "platform/value/Error.h"
 
 // The domain "Zephrin": errors that the daemon tells its clients, rebuilt by the client library

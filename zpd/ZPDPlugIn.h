@@ -58,7 +58,6 @@ public:
     [[nodiscard]] std::optional<platform::Dictionary> bundleInfoDictionary() const override;
     [[nodiscard]] std::optional<platform::Value> infoKey(std::string_view key) const override;
     [[nodiscard]] std::optional<platform::Value> pluginKey(std::string_view key) const override;
-    [[nodiscard]] std::optional<platform::Value> attribute(std::string_view key) const override;
     // Every entry but those with keys that begin with "DT".
     [[nodiscard]] static platform::Dictionary
     prunedInfoDictionaryFor(const std::optional<platform::Dictionary>& info);
