@@ -7,7 +7,6 @@
 #include "Zephrin/ZPPlugInCore.h"
 
 using platform::Dictionary;
-using platform::DictionaryEntry;
 using platform::Value;
 
 namespace {
