@@ -53,6 +53,10 @@ void configureFromEnvironment() {
     showPrivate = shown && std::string_view(shown) == "1";
 }
 
+void silence() {
+    Category::least = static_cast<Level>(static_cast<std::uint8_t>(Level::error) + 1);
+}
+
 void flush() {
     Writer::shared().flush();
 }

@@ -64,6 +64,7 @@ private:
     void write(Level level, const char* format, std::span<const Argument> args) const;
 
     friend void configureFromEnvironment();
+    friend void silence();
     static std::atomic<Level> least;
     const char* name_;
 };
@@ -71,6 +72,9 @@ private:
 // Reads ZEPHRIN_LOG (debug|info|default|error) and ZEPHRIN_LOG_PRIVATE. Called once, first thing in
 // main.
 void configureFromEnvironment();
+
+// Instead: writes nothing, not even errors. For tools whose standard error a person reads.
+void silence();
 
 // Waits until everything written so far is out, or the reader of standard error makes no progress
 // for too long. Called by itself when the process exits normally.
