@@ -1,0 +1,311 @@
+#include <bit>
+#include <cmath>
+#include <optional>
+#include <vector>
+
+#include "platform/plist/Readers.h"
+#include "platform/plist/Utf8.h"
+
+namespace platform::plist {
+
+namespace {
+
+// What a list may come to when every shared object is counted each time it is used: a few hundred
+// bytes can name billions of values.
+constexpr std::size_t mostValues = 262'144;
+constexpr std::size_t mostBytes = 64 * 1024 * 1024;
+
+constexpr std::size_t trailerSize = 32;
+constexpr double secondsFrom1970To2001 = 978'307'200.0;
+
+// The object table is at the front, then the table of the objects' offsets, then the trailer:
+// 6 bytes of no interest here, the sizes of an offset and of a reference, and three 64-bit numbers
+// (objects, top object, where the offset table lies). All numbers are big-endian. An object is a
+// marker byte (kind and, mostly, count) with its content. Lives for one call.
+class Reader {
+public:
+    Reader(std::string_view bytes, std::size_t deepest) : bytes_(bytes), deepest_(deepest) {}
+
+    [[nodiscard]] std::optional<Value> read() {
+        return readTrailer() ? readObject(top_, 0) : std::nullopt;
+    }
+
+    std::string failure;
+
+private:
+    // The content of one object: what is left of the object table from there on.
+    struct Content {
+        std::string_view bytes;
+        unsigned low; // of the marker
+    };
+
+    std::nullopt_t fail(const char* reason) {
+        if (failure.empty())
+            failure = reason;
+        return std::nullopt;
+    }
+
+    [[nodiscard]] static std::uint64_t number(std::string_view bytes);
+    [[nodiscard]] bool readTrailer();
+    [[nodiscard]] std::optional<std::size_t> offsetOf(std::uint64_t object);
+    [[nodiscard]] std::optional<std::size_t> takeCount(Content& content);
+    [[nodiscard]] std::optional<std::string_view> takeBytes(Content& content, std::size_t unit);
+    [[nodiscard]] std::optional<Value> readObject(std::uint64_t object, std::size_t level);
+    [[nodiscard]] std::optional<Value> readSimple(unsigned low);
+    [[nodiscard]] std::optional<Value> readInteger(const Content& content);
+    [[nodiscard]] std::optional<Value> readReal(const Content& content);
+    [[nodiscard]] std::optional<Value> readDate(const Content& content);
+    [[nodiscard]] std::optional<Value> readData(Content content);
+    [[nodiscard]] std::optional<Value> readAscii(Content content);
+    [[nodiscard]] std::optional<Value> readUtf16(Content content);
+    [[nodiscard]] std::optional<Value> readArray(Content content, std::size_t level);
+    [[nodiscard]] std::optional<Value> readDictionary(Content content, std::size_t level);
+
+    std::string_view bytes_;
+    std::size_t deepest_;
+    std::string_view objects_; // from the start of the file
+    std::string_view offsets_;
+    std::size_t offsetSize_ = 0;
+    std::size_t referenceSize_ = 0;
+    std::uint64_t count_ = 0;
+    std::uint64_t top_ = 0;
+    std::size_t valuesRead_ = 0;
+    std::size_t bytesRead_ = 0;
+};
+
+// REQUIRES: at most 8 bytes
+std::uint64_t Reader::number(std::string_view bytes) {
+    std::uint64_t made = 0;
+    for (const char c : bytes)
+        made = (made << 8) | static_cast<unsigned char>(c);
+    return made;
+}
+
+bool Reader::readTrailer() {
+    const auto bad = [this] {
+        fail("bad trailer");
+        return false;
+    };
+    if (bytes_.size() < binaryMagic.size() + trailerSize)
+        return bad();
+    const std::string_view trailer = bytes_.substr(bytes_.size() - trailerSize);
+    offsetSize_ = static_cast<unsigned char>(trailer[6]);
+    referenceSize_ = static_cast<unsigned char>(trailer[7]);
+    count_ = number(trailer.substr(8, 8));
+    top_ = number(trailer.substr(16, 8));
+    const std::uint64_t tableStart = number(trailer.substr(24, 8));
+    const std::size_t tableEnd = bytes_.size() - trailerSize;
+    if (offsetSize_ < 1 || offsetSize_ > 8 || referenceSize_ < 1 || referenceSize_ > 8)
+        return bad();
+    if (tableStart < binaryMagic.size() || tableStart > tableEnd)
+        return bad();
+    if (count_ > (tableEnd - tableStart) / offsetSize_ || top_ >= count_)
+        return bad();
+    objects_ = bytes_.substr(0, tableStart);
+    offsets_ = bytes_.substr(tableStart, count_ * offsetSize_);
+    return true;
+}
+
+std::optional<std::size_t> Reader::offsetOf(std::uint64_t object) {
+    if (object >= count_)
+        return fail("a reference to no object");
+    const std::uint64_t offset = number(offsets_.substr(object * offsetSize_, offsetSize_));
+    if (offset < binaryMagic.size() || offset >= objects_.size())
+        return fail("an offset outside the objects");
+    return offset;
+}
+
+// The count of an object: the low half of its marker, or the integer object after that.
+std::optional<std::size_t> Reader::takeCount(Content& content) {
+    if (content.low != 0x0f)
+        return content.low;
+    if (content.bytes.empty())
+        return fail("a cut object");
+    const auto marker = static_cast<unsigned char>(content.bytes.front());
+    const std::size_t size = std::size_t{1} << (marker & 0x0f);
+    if ((marker & 0xf0) != 0x10 || size > 8 || size >= content.bytes.size())
+        return fail("a bad count");
+    const std::uint64_t count = number(content.bytes.substr(1, size));
+    content.bytes.remove_prefix(1 + size);
+    return count;
+}
+
+// The counted units of `unit` bytes that follow.
+std::optional<std::string_view> Reader::takeBytes(Content& content, std::size_t unit) {
+    const auto count = takeCount(content);
+    if (!count)
+        return std::nullopt;
+    if (*count > content.bytes.size() / unit)
+        return fail("a cut object");
+    const std::string_view taken = content.bytes.substr(0, *count * unit);
+    bytesRead_ += taken.size();
+    if (bytesRead_ > mostBytes)
+        return fail("too much text and data");
+    return taken;
+}
+
+std::optional<Value> Reader::readObject(std::uint64_t object, std::size_t level) {
+    if (++valuesRead_ > mostValues)
+        return fail("too many values");
+    const auto offset = offsetOf(object);
+    if (!offset)
+        return std::nullopt;
+    const auto marker = static_cast<unsigned char>(objects_[*offset]);
+    const Content content{objects_.substr(*offset + 1), marker & 0x0fU};
+    switch (marker >> 4) {
+    case 0x0:
+        return readSimple(content.low);
+    case 0x1:
+        return readInteger(content);
+    case 0x2:
+        return readReal(content);
+    case 0x3:
+        return readDate(content);
+    case 0x4:
+        return readData(content);
+    case 0x5:
+        return readAscii(content);
+    case 0x6:
+        return readUtf16(content);
+    case 0xa:
+        return readArray(content, level);
+    case 0xd:
+        return readDictionary(content, level);
+    default:
+        return fail("an object of an unknown kind");
+    }
+}
+
+std::optional<Value> Reader::readSimple(unsigned low) {
+    if (low == 0x8)
+        return Value(false);
+    if (low == 0x9)
+        return Value(true);
+    return fail("an object of an unknown kind");
+}
+
+// One, two and four bytes are unsigned; eight and sixteen are signed.
+std::optional<Value> Reader::readInteger(const Content& content) {
+    const std::size_t size = std::size_t{1} << content.low;
+    if (content.low > 4 || size > content.bytes.size())
+        return fail("a bad integer");
+    const std::uint64_t low =
+        number(content.bytes.substr(size < 8 ? 0 : size - 8, size < 8 ? size : 8));
+    if (size < 8)
+        return Value(low);
+    if (size == 8)
+        return Value(static_cast<std::int64_t>(low));
+    const std::uint64_t high = number(content.bytes.substr(0, 8));
+    const bool negative = static_cast<std::int64_t>(low) < 0;
+    if (high == 0)
+        return Value(low);
+    if (high == ~std::uint64_t{0} && negative)
+        return Value(static_cast<std::int64_t>(low));
+    return fail("an integer beyond 64 bits");
+}
+
+std::optional<Value> Reader::readReal(const Content& content) {
+    const std::size_t size = std::size_t{1} << content.low;
+    if ((size != 4 && size != 8) || size > content.bytes.size())
+        return fail("a bad number");
+    const std::uint64_t bits = number(content.bytes.substr(0, size));
+    const double real = size == 8 ? std::bit_cast<double>(bits)
+                                  : std::bit_cast<float>(static_cast<std::uint32_t>(bits));
+    if (!std::isfinite(real))
+        return fail("a number that is not finite");
+    return Value(real);
+}
+
+std::optional<Value> Reader::readDate(const Content& content) {
+    const auto seconds = readReal(content);
+    if (!seconds || content.low != 3)
+        return fail("a bad date");
+    return Value(Date{*seconds->real() + secondsFrom1970To2001});
+}
+
+std::optional<Value> Reader::readData(Content content) {
+    const auto bytes = takeBytes(content, 1);
+    return bytes ? std::optional<Value>(Data{SharedBytes(*bytes)}) : std::nullopt;
+}
+
+std::optional<Value> Reader::readAscii(Content content) {
+    const auto text = takeBytes(content, 1);
+    if (!text)
+        return std::nullopt;
+    for (const char c : *text) {
+        if (static_cast<unsigned char>(c) >= 0x80)
+            return fail("ASCII text that is none");
+    }
+    return Value(*text);
+}
+
+std::optional<Value> Reader::readUtf16(Content content) {
+    const auto units = takeBytes(content, 2);
+    if (!units)
+        return std::nullopt;
+    const auto unitAt = [&](std::size_t at) {
+        return static_cast<char32_t>(number(units->substr(at, 2)));
+    };
+    const auto isHigh = [](char32_t unit) { return unit >= 0xd800 && unit <= 0xdbff; };
+    const auto isLow = [](char32_t unit) { return unit >= 0xdc00 && unit <= 0xdfff; };
+    std::string text;
+    for (std::size_t at = 0; at < units->size(); at += 2) {
+        char32_t character = unitAt(at);
+        if (isHigh(character) && at + 2 < units->size() && isLow(unitAt(at + 2))) {
+            at += 2;
+            character = 0x10000 + ((character - 0xd800) << 10) + (unitAt(at) - 0xdc00);
+        } else if (isHigh(character) || isLow(character)) {
+            return fail("half of a surrogate pair");
+        }
+        appendCharacter(text, character);
+    }
+    return Value(text);
+}
+
+std::optional<Value> Reader::readArray(Content content, std::size_t level) {
+    if (level >= deepest_)
+        return fail("nested too deeply");
+    const auto references = takeBytes(content, referenceSize_);
+    if (!references)
+        return std::nullopt;
+    std::vector<Value> items;
+    for (std::size_t at = 0; at < references->size(); at += referenceSize_) {
+        auto item = readObject(number(references->substr(at, referenceSize_)), level + 1);
+        if (!item)
+            return std::nullopt;
+        items.push_back(std::move(*item));
+    }
+    return Value(Array(std::move(items)));
+}
+
+// All references of keys, then all of values.
+std::optional<Value> Reader::readDictionary(Content content, std::size_t level) {
+    if (level >= deepest_)
+        return fail("nested too deeply");
+    const auto references = takeBytes(content, 2 * referenceSize_);
+    if (!references)
+        return std::nullopt;
+    const std::size_t half = references->size() / 2;
+    std::vector<DictionaryEntry> entries;
+    for (std::size_t at = 0; at < half; at += referenceSize_) {
+        const auto key = readObject(number(references->substr(at, referenceSize_)), deepest_);
+        if (!key || !key->sharedString())
+            return fail("a key that is not text");
+        auto value = readObject(number(references->substr(half + at, referenceSize_)), level + 1);
+        if (!value)
+            return std::nullopt;
+        entries.push_back({*key->sharedString(), std::move(*value)});
+    }
+    return Value(Dictionary(std::move(entries)));
+}
+
+} // namespace
+
+std::expected<Value, Error> readBinary(std::string_view bytes, std::size_t deepest) {
+    Reader reader(bytes, deepest);
+    if (auto value = reader.read())
+        return std::move(*value);
+    return std::unexpected(corrupt("binary property list: " + reader.failure));
+}
+
+} // namespace platform::plist
