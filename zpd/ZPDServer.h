@@ -1,0 +1,102 @@
+#pragma once
+
+#include <expected>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "platform/ipc/Listener.h"
+#include "platform/ipc/Loop.h"
+#include "platform/queue/SerialQueue.h"
+#include "platform/value/Error.h"
+#include "platform/value/Uuid.h"
+#include "zpd/Platform.h"
+#include "zpd/ZPDPlugInHold.h"
+#include "zpd/ZPDUserPrefs.h"
+#include "zpd/ZPDatabase.h"
+
+class ZPDIpcClient;
+
+// The daemon's one server: the plug-in database, extended by the service that clients talk to. It
+// owns the listener, the queues, the holds and the preferences, and is its own database delegate.
+//
+//   "ipc"         the loop (a thread of its own) of the listener and all connections; it makes
+//                 clients and transactions and never waits
+//   "service"     every request of every client, one at a time, in the order of arrival
+//   "serverSync"  a leaf: every access to the holds, always entered synchronously
+//
+// Made and destroyed on the main thread. The platform's services outlive it; it outlives its
+// clients, whose connections end with the loop.
+class ZPDServer : public ZPDatabase, private ZPDatabaseDelegate {
+public:
+    struct Settings {
+        std::string socketPath;
+        std::optional<std::string> databasePath; // nothing: where the annotations usually are
+    };
+
+    // Binds the service's socket but accepts nobody yet. Fails when the name is taken or the
+    // socket cannot be made.
+    [[nodiscard]] static std::expected<std::unique_ptr<ZPDServer>, platform::Error>
+    create(const Platform& platform, const Settings& settings);
+    ~ZPDServer() override;
+
+    // The one server of this process, for code that has none at hand.
+    // REQUIRES: it exists
+    [[nodiscard]] static ZPDServer& server();
+
+    [[nodiscard]] const Platform& services() const { return platformServices(); }
+
+    [[nodiscard]] ZPDUserPrefs& userPrefs() { return userPrefs_; }
+
+    // How often -v was given; kept, and without further effect.
+    [[nodiscard]] unsigned verbose() const { return verbose_; }
+
+    void setVerbose(unsigned verbose) { verbose_ = verbose; }
+
+    // Begins to accept clients.
+    void resume();
+    // Accepts no more clients and releases all holds. Any thread.
+    void stop();
+
+    // ---- Requests (ZPDServerWork.cpp)
+
+    enum class Work : std::uint8_t {
+        any,   // always on the queue's own thread
+        brief, // may run at once on the calling thread when the queue is idle
+    };
+
+    // Runs a block on the service queue, after all that came before. Any thread.
+    void submitWork(platform::SerialQueue::Block block, Work work = Work::any);
+
+    void assertOnServiceQueue() const { mainQueue_.assertOnQueue(); }
+
+    // ---- Holds (ZPDServerHolds.cpp). Any thread.
+
+    [[nodiscard]] bool holdOnPlugIn(const ZPDPlugIn& plugIn);
+    void addHold(ZPDPlugInHold::Ptr hold);
+    // Releases the hold with this token; an unknown one does nothing.
+    void unholdToken(const platform::Uuid& token);
+    // Releases every hold that this client placed.
+    void unholdClient(const ZPDIpcClient& client);
+
+private:
+    ZPDServer(const Platform& platform, const Settings& settings);
+
+    [[nodiscard]] std::optional<platform::Error> listen(const std::string& socketPath);
+    void handle(platform::ipc::ListenerEvent event);
+
+    void removedPlugIns(const std::vector<ARZephrinProxy::Ptr>& plugIns) override;
+    void releaseAllHolds();
+    [[nodiscard]] bool releaseOneHoldOf(const ZPDIpcClient& client);
+
+    static ZPDServer* theServer;
+
+    unsigned verbose_ = 0;
+    ZPDUserPrefs userPrefs_;
+    std::vector<ZPDPlugInHold::Ptr> holds_; // only on "serverSync"
+    platform::SerialQueue syncQueue_;
+    platform::ipc::Loop ipcLoop_;
+    platform::SerialQueue mainQueue_;
+    std::unique_ptr<platform::ipc::Listener> service_;
+};
