@@ -1,0 +1,87 @@
+#include "zpd/ZPDIpcClient.h"
+
+#include <utility>
+
+#include "Zephrin/ZPDLog.h"
+#include "platform/ipc/Connection.h"
+#include "platform/log/Render.h"
+#include "platform/probe/Probes.h"
+#include "platform/process/Processes.h"
+#include "platform/signing/CodeSigning.h"
+#include "zpd/ZPDServer.h"
+
+using platform::Value;
+using platform::ipc::Connection;
+
+namespace {
+
+constexpr std::size_t pathRoom = 2048; // bytes, the closing NUL included
+
+} // namespace
+
+std::shared_ptr<ZPDIpcClient> ZPDIpcClient::create(const std::shared_ptr<Connection>& connection,
+                                                   ZPDServer& server) {
+    std::shared_ptr<ZPDIpcClient> client(new ZPDIpcClient(connection, server));
+    client->resume();
+    return client;
+}
+
+ZPDIpcClient::ZPDIpcClient(const std::shared_ptr<Connection>& connection, ZPDServer& server)
+    : connection_(connection), server_(server), pid_(connection->pid()) {
+    learnPath();
+    ZPDLogOps().debug("new client %d %s", pid(), path_);
+    platform::probe::clientNew(pid());
+    task_ = server_.services().signing.taskFor(connection->peer());
+}
+
+ZPDIpcClient::~ZPDIpcClient() = default;
+
+void ZPDIpcClient::learnPath() {
+    auto path = server_.services().processes.executablePath(pid(), pathRoom);
+    if (!path)
+        return;
+    path_ = std::move(*path);
+    bundle_ = ZPBundle::forExecutablePath(path_);
+}
+
+void ZPDIpcClient::resume() {
+    const auto there = connection_.lock();
+    there->setEventHandler([client = shared_from_this()](platform::ipc::Event event) {
+        client->handle(std::move(event));
+    });
+    there->resume();
+}
+
+std::shared_ptr<Connection> ZPDIpcClient::connection() const {
+    return acceptWork() ? connection_.lock() : nullptr;
+}
+
+std::optional<Value> ZPDIpcClient::entitlementValueForKey(std::string_view key) {
+    server_.assertOnServiceQueue();
+    if (!vouched_ || !task_)
+        return std::nullopt;
+    auto value = task_->entitlement(key);
+    if (!value) {
+        ZPDLogOps().error("error retrieving entitlements for client %d", pid());
+        return std::nullopt;
+    }
+    return std::move(*value);
+}
+
+bool ZPDIpcClient::hasEntitlement(std::string_view key) {
+    const auto value = entitlementValueForKey(key);
+    return value && !value->equalsFalse();
+}
+
+std::string ZPDIpcClient::description() const {
+    const void* const self = this;
+    const auto there = connection();
+    if (!there) {
+        const platform::log::Argument list[] = {platform::log::Argument(self)};
+        return platform::log::render("<ZPDIpcClient %p NO CONNECTION>", list, true);
+    }
+    const platform::log::Argument list[] = {
+        platform::log::Argument(self), platform::log::Argument(*there),
+        platform::log::Argument(pid()), platform::log::Argument(path_)};
+    return platform::log::render("<ZPDIpcClient %p con=%@ pid=%d path=%@>", list, true);
+}

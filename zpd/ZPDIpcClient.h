@@ -1,0 +1,93 @@
+#pragma once
+
+#include <atomic>
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <sys/types.h>
+
+#include "Zephrin/ZPBundle.h"
+#include "platform/ipc/Message.h"
+#include "platform/value/Value.h"
+#include "zpd/ZPDEntitlementHolder.h"
+
+namespace platform {
+class SigningTask;
+}
+
+class Transaction;
+class ZPDServer;
+
+// One connected client: who it is, and what its connection brings.
+//
+// Made by the server on the IPC loop when a connection arrives; owned by the connection's event
+// handler, so that it lives as long as the connection, and by requests that are under way. The
+// server outlives it. Events arrive on the IPC loop, or on the service queue when a request that
+// was done lets the next one in; they only make transactions. What belongs to the request under
+// way is touched on the service queue alone.
+class ZPDIpcClient final : public ZPDEntitlementHolder,
+                           public std::enable_shared_from_this<ZPDIpcClient> {
+public:
+    // Learns who is there, takes the connection over and begins to serve it.
+    static std::shared_ptr<ZPDIpcClient>
+    create(const std::shared_ptr<platform::ipc::Connection>& connection, ZPDServer& server);
+    ~ZPDIpcClient() override;
+
+    // Empty once the connection is gone.
+    [[nodiscard]] std::shared_ptr<platform::ipc::Connection> connection() const;
+
+    [[nodiscard]] ZPDServer& server() const { return server_; }
+
+    // 0 once the connection is gone.
+    [[nodiscard]] pid_t pid() const { return pid_; }
+
+    // Where the client's program lies; empty when that cannot be told.
+    [[nodiscard]] const std::string& path() const { return path_; }
+
+    // The client's own bundle; nothing when its path cannot be told.
+    [[nodiscard]] const std::optional<ZPBundle>& bundle() const { return bundle_; }
+
+    // Whether its requests are still carried out: until the connection is dead.
+    [[nodiscard]] bool acceptWork() const { return acceptWork_; }
+
+    // How many requests were taken up. REQUIRES: on the service queue
+    [[nodiscard]] std::uint32_t requestCount() const { return requestCount_; }
+
+    // A failed query counts as absent, and so does every entitlement while the request under way
+    // is not proven to come from the program that connected.
+    // REQUIRES: on the service queue
+    [[nodiscard]] std::optional<platform::Value>
+    entitlementValueForKey(std::string_view key) override;
+    [[nodiscard]] bool hasEntitlement(std::string_view key) override;
+
+    [[nodiscard]] std::string description() const;
+
+private:
+    ZPDIpcClient(const std::shared_ptr<platform::ipc::Connection>& connection, ZPDServer& server);
+    void learnPath();
+    void resume();
+
+    void handle(platform::ipc::Event event);
+    void handleRequest(platform::ipc::Message message);
+    void carryOut(Transaction& transaction);
+    void dying();
+    void dead();
+
+    const std::weak_ptr<platform::ipc::Connection> connection_;
+    ZPDServer& server_;
+    std::atomic<pid_t> pid_;
+    std::string path_;
+    std::optional<ZPBundle> bundle_;
+    std::unique_ptr<platform::SigningTask> task_;
+    std::atomic<bool> acceptWork_ = true;
+
+    // Only on the service queue.
+    std::uint32_t requestCount_ = 0;
+    bool vouched_ = false; // the request under way comes from the program itself
+};
+
+[[nodiscard]] inline std::string describe(const ZPDIpcClient& client) {
+    return client.description();
+}

@@ -1,0 +1,66 @@
+// What a client's connection brings. On the IPC loop, or on the service queue for a request that
+// waited for the one before it.
+
+#include <utility>
+#include <variant>
+
+#include "Zephrin/ZPDLog.h"
+#include "platform/ipc/Connection.h"
+#include "platform/probe/Probes.h"
+#include "zpd/Transaction.h"
+#include "zpd/ZPDIpcClient.h"
+#include "zpd/ZPDServer.h"
+
+using platform::Value;
+using platform::ipc::ConnectionError;
+using platform::ipc::Event;
+using platform::ipc::Message;
+
+void ZPDIpcClient::handle(Event event) {
+    if (auto* const message = std::get_if<Message>(&event))
+        return handleRequest(std::move(*message));
+    if (const auto* const value = std::get_if<Value>(&event))
+        return ZPDLogOps().error("unexpected message: %{public}@ from: %d", *value, pid());
+    switch (const auto error = std::get<ConnectionError>(event)) {
+    case ConnectionError::terminationImminent:
+        return dying();
+    case ConnectionError::invalid:
+        return dead();
+    default:
+        ZPDLogOps().error("unexpected error type from ipc: %{public}@", error);
+    }
+}
+
+void ZPDIpcClient::handleRequest(Message message) {
+    auto transaction = std::make_shared<Transaction>(std::move(message), shared_from_this());
+    if (platform::probe::requestInputEnabled())
+        platform::probe::requestInput(pid(), platform::describe(transaction->request()).c_str());
+    const auto work = transaction->isBrief() ? ZPDServer::Work::brief : ZPDServer::Work::any;
+    server_.submitWork([client = shared_from_this(),
+                        transaction = std::move(transaction)] { client->carryOut(*transaction); },
+                       work);
+}
+
+// REQUIRES: on the service queue
+void ZPDIpcClient::carryOut(Transaction& transaction) {
+    constexpr std::uint32_t countedEvery = 1000;
+    server_.assertOnServiceQueue();
+    if (++requestCount_ % countedEvery == 0)
+        ZPDLogOps().debug("client %d used %u requests so far", pid(), requestCount_);
+    vouched_ = transaction.isVouchedFor();
+    transaction.dispatch();
+    vouched_ = false;
+    transaction.taken();
+}
+
+void ZPDIpcClient::dying() {
+    ZPDLogOps().debug("client %d termination imminent", pid());
+}
+
+void ZPDIpcClient::dead() {
+    server_.unholdClient(*this);
+    ZPDLogOps().debug("client %d is dead", pid());
+    acceptWork_ = false;
+    platform::probe::clientDone(pid());
+    pid_ = 0;
+}
