@@ -1,0 +1,90 @@
+#include "zpd/Transaction.h"
+
+#include <algorithm>
+#include <iterator>
+#include <utility>
+
+#include "Zephrin/ZPDError.h"
+#include "Zephrin/ZPDLog.h"
+#include "Zephrin/ZPDaemonClient.h"
+#include "platform/probe/Probes.h"
+#include "zpd/ZPDIpcClient.h"
+#include "zpd/ZPDServer.h"
+
+using platform::Value;
+
+// What a request may be, in the order in which its type is compared.
+struct Transaction::RequestType {
+    std::string_view type;
+    void (Transaction::*handler)();
+};
+
+const Transaction::RequestType Transaction::requestTypes[] = {
+    {"match", &Transaction::matchPlugIns},
+    {"find", &Transaction::findPlugIn},
+};
+
+Transaction::Transaction(platform::ipc::Message request, std::shared_ptr<ZPDIpcClient> client)
+    : request_(std::move(request)),
+      reply_(platform::ipc::createReply(request_)),
+      client_(std::move(client)),
+      connection_(client_->connection()) {}
+
+Transaction::~Transaction() = default;
+
+ZPDServer& Transaction::server() const {
+    return client_->server();
+}
+
+void Transaction::dispatch() {
+    server().assertOnServiceQueue();
+    const auto type = stringFor("request");
+    version_ = unsignedFor("version");
+    if (!supportsVersion(version_)) {
+        return fail(ZPDErrorCode::version,
+                    ZPDErrorMakeFormat(ZPDErrorCode::version,
+                                       "unsupported protocol version %d (current %d)", version_,
+                                       ZPDaemonClient::currentProtocolVersion));
+    }
+    if (!client().acceptWork())
+        return;
+    ZPDLogOps().debug("client %d requested %{public}s", client().pid(), type.value_or("(null)"));
+    platform::probe::request(client().pid(), type ? std::string(*type).c_str() : nullptr);
+    route(type);
+}
+
+// The current version and the one before it.
+bool Transaction::supportsVersion(std::uint64_t version) {
+    return (version & ~std::uint64_t{1}) == 2;
+}
+
+void Transaction::route(const std::optional<std::string_view>& type) {
+    if (!type)
+        return fail(ZPDErrorCode::invalidRequest, "invalid request format (missing type)");
+    const auto known = std::ranges::find(requestTypes, *type, &RequestType::type);
+    if (known == std::end(requestTypes))
+        return fail(ZPDErrorCode::invalidRequest, "unrecognized request");
+    (this->*known->handler)();
+}
+
+// A look-up of a record by UUID, or a request that fails in its envelope. Everything else may have
+// to read many records, or files.
+bool Transaction::isBrief() const {
+    if (!supportsVersion(unsignedFor("version")))
+        return true;
+    const auto type = stringFor("request");
+    if (!type ||
+        std::ranges::find(requestTypes, *type, &RequestType::type) == std::end(requestTypes))
+        return true;
+    return *type == "find" && !request().contains("paths");
+}
+
+std::optional<std::string_view> Transaction::stringFor(std::string_view key) const {
+    const Value* const value = request().find(key);
+    return value ? value->string() : std::nullopt;
+}
+
+std::uint64_t Transaction::unsignedFor(std::string_view key) const {
+    const Value* const value = request().find(key);
+    return value ? value->unsignedInteger().value_or(0) : 0;
+}

@@ -1,0 +1,105 @@
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "platform/ipc/Message.h"
+#include "platform/value/Error.h"
+#include "platform/value/Value.h"
+
+class ZPDIpcClient;
+class ZPDPlugIn;
+class ZPDServer;
+struct ReplyForm;
+
+// One request under way: what was asked, the reply that is being built, and who asked.
+//
+// Made when the request arrives; owned by the block that is queued for it and by whatever a
+// handler leaves to be finished later. It keeps its client. Carried out on the service queue; a
+// handler may finish it on another one.
+//
+// Each handler ends its transaction once, with `done` or one of the `fail` operations, and does not
+// touch the reply afterwards.
+class Transaction : public std::enable_shared_from_this<Transaction> {
+public:
+    Transaction(platform::ipc::Message request, std::shared_ptr<ZPDIpcClient> client);
+    Transaction(const Transaction&) = delete;
+    Transaction& operator=(const Transaction&) = delete;
+    virtual ~Transaction();
+
+    [[nodiscard]] ZPDIpcClient& client() const { return *client_; }
+
+    [[nodiscard]] ZPDServer& server() const;
+
+    [[nodiscard]] const platform::Dictionary& request() const { return request_.body; }
+
+    [[nodiscard]] platform::Dictionary& reply() { return reply_.body; }
+
+    // The request's protocol version, once it was dispatched.
+    [[nodiscard]] std::uint64_t version() const { return version_; }
+
+    // True for requests that are answered at once from what the daemon has in memory.
+    [[nodiscard]] bool isBrief() const;
+
+    // True when the program that connected, and no other that has its socket, wrote the request.
+    [[nodiscard]] bool isVouchedFor() const { return request_.fromPeer && request_.greeted; }
+
+    // Checks the envelope and calls the handler of the request's type.
+    // REQUIRES: on the service queue
+    void dispatch();
+
+    // The handler has returned: the connection may hand out its next request.
+    void taken() { request_.ticket.taken(); }
+
+    // Gets each path with whether it could be resolved (then it is canonical, else as received),
+    // and tells whether to go on; when not, it has failed the transaction.
+    using PathBlock = std::function<bool(const std::string& path, bool resolved)>;
+    // Walks "paths". False when the transaction has failed.
+    [[nodiscard]] bool marshalPaths(const PathBlock& block);
+    // The same, and then done.
+    bool processPaths(const PathBlock& block);
+
+    // Puts a converted result under "matches"; without one the key is left out.
+    void setMatches(std::optional<platform::Value> matches);
+    void done();
+    void fail(std::uint64_t code, std::string_view message);
+    // One of our own errors goes out as it is; another's text goes out with `code`.
+    void fail(std::uint64_t code, const platform::Error& error);
+
+    // Gives the form the plug-in's stored annotation, or an empty one.
+    // REQUIRES: on the service queue
+    void addAnnotationForPlugIn(const ZPDPlugIn& plugIn, ReplyForm& form) const;
+
+private:
+    struct RequestType;
+    static const RequestType requestTypes[];
+
+    [[nodiscard]] static bool supportsVersion(std::uint64_t version);
+    [[nodiscard]] std::optional<std::string_view> stringFor(std::string_view key) const;
+    [[nodiscard]] std::uint64_t unsignedFor(std::string_view key) const;
+    void route(const std::optional<std::string_view>& type);
+    [[nodiscard]] bool marshalPath(const platform::Value& entry, const PathBlock& block);
+
+    // ---- zpd/requests/Discovery.cpp
+    void matchPlugIns();
+    [[nodiscard]] bool mayDiscoverAll() const;
+
+    // ---- zpd/requests/Lookup.cpp
+    void findPlugIn();
+    [[nodiscard]] std::shared_ptr<ZPDPlugIn> requestedPlugIn() const;
+    [[nodiscard]] std::shared_ptr<ZPDPlugIn> findPlugInByUUID(const platform::Uuid& uuid) const;
+    [[nodiscard]] std::shared_ptr<ZPDPlugIn> findPlugInByPathURL(std::string_view url) const;
+
+    // ---- zpd/requests/Annotation.cpp
+    [[nodiscard]] bool pluginShouldBeAutoEnabled(const ZPDPlugIn& plugIn) const;
+
+    platform::ipc::Message request_;
+    platform::ipc::Reply reply_;
+    const std::shared_ptr<ZPDIpcClient> client_;
+    const std::shared_ptr<platform::ipc::Connection> connection_;
+    std::uint64_t version_ = 0;
+};
