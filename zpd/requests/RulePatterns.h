@@ -1,0 +1,11 @@
+#pragma once
+
+#include <cstddef>
+
+#include "platform/value/Value.h"
+
+// The most patterns that the rules of one request may hold: each is compared with each candidate.
+inline constexpr std::size_t mostRulePatterns = 4096;
+
+// Counts every pattern: of an array each alternative, of a dictionary each entry.
+[[nodiscard]] bool hasTooManyPatterns(const platform::Dictionary& rules);
