@@ -1,0 +1,74 @@
+// "match": the plug-ins that a host may use, narrowed in a fixed order of steps.
+
+#include "zpd/requests/Discovery.h"
+
+#include <utility>
+
+#include "Zephrin/ZPDError.h"
+#include "Zephrin/ZPDLog.h"
+#include "Zephrin/ZPDaemonClient.h"
+#include "platform/sandbox/Sandbox.h"
+#include "zpd/Transaction.h"
+#include "zpd/ZPDIpcClient.h"
+#include "zpd/ZPDServer.h"
+#include "zpd/requests/RulePatterns.h"
+
+using platform::Dictionary;
+using platform::SharedBytes;
+using platform::Value;
+
+namespace {
+
+// The privileged clients of the daemon.
+constexpr std::string_view managerEntitlement = "com.tovana.private.zephrin.manager";
+
+std::optional<std::string> plugInsPathOf(const ZPDIpcClient& client) {
+    return client.bundle() ? client.bundle()->plugInsPath() : std::nullopt;
+}
+
+} // namespace
+
+void Transaction::matchPlugIns() {
+    const Value* const value = request().find("rules");
+    const Dictionary* const rules = value ? value->dictionary() : nullptr;
+    if (value && (!rules || hasTooManyPatterns(*rules))) {
+        return fail(ZPDErrorCode::invalidRequest, "invalid request format (bad rules dictionary)");
+    }
+    const std::uint64_t flags = unsignedFor("flags");
+    if ((flags & ZPDaemonClient::ZPDiscoverAll) != 0 && !mayDiscoverAll())
+        return fail(ZPDErrorCode::notAuthorized, "unauthorized discovery flag (ZPDiscoverAll)");
+
+    Discovery discovery(*this, rules ? std::optional(*rules) : std::nullopt, flags);
+    setMatches(ZPDaemonClient::convertToIPC(discovery.run(), version()));
+    ZPDLogOps().debug("reply marshalled");
+    done();
+}
+
+// Asks for the sandbox only where the entitlement is held.
+bool Transaction::mayDiscoverAll() const {
+    return client().hasEntitlement(managerEntitlement) &&
+           !server().services().sandbox.isSandboxed(client().pid());
+}
+
+Discovery::Discovery(const Transaction& transaction, std::optional<Dictionary> rules,
+                     std::uint64_t flags)
+    : transaction_(transaction),
+      rules_(std::move(rules)),
+      flags_(flags),
+      ownPlugInsPath_(plugInsPathOf(transaction.client())),
+      deduplication_(has(ZPDaemonClient::ZPDiscoverAllVersions),
+                     has(ZPDaemonClient::ZPDiscoverAllDuplicates)) {}
+
+std::vector<SharedBytes> Discovery::run() {
+    readExclusions();
+    fetchCandidates();
+    traceCandidates();
+    preferOwnPlugIns();
+    for (const auto& candidate : candidates_) {
+        if (passes(*candidate))
+            take(candidate);
+    }
+    markReplacements();
+    logMatches();
+    return encodedMatches();
+}
