@@ -1,0 +1,159 @@
+#include <csignal>
+#include <filesystem>
+#include <sys/stat.h>
+
+#include <gtest/gtest.h>
+
+#include "tests/e2e/Daemon.h"
+#include "tests/e2e/Home.h"
+#include "tests/e2e/Replies.h"
+
+namespace e2e {
+namespace {
+
+namespace fs = std::filesystem;
+
+const char* const usage = "Usage: zpd [-S servicename] [-v]\n";
+
+Program runZpd(const Home& home, std::vector<std::string> arguments) {
+    arguments.insert(arguments.begin(), builtProgram("zpd"));
+    fs::remove(home / "errors");
+    return Program({.command = arguments,
+                    .settings = {{"ZEPHRIN_HOME", home.path()}},
+                    .errorFile = home / "errors"});
+}
+
+TEST(Start, WrongOptionsPrintTheUsageAndNothingElse) {
+    const Home home;
+    const std::vector<std::vector<std::string>> cases = {
+        {"extra"},       {"-x"},           {"-S"},      {"-c"},  {"-d"}, {"--help"},
+        {"-v", "extra"}, {"-c", "5", "x"}, {"--", "x"}, {"-vx"}, {"-"}};
+    for (const std::vector<std::string>& arguments : cases) {
+        SCOPED_TRACE(arguments[0]);
+        Program program = runZpd(home, arguments);
+        EXPECT_EQ(program.exitStatus(), 2);
+        const std::string errors = program.errors();
+        EXPECT_TRUE(errors.ends_with(usage)) << errors;
+        EXPECT_EQ(errors.find("zpd: "), std::string::npos) << errors;
+        EXPECT_FALSE(fs::exists(home / "run"));
+    }
+}
+
+TEST(Start, SaysThatVerboseHasNoEffect) {
+    const Home home;
+    Daemon daemon(home.path(), {.arguments = {"-v", "-vv"}});
+    EXPECT_EQ(daemon.terminate(), 0);
+    EXPECT_EQ(daemon.linesWith("default error: verbose option -v is ineffective; use log config "
+                               "--subsystem com.tovana.zephrin"),
+              3u);
+    EXPECT_EQ(daemon.linesWith("ops info: zpd is launching"), 1u);
+}
+
+TEST(Start, CacheLimitTakesLeadingDigits) {
+    struct Case {
+        const char* limit;
+        const char* logged; // nothing: no purge
+    };
+
+    const std::vector<Case> cases = {{"abc", "ops info: purging cache for 1 > 0"},
+                                     {"0", "ops info: purging cache for 1 > 0"},
+                                     {"2abc", "ops info: purging cache for 3 > 2"},
+                                     {"3", nullptr},
+                                     {"99999999999999999999", nullptr}};
+    const Home home;
+    const std::string app = home.addApp("Some");
+    for (const char* identifier : {"a", "b", "c", "d"})
+        addPlugIn(app, identifier, {.identifier = identifier});
+    for (const Case& each : cases) {
+        SCOPED_TRACE(each.limit);
+        writeFile(home / "zpd.log", "");
+        Daemon daemon(home.path(), {.arguments = {"-c", "1", "-c", each.limit}});
+        WireClient client = daemon.connect();
+        EXPECT_EQ(matched(client, Item::map({})), "a b c d");
+        EXPECT_EQ(daemon.terminate(), 0);
+        EXPECT_EQ(daemon.linesWith("purging cache") > 0, each.logged != nullptr);
+        if (each.logged) {
+            EXPECT_GT(daemon.linesWith(each.logged), 0u);
+        }
+    }
+}
+
+TEST(Start, TerminationIsOrderly) {
+    const Home home;
+    Daemon daemon(home.path());
+    WireClient client = daemon.connect();
+    for (int i = 0; i < 100; ++i)
+        client.post(envelope("match"));
+    EXPECT_EQ(daemon.terminate(), 0);
+    EXPECT_TRUE(client.ended());
+    EXPECT_EQ(daemon.linesWith(" error: "), 0u);
+}
+
+TEST(Start, ASecondDaemonOnALiveNameFails) {
+    const Home home;
+    addAppWith(home, "A", {.identifier = "a"});
+    const Daemon daemon(home.path());
+    WireClient client = daemon.connect();
+    Program second = runZpd(home, {"-S", "e2e", "-d", home / "annotations"});
+    EXPECT_EQ(second.exitStatus(), 1);
+    EXPECT_NE(second.errors().find("ops error: unable to construct server"), std::string::npos)
+        << second.errors();
+    EXPECT_EQ(matched(client, Item::map({})), "a");
+    WireClient later = daemon.connect();
+    EXPECT_EQ(matched(later, Item::map({})), "a");
+}
+
+TEST(Start, AStaleSocketIsReplaced) {
+    const Home home;
+    for (int i = 0; i < 2; ++i) {
+        Daemon daemon(home.path());
+        daemon.program().signal(SIGKILL);
+        daemon.program().exitStatus();
+        EXPECT_TRUE(fs::is_socket(daemon.socketPath()));
+    }
+    Daemon daemon(home.path());
+    WireClient client = daemon.connect();
+    EXPECT_EQ(matched(client, Item::map({})), "");
+    struct stat status{};
+    ASSERT_EQ(stat(daemon.socketPath().c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode & 07777u, 0666u);
+    ASSERT_EQ(stat((home / "run").c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode & 07777u, 0755u);
+}
+
+TEST(Start, ASocketPathThatIsTooLongIsAClearError) {
+    const Home home;
+    const std::size_t rest = 107 - (home / "run/").size();
+    Program program = runZpd(home, {"-S", std::string(rest + 1, 's'), "-d", home / "annotations"});
+    EXPECT_EQ(program.exitStatus(), 1);
+    EXPECT_NE(program.errors().find(home / "run/"), std::string::npos) << program.errors();
+    EXPECT_NE(program.errors().find("107"), std::string::npos) << program.errors();
+
+    const Daemon daemon(home.path(), {.service = std::string(rest, 's')});
+    WireClient client = daemon.connect();
+    EXPECT_EQ(matched(client, Item::map({})), "");
+}
+
+TEST(Start, TheFirstPassEndsBeforeTheSocketIsThere) {
+    const Home home;
+    for (int i = 0; i < 300; ++i)
+        addAppWith(home, "App" + std::to_string(i), {.identifier = "id" + std::to_string(i)});
+    for (int start = 0; start < 2; ++start) {
+        Daemon daemon(home.path());
+        WireClient client = daemon.connect();
+        EXPECT_EQ(match(client, Item::map({})).size(), 300u);
+        EXPECT_EQ(daemon.terminate(), 0);
+    }
+}
+
+TEST(Start, AStoreThatCannotBeWrittenIsSaidOnce) {
+    const Home home;
+    Daemon daemon(home.path(), {.arguments = {"-d", home / "missing/annotations"}});
+    WireClient client = daemon.connect();
+    EXPECT_EQ(matched(client, Item::map({})), "");
+    EXPECT_EQ(daemon.terminate(), 0);
+    EXPECT_EQ(daemon.linesWith(home / "missing"), 1u) << daemon.wholeLog();
+}
+
+} // namespace
+} // namespace e2e
