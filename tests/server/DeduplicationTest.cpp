@@ -1,0 +1,120 @@
+#include "zpd/requests/Deduplication.h"
+
+#include <cstddef>
+#include <random>
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include "platform/value/NumericOrder.h"
+
+namespace {
+
+using Registration = Deduplication::Registration;
+
+struct Mode {
+    bool allVersions;
+    bool allDuplicates;
+};
+
+// The kept ones of `offered`, by their places in it.
+std::vector<std::size_t> keptByIndex(const std::vector<Registration>& offered, Mode mode) {
+    Deduplication deduplication(mode.allVersions, mode.allDuplicates);
+    std::vector<std::size_t> numbered;
+    std::vector<bool> gone(offered.size());
+    for (std::size_t i = 0; i < offered.size(); ++i) {
+        const auto verdict = deduplication.offer(offered[i]);
+        if (verdict.displaced)
+            gone[numbered.at(*verdict.displaced)] = true;
+        if (verdict.keep)
+            numbered.push_back(i);
+    }
+    std::erase_if(numbered, [&](std::size_t i) { return gone[i]; });
+    return numbered;
+}
+
+// The rule as it is told: a scan of the kept list for each newcomer.
+std::vector<std::size_t> keptByScan(const std::vector<Registration>& offered, Mode mode) {
+    std::vector<std::size_t> kept;
+    for (std::size_t i = 0; i < offered.size(); ++i) {
+        const Registration& p = offered[i];
+        bool discarded = false;
+        for (std::size_t at = 0; at < kept.size(); ++at) {
+            const Registration& m = offered[kept[at]];
+            if (m.identifier != p.identifier)
+                continue;
+            const auto order = platform::compareNumerically(p.version, m.version);
+            if (mode.allVersions && (mode.allDuplicates || order != 0))
+                continue;
+            bool wins = order > 0;
+            if (order == 0) {
+                if (p.onSystemVolume && !m.onSystemVolume)
+                    wins = true;
+                else if (!p.onSystemVolume && m.onSystemVolume)
+                    wins = false;
+                else
+                    wins = p.lastModified > m.lastModified;
+            }
+            if (wins)
+                kept.erase(kept.begin() + static_cast<std::ptrdiff_t>(at));
+            else
+                discarded = true;
+            break;
+        }
+        if (!discarded)
+            kept.push_back(i);
+    }
+    return kept;
+}
+
+constexpr Mode newestOnly{false, false};
+constexpr Mode allVersions{true, false};
+constexpr Mode everything{true, true};
+
+TEST(Deduplication, KeepsTheBetterOfTwo) {
+    const struct {
+        const char* what;
+        Registration first, second;
+        Mode mode;
+        std::vector<std::size_t> kept;
+    } cases[] = {
+        {"newer version", {"x", "1.9"}, {"x", "1.10"}, newestOnly, {1}},
+        {"older version", {"x", "1.10"}, {"x", "1.9"}, newestOnly, {0}},
+        {"no version", {"x", "<none>"}, {"x", "1"}, newestOnly, {0}},
+        {"both versions", {"x", "1.10"}, {"x", "1.9"}, allVersions, {0, 1}},
+        {"same version once", {"x", "1.0"}, {"x", "1.00"}, allVersions, {0}},
+        {"same version twice", {"x", "1"}, {"x", "1"}, everything, {0, 1}},
+        {"duplicates alone have no effect", {"x", "1"}, {"x", "1"}, {false, true}, {0}},
+        {"system volume wins", {"x", "1", false, 9}, {"x", "1", true, 1}, newestOnly, {1}},
+        {"system volume stays", {"x", "1", true, 1}, {"x", "1", false, 9}, newestOnly, {0}},
+        {"later one wins", {"x", "1", true, 1}, {"x", "1", true, 2}, newestOnly, {1}},
+        {"equal times", {"x", "1", false, 2}, {"x", "1", false, 2}, newestOnly, {0}},
+        {"version before volume", {"x", "1", true, 9}, {"x", "2", false, 1}, newestOnly, {1}},
+        {"another identifier", {"x", "1"}, {"y", "1"}, newestOnly, {0, 1}},
+    };
+
+    for (const auto& test : cases)
+        EXPECT_EQ(keptByIndex({test.first, test.second}, test.mode), test.kept) << test.what;
+}
+
+TEST(Deduplication, AgreesWithAScanOfTheKeptList) {
+    std::mt19937 random(20261122);
+    const auto any = [&](int below) {
+        return std::uniform_int_distribution<int>(0, below - 1)(random);
+    };
+    const char* const versions[] = {"1", "01", "1.0", "1.9", "1.10", "<none>", "2", "1.09"};
+    for (int round = 0; round < 2000; ++round) {
+        std::vector<Registration> offered;
+        for (int i = any(24); i > 0; --i) {
+            offered.push_back({.identifier = std::string(1, static_cast<char>('a' + any(3))),
+                               .version = versions[any(8)],
+                               .onSystemVolume = any(2) == 1,
+                               .lastModified = any(3)});
+        }
+        for (const Mode mode : {newestOnly, allVersions, everything, Mode{false, true}})
+            ASSERT_EQ(keptByIndex(offered, mode), keptByScan(offered, mode)) << "round " << round;
+    }
+}
+
+} // namespace

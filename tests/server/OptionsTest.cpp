@@ -1,0 +1,68 @@
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include "zpd/ZPDOptions.h"
+
+namespace {
+
+std::optional<ZPDOptions> parse(std::vector<std::string> arguments) {
+    arguments.insert(arguments.begin(), "zpd");
+    std::vector<char*> argv;
+    for (auto& argument : arguments)
+        argv.push_back(argument.data());
+    argv.push_back(nullptr);
+    return ZPDOptions::parse(static_cast<int>(arguments.size()), argv.data());
+}
+
+TEST(Options, HaveDefaults) {
+    const auto options = parse({});
+    ASSERT_TRUE(options);
+    EXPECT_EQ(options->cacheLimit, 1'000'000U);
+    EXPECT_FALSE(options->databasePath);
+    EXPECT_EQ(options->serviceName, "com.tovana.zephrin.zpd");
+    EXPECT_EQ(options->verbose, 0U);
+}
+
+TEST(Options, TakeTheLastOfRepeatedOnesAndCountVerbose) {
+    const auto options = parse({"-c", "7", "-vS", "first", "-S", "second", "-d/a", "-v", "-c9"});
+    ASSERT_TRUE(options);
+    EXPECT_EQ(options->cacheLimit, 9U);
+    EXPECT_EQ(options->databasePath, "/a");
+    EXPECT_EQ(options->serviceName, "second");
+    EXPECT_EQ(options->verbose, 2U);
+}
+
+TEST(Options, ReadTheLeadingDigitsOfTheCacheLimit) {
+    const struct {
+        const char* text;
+        std::uint32_t limit;
+    } cases[] = {{"abc", 0},
+                 {"", 0},
+                 {"12abc", 12},
+                 {" 12", 0},
+                 {"-5", 0},
+                 {"+5", 0},
+                 {"0017", 17},
+                 {"4294967295", 4294967295U},
+                 {"4294967296", 4294967295U},
+                 {"99999999999999999999999999", 4294967295U}};
+
+    for (const auto& [text, limit] : cases) {
+        const auto options = parse({"-c", text});
+        ASSERT_TRUE(options) << text;
+        EXPECT_EQ(options->cacheLimit, limit) << text;
+    }
+}
+
+TEST(Options, RefuseWhatTheyDoNotKnow) {
+    for (const auto& arguments : std::vector<std::vector<std::string>>{
+             {"extra"}, {"-v", "extra"}, {"-x"}, {"-vx"}, {"-c"}, {"--help"}, {"--", "extra"}})
+        EXPECT_FALSE(parse(arguments)) << arguments.front();
+    EXPECT_TRUE(parse({"-v", "--"})) << "and start afresh after a failure";
+}
+
+} // namespace

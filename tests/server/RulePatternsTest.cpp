@@ -1,0 +1,46 @@
+#include "zpd/requests/RulePatterns.h"
+
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+namespace {
+
+using platform::Array;
+using platform::Dictionary;
+using platform::Value;
+
+Array alternatives(std::size_t count) {
+    return Array(std::vector<Value>(count, Value("x")));
+}
+
+Dictionary keys(std::size_t count) {
+    Dictionary rules;
+    for (std::size_t i = 0; i < count; ++i)
+        rules.set("key" + std::to_string(i), "x");
+    return rules;
+}
+
+TEST(RulePatterns, CountsEachOneAndEachAlternative) {
+    const struct {
+        const char* what;
+        Dictionary rules;
+        bool tooMany;
+    } cases[] = {
+        {"none", {}, false},
+        {"keys", keys(mostRulePatterns), false},
+        {"one key more", keys(mostRulePatterns + 1), true},
+        {"alternatives", {{"k", alternatives(mostRulePatterns)}}, false},
+        {"one alternative more", {{"k", alternatives(mostRulePatterns + 1)}}, true},
+        {"in two rules", {{"k", alternatives(mostRulePatterns)}, {"l", "x"}}, true},
+        {"nested", {{"k", Array{alternatives(mostRulePatterns), "x"}}}, true},
+        {"an offer", {{"k", keys(mostRulePatterns + 1)}}, true},
+        {"empty ones count too", {{"k", alternatives(mostRulePatterns)}, {"l", Array()}}, true},
+    };
+
+    for (const auto& test : cases)
+        EXPECT_EQ(hasTooManyPatterns(test.rules), test.tooMany) << test.what;
+}
+
+} // namespace
