@@ -1,6 +1,5 @@
 #pragma once
 
-#include <atomic>
 #include <cstdint>
 #include <expected>
 #include <memory>
@@ -100,8 +99,10 @@ public:
     // True when every rule holds; without rules they do.
     [[nodiscard]] bool match(const std::optional<platform::Dictionary>& rules) const;
     [[nodiscard]] bool matchKey(std::string_view key, const platform::Value& pattern) const;
+    // One pattern or any of several.
     [[nodiscard]] bool matchValue(const platform::Value& value,
                                   const platform::Value& patterns) const;
+    [[nodiscard]] bool matchValue(std::string_view value, std::string_view pattern) const;
     [[nodiscard]] bool matchDictionary(const platform::Value& value,
                                        const platform::Dictionary& pattern) const;
 
@@ -120,22 +121,23 @@ private:
     explicit ZPDPlugIn(const ZPDPlugInContext& context) : context_(context) {}
 
     [[nodiscard]] bool setupWithProxy(const ARZephrinProxy::Ptr& proxy);
-    void takeNames(const ARZephrinProxy& proxy);
+
+    // REQUIRES: the record's lock is held
     void refresh(const std::optional<platform::Uuid>& knowledge) const;
-    void takeProxy(const ARZephrinProxy::Ptr& proxy) const;
+    void takeInfo(const ARZephrinProxy::Ptr& proxy) const;
     void forgetForm() const;
+
+    [[nodiscard]] std::optional<platform::Value> sharedResources() const;
+    // Each answers whether everything was granted.
+    bool addResourceExtensions(platform::Dictionary& form) const;
+    bool addServiceExtension(platform::Dictionary& form) const;
+    bool issueInto(platform::Dictionary& tokens, const platform::Value& resource) const;
+    [[nodiscard]] std::expected<std::string, int> issueFileExtension(const std::string& file) const;
+    [[nodiscard]] std::expected<std::string, int>
+    issueServiceExtension(const std::string& bundleIdentifier) const;
 
     [[nodiscard]] std::optional<platform::Value> ruleValue(std::string_view key) const;
     [[nodiscard]] std::string electionText() const;
-    [[nodiscard]] bool matchPattern(std::string_view value, std::string_view pattern) const;
-
-    [[nodiscard]] std::optional<platform::Value> sharedResources() const;
-    [[nodiscard]] bool addResourceExtensions(platform::Dictionary& form) const;
-    [[nodiscard]] bool addServiceExtension(platform::Dictionary& form) const;
-    [[nodiscard]] std::expected<std::string, int>
-    issueFileExtension(const std::string& resourcePath) const;
-    [[nodiscard]] std::expected<std::string, int>
-    issueServiceExtension(const std::string& bundleIdentifier) const;
 
     const ZPDPlugInContext& context_;
     std::optional<std::string> dataContainerPath_;

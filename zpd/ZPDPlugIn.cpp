@@ -1,0 +1,186 @@
+#include "zpd/ZPDPlugIn.h"
+
+#include "AppRegistry/ARApplicationWorkspace.h"
+#include "Zephrin/InfoKeys.h"
+#include "Zephrin/ZPDError.h"
+#include "Zephrin/ZPDLog.h"
+#include "zpd/Entitlements.h"
+
+using platform::Dictionary;
+using platform::Error;
+using platform::Uuid;
+using platform::Value;
+
+namespace {
+
+constexpr std::uint64_t oldStyleHubVersion = 1;
+constexpr std::uint64_t currentHubVersion = 2;
+constexpr std::string_view systemFolder = "/System/";
+constexpr std::string_view developmentKeyPrefix = "DT";
+
+std::uint64_t unsignedValue(const Value& value) {
+    return value.unsignedInteger().value_or(
+        static_cast<std::uint64_t>(value.integerValue().value_or(0)));
+}
+
+std::uint64_t hubProtocolVersionOf(const std::optional<Dictionary>& plugIn,
+                                   const std::optional<Dictionary>& info) {
+    const Value* const said = plugIn ? plugIn->find(InfoKey::hubProtocolVersion) : nullptr;
+    if (said)
+        return unsignedValue(*said);
+    return info && info->contains(InfoKey::oldStyle) ? oldStyleHubVersion : currentHubVersion;
+}
+
+std::int64_t wholeSeconds(platform::Date date) {
+    return Value(date.secondsSinceEpoch).integerValue().value_or(0);
+}
+
+std::optional<Value> entry(const Dictionary* dictionary, std::string_view key) {
+    const Value* const found = dictionary ? dictionary->find(key) : nullptr;
+    return found ? std::optional(*found) : std::nullopt;
+}
+
+} // namespace
+
+// ---- Making
+
+ZPDPlugIn::Ptr ZPDPlugIn::create(const ARZephrinProxy::Ptr& proxy,
+                                 const ZPDPlugInContext& context) {
+    Ptr made(new ZPDPlugIn(context));
+    if (!made->setupWithProxy(proxy))
+        return nullptr;
+    if (const auto fault = made->diagnose()) {
+        ZPDLogAr().info("ignoring mis-configured plug-in at %@: %{public}@", made->path(), *fault);
+        return nullptr;
+    }
+    return made;
+}
+
+bool ZPDPlugIn::setupWithProxy(const ARZephrinProxy::Ptr& proxy) {
+    if (!setup(proxy->plugInIdentifier(), proxy->bundlePath(), std::nullopt, proxy->plugInUUID()))
+        return false;
+    const auto plugInInfo = proxy->plugInDictionary();
+    setPlugInDictionary(plugInInfo);
+    setLastModified(wholeSeconds(proxy->registrationDate()));
+    setOnSystemVolume(proxy->isOnSystemPartition());
+
+    const auto containing = proxy->containingBundle();
+    setLocalizedName(proxy->localizedName());
+    setLocalizedShortName(proxy->localizedShortName());
+    setLocalizedContainingName(containing ? containing->localizedName() : std::nullopt);
+
+    setOriginalIdentifier(proxy->originalIdentifier());
+    setEntitlements(proxy->entitlements());
+    dataContainerPath_ = proxy->dataContainerPath();
+    infoPlist_ = proxy->infoDictionary();
+    known_ = proxy;
+    setHubProtocolVersion(hubProtocolVersionOf(plugInInfo, infoPlist_));
+    setContainingPath(containing ? std::optional(containing->bundlePath()) : std::nullopt);
+    return true;
+}
+
+// ---- Following the registry
+
+ARZephrinProxy::Ptr ZPDPlugIn::getProxy() const {
+    auto proxy = context_.workspace.zephrinProxyForUUID(uuid());
+    if (proxy)
+        return proxy;
+    ZPDLogAr().standard("Failed to find Plugin by %{uuid_t}.16P fallback to path %@", uuid(),
+                        url());
+    return context_.workspace.zephrinProxyForPath(path());
+}
+
+std::optional<Uuid> ZPDPlugIn::arKnowledgeUUID() const {
+    const auto lock = locked();
+    return arKnowledgeUUID_;
+}
+
+std::optional<Dictionary> ZPDPlugIn::infoPlist() const {
+    const auto lock = locked();
+    return infoPlist_;
+}
+
+std::optional<Dictionary> ZPDPlugIn::bundleInfoDictionary() const {
+    const auto knowledge = context_.workspace.knowledge().uuid;
+    const auto lock = locked();
+    if (!knowledge || knowledge != arKnowledgeUUID_)
+        refresh(knowledge);
+    return infoPlist_;
+}
+
+void ZPDPlugIn::refresh(const std::optional<Uuid>& knowledge) const {
+    if (const auto proxy = getProxy()) {
+        takeInfo(proxy);
+    } else {
+        ZPDLogAr().error("could not obtain fresh proxy for %@", uuid());
+        known_.reset();
+        infoPlist_.reset();
+        forgetForm();
+    }
+    arKnowledgeUUID_ = knowledge;
+}
+
+// Most moves of the registry concern other plug-ins: then the very same entry, or an equal
+// dictionary, comes back, and nothing that was derived from it is thrown away.
+void ZPDPlugIn::takeInfo(const ARZephrinProxy::Ptr& proxy) const {
+    if (infoPlist_ && known_.lock() == proxy)
+        return;
+    auto fresh = proxy->infoDictionary();
+    known_ = proxy;
+    if (infoPlist_ == fresh)
+        return;
+    infoPlist_ = std::move(fresh);
+    forgetForm();
+}
+
+std::optional<Value> ZPDPlugIn::infoKey(std::string_view key) const {
+    const auto info = bundleInfoDictionary();
+    return entry(info ? &*info : nullptr, key);
+}
+
+std::optional<Value> ZPDPlugIn::pluginKey(std::string_view key) const {
+    const auto extension = infoKey(InfoKey::extension);
+    return entry(extension ? extension->dictionary() : nullptr, key);
+}
+
+Dictionary ZPDPlugIn::prunedInfoDictionaryFor(const std::optional<Dictionary>& info) {
+    std::vector<platform::DictionaryEntry> kept;
+    for (const auto& item : info.value_or(Dictionary())) {
+        if (!item.key.view().starts_with(developmentKeyPrefix))
+            kept.push_back(item);
+    }
+    return Dictionary(std::move(kept));
+}
+
+// ---- Entitlements
+
+std::optional<Value> ZPDPlugIn::valueForEntitlement(std::string_view key) const {
+    const auto& held = entitlements();
+    return entry(held ? &*held : nullptr, key);
+}
+
+bool ZPDPlugIn::hasEntitlement(std::string_view key) const {
+    const auto value = valueForEntitlement(key);
+    return value && !value->equalsFalse();
+}
+
+std::string ZPDPlugIn::annotationKey() const {
+    const auto replaced = valueForEntitlement(Entitlement::replacePlugIn);
+    const auto text = replaced ? replaced->string() : std::nullopt;
+    return text ? std::string(*text) : identifier();
+}
+
+// ---- Check
+
+std::optional<Error> ZPDPlugIn::diagnose() const {
+    if (auto fault = ZPPlugInCore::diagnose())
+        return fault;
+    if (!isData() && !dataContainerPath_) {
+        return ZPDErrorMake(ZPDErrorCode::badPlugIn, "this plug-in has no sandbox data container");
+    }
+    if (!containingPath() && !path().starts_with(systemFolder)) {
+        return ZPDErrorMake(ZPDErrorCode::badPlugIn,
+                            "plug-ins outside containing apps must be in /System");
+    }
+    return std::nullopt;
+}
