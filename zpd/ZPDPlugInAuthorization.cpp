@@ -1,0 +1,35 @@
+// Who may see and use a plug-in. Two restrictions, each in force by itself, the first denial wins:
+// what the host's own entitlement leaves it (rules for plug-ins), and the entitlement that the
+// plug-in asks of every host.
+
+#include "Zephrin/InfoKeys.h"
+#include "platform/log/Render.h"
+#include "zpd/Entitlements.h"
+#include "zpd/ZPDEntitlementHolder.h"
+#include "zpd/ZPDPlugIn.h"
+
+using platform::Value;
+
+namespace {
+
+std::string lacksEntitlement(const Value& entitlement) {
+    const platform::log::Argument argument[] = {platform::log::Argument(entitlement)};
+    return platform::log::render("the host does not have the \"%@\" entitlement", argument, true);
+}
+
+} // namespace
+
+std::optional<std::string> ZPDPlugIn::allowForClient(ZPDEntitlementHolder& client) const {
+    if (const auto allowed = client.entitlementValueForKey(Entitlement::allowedPlugIns)) {
+        if (!allowed->dictionary())
+            return "invalid host restriction entitlement";
+        if (!match(*allowed->dictionary()))
+            return "the host's plug-in entitlement does not allow this plug-in";
+    }
+    if (const auto required = pluginKey(InfoKey::hostEntitlement)) {
+        const auto name = required->string();
+        if (!name || !client.hasEntitlement(*name))
+            return lacksEntitlement(*required);
+    }
+    return std::nullopt;
+}
