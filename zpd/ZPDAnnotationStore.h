@@ -1,5 +1,6 @@
 #pragma once
 
+#include <expected>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -43,11 +44,11 @@ public:
     [[nodiscard]] std::optional<platform::Error> saveDb();
 
 private:
+    // Where earlier versions kept the store.
+    [[nodiscard]] std::expected<std::string, platform::Error> containerPath() const;
     void migrate();
-    void reportUnlessWritable() const;
-    void store(std::string_view key, const std::optional<platform::Dictionary>& annotation);
-    [[nodiscard]] std::optional<platform::Dictionary>
-    merged(std::string_view key, const platform::Dictionary& changes) const;
+    void prepareFolder(bool usualPlace) const;
+    void add(const std::string& key, const platform::Dictionary& changes);
 
     platform::Containers& containers_;
     std::string path_;

@@ -1,0 +1,224 @@
+#include "zpd/ZPDAnnotationStore.h"
+
+#include <unistd.h>
+
+#include "Zephrin/FileURL.h"
+#include "Zephrin/ZPDError.h"
+#include "Zephrin/ZPDLog.h"
+#include "platform/container/Containers.h"
+#include "platform/file/File.h"
+#include "platform/plist/PropertyList.h"
+#include "platform/probe/Probes.h"
+#include "zpd/ZPDPlugIn.h"
+
+using platform::Dictionary;
+using platform::DictionaryEntry;
+using platform::Error;
+using platform::Value;
+
+namespace {
+
+constexpr std::int64_t storeVersion = 16;
+constexpr const char* versionKey = "version";
+constexpr const char* dataKey = "data";
+
+constexpr const char* globalFolder = "/var/db";
+constexpr const char* storeFile = "/Zephrin-Annotations";
+constexpr const char* olderContainer = "com.tovana.zpd";
+constexpr unsigned globalFolderMode = 0755;
+
+// All annotations together are at most 16 MiB in their compact encoding; XML takes more.
+constexpr std::size_t largestStore = 128U << 20;
+// An annotation came over the wire, which nests this deep, and stands three levels down.
+constexpr std::size_t deepestStore = 64 + 3;
+
+std::expected<Dictionary, Error> readStore(const std::string& path) {
+    auto content = platform::readRegularFile(path, largestStore);
+    if (!content)
+        return std::unexpected(content.error());
+    auto root = platform::plist::parse(content->bytes, deepestStore);
+    if (!root)
+        return std::unexpected(root.error());
+    const Dictionary* const entries = root->dictionary();
+    const Value* const version = entries ? entries->find(versionKey) : nullptr;
+    const std::int64_t found = version ? version->integerValue().value_or(0) : 0;
+    if (found != storeVersion) {
+        return std::unexpected(ZPDErrorMakeFormat(ZPDErrorCode::version,
+                                                  "found database version %d needed version %d",
+                                                  found, storeVersion));
+    }
+    const Value* const data = entries->find(dataKey);
+    if (!data || !data->dictionary()) {
+        return std::unexpected(Error{&platform::formatErrorDomain, platform::formatErrorCorrupt,
+                                     "the data of the annotation database is not a dictionary"});
+    }
+    return *data->dictionary();
+}
+
+// Fires the probe with what went wrong, at each of the two places that are tried.
+std::optional<Error> probed(const std::string& path, std::optional<Error> failure) {
+    if (failure)
+        platform::probe::dbLoad(path.c_str(), static_cast<std::uint64_t>(failure->code));
+    return failure;
+}
+
+bool isMissingFile(const Error& error) {
+    return error.domain == &platform::fileErrorDomain &&
+           error.code == platform::fileErrorNoSuchFile;
+}
+
+template <class Keep>
+Dictionary entriesThat(const Dictionary& annotations, Keep&& keep) {
+    std::vector<DictionaryEntry> kept;
+    for (const DictionaryEntry& entry : annotations) {
+        if (keep(entry.value))
+            kept.push_back(entry);
+    }
+    return Dictionary(std::move(kept));
+}
+
+std::expected<std::string, Error> storeText(const Dictionary& annotations) {
+    return platform::plist::writeXml(
+        Dictionary{{versionKey, storeVersion}, {dataKey, annotations}});
+}
+
+std::string folderOf(const std::string& path) {
+    const auto slash = path.rfind('/');
+    return slash == std::string::npos ? "." : path.substr(0, slash + 1);
+}
+
+} // namespace
+
+// ---- Places
+
+std::string ZPDAnnotationStore::globalPath() {
+    return std::string(globalFolder) + storeFile;
+}
+
+std::string ZPDAnnotationStore::defaultDatabasePath() {
+    return globalPath();
+}
+
+std::expected<std::string, Error> ZPDAnnotationStore::containerPath() const {
+    auto container = containers_.dataContainer(olderContainer);
+    if (container)
+        return *container + storeFile;
+    const auto code = static_cast<std::uint64_t>(container.error().code);
+    ZPDLogOps().error("failed to get storage container: error=%llu", code);
+    return std::unexpected(ZPDErrorMakeFormat(container.error().code,
+                                              "unable to locate user container: error %llu", code));
+}
+
+// ---- Loading
+
+ZPDAnnotationStore::ZPDAnnotationStore(const std::optional<std::string>& databasePath,
+                                       platform::Containers& containers)
+    : containers_(containers), path_(databasePath.value_or(defaultDatabasePath())) {
+    prepareFolder(!databasePath);
+    const auto failure = probed(path_, loadDb(path_));
+    if (!failure)
+        return;
+    if (!isMissingFile(*failure)) {
+        ZPDLogOps().error("unable to load annotation database:%{public}@ error:%{public}@ "
+                          "(resetting)",
+                          fileURLFromPath(path_), *failure);
+    }
+    migrate();
+}
+
+// Only where nothing could be loaded: a good store is never overwritten by an older one. Without
+// a container to look into there is nothing older, and the daemon goes on.
+void ZPDAnnotationStore::migrate() {
+    const auto older = containerPath();
+    if (!older || probed(*older, loadDb(*older)))
+        return;
+    ZPDLogOps().info("migrating shared annotations");
+    if (const auto failure = saveDb()) {
+        ZPDLogOps().error("unable to save migrated annotations to %{public}@ error:%{public}@",
+                          fileURLFromPath(path_), *failure);
+    }
+}
+
+std::optional<Error> ZPDAnnotationStore::loadDb(const std::string& path) {
+    const auto loaded = readStore(path);
+    if (!loaded)
+        return loaded.error();
+    annotations_ = entriesThat(*loaded, [](const Value& entry) { return entry.dictionary(); });
+    return std::nullopt;
+}
+
+// Makes the usual folder where it is missing, and says now, rather than at the first change, when
+// nothing can be written.
+void ZPDAnnotationStore::prepareFolder(bool usualPlace) const {
+    std::optional<Error> failure;
+    if (usualPlace)
+        failure = platform::makeFolders(globalFolder, globalFolderMode);
+    const std::string folder = folderOf(path_);
+    if (!failure && ::access(folder.c_str(), W_OK | X_OK) != 0)
+        failure = platform::posixError(errno, folder);
+    if (failure) {
+        ZPDLogOps().error("annotation database %{public}@ cannot be written: %{public}@", path_,
+                          *failure);
+    }
+}
+
+// ---- Saving
+
+// One annotation that a property list cannot hold must not keep all the others from the disk: it
+// alone is left out, and reported.
+std::optional<Error> ZPDAnnotationStore::saveDb() {
+    std::optional<Error> failure;
+    auto text = storeText(annotations_);
+    if (!text) {
+        failure = text.error();
+        text = storeText(entriesThat(annotations_, [](const Value& entry) {
+            return platform::plist::writeXml(entry).has_value();
+        }));
+        if (!text)
+            return text.error();
+    }
+    if (auto unwritten = platform::writeFileAtomically(path_, *text))
+        return unwritten;
+    unsaved_ = false;
+    return failure;
+}
+
+// ---- Annotations
+
+std::optional<Dictionary> ZPDAnnotationStore::annotationForIdentifier(std::string_view key) const {
+    const Value* const found = annotations_.find(key);
+    return found ? std::optional(*found->dictionary()) : std::nullopt;
+}
+
+std::optional<Dictionary> ZPDAnnotationStore::annotationForPlugIn(const ZPDPlugIn& plugIn) const {
+    return annotationForIdentifier(plugIn.annotationKey());
+}
+
+void ZPDAnnotationStore::setAnnotation(const std::optional<Dictionary>& annotation,
+                                       const ZPDPlugIn& plugIn) {
+    const std::string key = plugIn.annotationKey();
+    if (annotation) {
+        add(key, *annotation);
+    } else if (annotations_.contains(key)) {
+        annotations_.remove(key);
+        unsaved_ = true;
+    }
+    if (!unsaved_)
+        return;
+    if (const auto failure = saveDb()) {
+        ZPDLogOps().error("unable to save annotations:%{public}@ error:%{public}@",
+                          fileURLFromPath(path_), *failure);
+    }
+}
+
+// An annotation that does not change stays the same object, so that forms made with it stand.
+void ZPDAnnotationStore::add(const std::string& key, const Dictionary& changes) {
+    const auto stored = annotationForIdentifier(key);
+    Dictionary merged = stored.value_or(Dictionary());
+    for (const DictionaryEntry& change : changes)
+        merged.set(change.key, change.value);
+    if (stored == merged)
+        return;
+    annotations_.set(key, std::move(merged));
+    unsaved_ = true;
+}
