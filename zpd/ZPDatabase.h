@@ -19,6 +19,8 @@
 #include "zpd/ZPDPlugIn.h"
 #include "zpd/ZPDPlugInContext.h"
 
+class ZPDElectionFilter;
+
 // Told of plug-ins that the registry removed, outside the database's queue.
 class ZPDatabaseDelegate {
 public:
@@ -90,8 +92,6 @@ protected:
     [[nodiscard]] const Platform& platformServices() const { return platform_; }
 
 private:
-    class ElectionFilter;
-
     void pluginsDidInstall(const std::vector<ARZephrinProxy::Ptr>& plugIns) override;
     void pluginsWillUninstall(const std::vector<ARZephrinProxy::Ptr>& plugIns) override;
 
@@ -104,6 +104,8 @@ private:
     [[nodiscard]] std::optional<ARApplicationWorkspace::PlugIns>
     candidates(const std::optional<platform::Dictionary>& query);
     [[nodiscard]] ZPDPlugIn::Ptr plugInForCandidate(const ARZephrinProxy::Ptr& proxy);
+    [[nodiscard]] bool hasElection(const ZPDElectionFilter& elections, std::string_view identifier,
+                                   const std::optional<platform::Dictionary>& entitlements);
     [[nodiscard]] std::size_t cacheSize();
 
     const Platform platform_;
