@@ -6,7 +6,8 @@
 //   a text         one comparison, with an operator in front
 //   an array       any of several such texts
 
-#include "Zephrin/InfoKeys.h"
+#include <algorithm>
+
 #include "Zephrin/ZPDLog.h"
 #include "platform/types/Types.h"
 #include "platform/value/NumericOrder.h"
