@@ -1,8 +1,10 @@
 #pragma once
 
+#include <expected>
 #include <optional>
 #include <string>
 
+#include "platform/value/Error.h"
 #include "platform/value/Value.h"
 
 namespace platform {
@@ -14,16 +16,24 @@ class BundleReader {
 public:
     enum class Property { bundlePath, executablePath, supportPath };
 
-    // The bundle at a directory path; invalid when there is no readable Info.plist.
+    // A larger Info.plist is not read.
+    static constexpr std::size_t largestInfo = 1024 * 1024;
+
+    // The bundle at a directory path, or why there is none that can be read.
+    [[nodiscard]] static std::expected<BundleReader, Error> read(const std::string& path);
+    // The same; invalid when there is none.
     [[nodiscard]] static BundleReader atPath(const std::string& path);
     // The nearest enclosing folder whose Info.plist names this very file as its executable.
     [[nodiscard]] static BundleReader forExecutable(const std::string& path);
 
+    // The executable path is there only when the bundle names a regular file right in its folder.
     [[nodiscard]] std::optional<std::string> stringProperty(Property property) const;
 
     [[nodiscard]] const std::optional<Dictionary>& infoDictionary() const { return info_; }
 
 private:
+    [[nodiscard]] std::optional<std::string> executablePath() const;
+
     std::optional<std::string> path_; // canonical
     std::optional<Dictionary> info_;
 };

@@ -121,4 +121,13 @@ std::expected<std::string, int> canonicalPath(std::string_view path) {
     return std::string(found.get());
 }
 
+bool isPlainName(std::string_view name) {
+    constexpr std::size_t longest = 255;
+    const auto allowed = [](char c) {
+        return static_cast<unsigned char>(c) >= 0x20 && c != '\x7f' && c != '/';
+    };
+    return !name.empty() && name.size() <= longest && name != "." && name != ".." &&
+           std::ranges::all_of(name, allowed);
+}
+
 } // namespace platform

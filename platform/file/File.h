@@ -84,6 +84,10 @@ writeFileAtomically(const std::string& path, std::string_view bytes, unsigned mo
 // resolves. On failure the errno value.
 [[nodiscard]] std::expected<std::string, int> canonicalPath(std::string_view path);
 
+// True for the name of one file: 1 to 255 bytes without "/", NUL or control characters, and neither
+// "." nor "..".
+[[nodiscard]] bool isPlainName(std::string_view name);
+
 // Makes a folder and the missing ones above it, each with `mode` (less the umask). Nothing when it
 // is there afterwards.
 [[nodiscard]] std::optional<Error> makeFolders(const std::string& path, unsigned mode);
