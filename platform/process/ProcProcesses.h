@@ -1,0 +1,14 @@
+#pragma once
+
+#include "platform/process/Processes.h"
+
+namespace platform {
+
+// Other processes as /proc tells of them. No state; any thread.
+class ProcProcesses final : public Processes {
+public:
+    [[nodiscard]] std::expected<std::string, int> executablePath(pid_t pid,
+                                                                 std::size_t room) override;
+};
+
+} // namespace platform
