@@ -4,7 +4,6 @@
 #include "Zephrin/ZPDLog.h"
 #include "platform/ipc/Cbor.h"
 
-using platform::Dictionary;
 using platform::Error;
 using platform::SharedBytes;
 
