@@ -1,0 +1,113 @@
+#include "zpctl/Daemon.h"
+
+#include <cstdio>
+#include <future>
+#include <memory>
+#include <utility>
+
+#include "Zephrin/FileURL.h"
+#include "platform/ipc/Message.h"
+
+namespace zpctl {
+
+namespace {
+
+using platform::Dictionary;
+using platform::Value;
+using platform::ipc::ConnectionError;
+
+std::string secondsText(std::chrono::milliseconds time) {
+    char text[32];
+    std::snprintf(text, sizeof text, "%g s", static_cast<double>(time.count()) / 1000);
+    return text;
+}
+
+Failure noAnswer(std::chrono::milliseconds timeout) {
+    return {Status::noDaemon, "the daemon did not answer within " + secondsText(timeout), {}};
+}
+
+Failure disconnected(ConnectionError error) {
+    const char* what = error == ConnectionError::interrupted
+                           ? "the daemon went away while it was asked"
+                           : "no daemon to talk to";
+    return {Status::noDaemon, what + (" (" + platform::ipc::describe(error) + ")"), {}};
+}
+
+Failure refused(const platform::Error& error) {
+    return {Status::refused, error.description.value_or("the daemon gave no reason"), error.code};
+}
+
+Failure unreadable(const char* what) {
+    return {Status::refused, what, {}};
+}
+
+} // namespace
+
+std::expected<Dictionary, Failure> Daemon::ask(const Request& request) {
+    // Shared, because the reply may still come when nobody waits for it any more.
+    const auto promise = std::make_shared<std::promise<ZPDaemonClient::Reply>>();
+    auto arrival = promise->get_future();
+    request(client_, [promise](const ZPDaemonClient::Reply& reply) { promise->set_value(reply); });
+    if (arrival.wait_for(timeout_) != std::future_status::ready)
+        return std::unexpected(noAnswer(timeout_));
+    ZPDaemonClient::Reply reply = arrival.get();
+    if (!reply)
+        return std::unexpected(disconnected(reply.error()));
+    if (const auto error = ZPDaemonClient::errorInReply(reply))
+        return std::unexpected(refused(*error));
+    return *std::move(reply);
+}
+
+std::expected<Value, Failure> Daemon::askForMatches(const Request& request) {
+    const auto reply = ask(request);
+    if (!reply)
+        return std::unexpected(reply.error());
+    const Value* matches = reply->find("matches");
+    if (!matches)
+        return std::unexpected(unreadable("the daemon knows the plug-in but cannot describe it"));
+    auto records = client_.convertFromIPC(*matches);
+    if (!records)
+        return std::unexpected(unreadable("the daemon's answer cannot be read"));
+    return *std::move(records);
+}
+
+std::expected<Dictionary, Failure> Daemon::askForForm(const Request& request) {
+    const auto matches = askForMatches(request);
+    if (!matches)
+        return std::unexpected(matches.error());
+    if (!matches->dictionary())
+        return std::unexpected(unreadable("the daemon's answer is not a plug-in"));
+    return *matches->dictionary();
+}
+
+std::expected<std::vector<Dictionary>, Failure> Daemon::match(const Dictionary& rules,
+                                                              std::uint64_t flags) {
+    const auto matches = askForMatches([&](ZPDaemonClient& client, auto reply) {
+        client.matchPlugIns(rules, flags, std::move(reply));
+    });
+    if (!matches)
+        return std::unexpected(matches.error());
+    if (!matches->array())
+        return std::unexpected(unreadable("the daemon's answer is not a list of plug-ins"));
+    std::vector<Dictionary> forms;
+    for (const Value& form : *matches->array()) {
+        if (form.dictionary())
+            forms.push_back(*form.dictionary());
+    }
+    return forms;
+}
+
+std::expected<Dictionary, Failure> Daemon::find(const platform::Uuid& uuid) {
+    return askForForm([&](ZPDaemonClient& client, auto reply) {
+        client.findPlugInByUUID(uuid, std::move(reply));
+    });
+}
+
+std::expected<Dictionary, Failure> Daemon::findAtPath(const std::string& path) {
+    return askForForm([&](ZPDaemonClient& client, auto reply) {
+        const platform::Url url{platform::SharedBytes(std::string_view(fileURLFromPath(path)))};
+        client.findPlugInByPathURL(url, std::move(reply));
+    });
+}
+
+} // namespace zpctl

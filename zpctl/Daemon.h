@@ -1,0 +1,53 @@
+#pragma once
+
+#include <chrono>
+#include <cstdint>
+#include <expected>
+#include <functional>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "Zephrin/ZPDaemonClient.h"
+#include "platform/value/Value.h"
+#include "zpctl/Verb.h"
+
+namespace zpctl {
+
+// Why a verb came to nothing: the exit status, and what a person reads about it.
+struct Failure {
+    Status status = Status::refused;
+    std::string message;
+    std::optional<std::int64_t> code; // the daemon's, when it has refused
+};
+
+// A connection to the daemon for a tool that asks and waits. Replies arrive on the client
+// library's queue; every call here blocks its thread until then, or until the time is up. Owned by
+// the session; one thread.
+class Daemon {
+public:
+    // No name is the usual service.
+    Daemon(std::optional<std::string> serviceName, std::chrono::milliseconds timeout)
+        : client_(std::move(serviceName)), timeout_(timeout) {}
+
+    // Forms of plug-ins; `flags` are the ZPDiscover bits.
+    [[nodiscard]] std::expected<std::vector<platform::Dictionary>, Failure>
+    match(const platform::Dictionary& rules, std::uint64_t flags);
+
+    // The form of one plug-in.
+    [[nodiscard]] std::expected<platform::Dictionary, Failure> find(const platform::Uuid& uuid);
+    [[nodiscard]] std::expected<platform::Dictionary, Failure> findAtPath(const std::string& path);
+
+private:
+    using Request = std::function<void(ZPDaemonClient&, ZPDaemonClient::ReplyBlock)>;
+
+    [[nodiscard]] std::expected<platform::Dictionary, Failure> ask(const Request& request);
+    // What stands under "matches" in the answer to a request.
+    [[nodiscard]] std::expected<platform::Value, Failure> askForMatches(const Request& request);
+    [[nodiscard]] std::expected<platform::Dictionary, Failure> askForForm(const Request& request);
+
+    ZPDaemonClient client_;
+    const std::chrono::milliseconds timeout_;
+};
+
+} // namespace zpctl
