@@ -1,0 +1,45 @@
+#include "zpctl/Session.h"
+
+#include <ostream>
+
+#include <nlohmann/json.hpp>
+
+#include "zpctl/Json.h"
+#include "zpctl/Printable.h"
+
+namespace zpctl {
+
+Daemon& Session::daemon() {
+    if (!daemon_) {
+        const std::chrono::duration<double> timeout(options_.timeout);
+        daemon_ = std::make_unique<Daemon>(
+            options_.service, std::chrono::duration_cast<std::chrono::milliseconds>(timeout));
+    }
+    return *daemon_;
+}
+
+Status Session::report(const nlohmann::ordered_json& json,
+                       const std::function<void()>& write) const {
+    if (options_.json)
+        out() << jsonText(json);
+    else
+        write();
+    return Status::done;
+}
+
+Status Session::fail(const Failure& failure) const {
+    if (options_.json) {
+        nlohmann::ordered_json error{{"message", failure.message}};
+        if (failure.code)
+            error["code"] = *failure.code;
+        terminal_.err << jsonText({{"error", error}});
+        return failure.status;
+    }
+    terminal_.err << "zpctl: " << printable(failure.message);
+    if (failure.code)
+        terminal_.err << " (code " << *failure.code << ')';
+    terminal_.err << '\n';
+    return failure.status;
+}
+
+} // namespace zpctl
