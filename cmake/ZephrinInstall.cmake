@@ -1,4 +1,4 @@
-# What `make install` puts where. Folders call zephrin_install_program and zephrin_install_library.
+# What `make install` puts where. The root lists the programs and the library.
 
 include(GNUInstallDirs)
 
