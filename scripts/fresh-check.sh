@@ -57,7 +57,6 @@ remove_root() {
     rm -rf --one-file-system "$root"
 }
 
-# A clone by path keeps the ownership that git trusts.
 check() {
     root=$folder/$1
     remove_root
