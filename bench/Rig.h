@@ -1,0 +1,42 @@
+#pragma once
+
+#include <memory>
+#include <string>
+
+#include "bench/Exchange.h"
+#include "bench/Floor.h"
+#include "tests/e2e/Daemon.h"
+
+namespace bench {
+
+// The daemon on a home, and one connection to it. The home must outlive it.
+class Rig {
+public:
+    explicit Rig(const std::string& home);
+
+    [[nodiscard]] const e2e::Daemon& daemon() const { return daemon_; }
+
+    [[nodiscard]] e2e::WireClient& client() { return client_; }
+
+    [[nodiscard]] Exchange exchange(const std::string& request);
+
+private:
+    e2e::Daemon daemon_;
+    e2e::WireClient client_;
+};
+
+// The floor for the very bytes of a request and its reply.
+struct FloorExchange {
+    FloorExchange(const std::string& request, std::size_t replySize)
+        : floor(request.size(), replySize), exchange(floor.fd(), floor.pid(), request, replySize) {}
+
+    Floor floor;
+    Exchange exchange;
+};
+
+[[nodiscard]] std::string findFrame(const std::string& path);
+[[nodiscard]] std::string matchFrame(const std::string& point);
+// Size of the reply to a request, header included.
+[[nodiscard]] std::size_t replySize(e2e::WireClient& client, const std::string& request);
+
+} // namespace bench
