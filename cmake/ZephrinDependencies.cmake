@@ -3,7 +3,7 @@
 #   sdt               sys/sdt.h, static probes
 #   systemd_optional  libsystemd, with HAVE_LIBSYSTEMD=1 where it is there; else empty
 # Imported ones: Threads::Threads EXPAT::EXPAT SQLite::SQLite3 OpenSSL::Crypto CLI11::CLI11
-# nlohmann_json::nlohmann_json GTest::gmock_main benchmark::benchmark
+# nlohmann_json::nlohmann_json GTest::gmock_main
 
 find_package(Threads REQUIRED)
 find_package(EXPAT REQUIRED)
@@ -36,11 +36,5 @@ if(ZEPHRIN_TESTS)
   find_package(GTest QUIET)
   if(NOT GTest_FOUND)
     message(STATUS "GoogleTest not found: the tests are left out")
-  endif()
-endif()
-if(ZEPHRIN_BENCH)
-  find_package(benchmark QUIET)
-  if(NOT benchmark_FOUND)
-    message(STATUS "Google Benchmark not found: the benchmarks are left out")
   endif()
 endif()

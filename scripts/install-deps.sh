@@ -10,8 +10,7 @@ packages_of() {
             libssl-dev systemtap-sdt-dev libcli11-dev nlohmann-json3-dev libsystemd-dev
         ;;
     test) echo libgtest-dev libgmock-dev binutils ;;
-    demo) ;;
-    bench) echo libbenchmark-dev ;;
+    demo | bench) ;;
     fuzz) echo clang-19 libclang-rt-19-dev ;;
     lint) echo git clang-format-19 clang-tidy-19 ;;
     *)
