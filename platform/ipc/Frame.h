@@ -12,7 +12,7 @@
 namespace platform::ipc {
 
 // One message is one frame: a header of 16 bytes, little-endian, and a body of one CBOR map.
-// docs/wire.md describes it in full.
+// docs/wire-format.md describes it in full.
 
 inline constexpr std::size_t frameHeaderSize = 16;
 inline constexpr std::uint8_t wireVersion = 1;
