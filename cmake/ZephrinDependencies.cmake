@@ -1,5 +1,5 @@
 # The libraries that the project stands on. Targets that this file defines:
-#   asio              standalone Asio (header only, without its deprecated parts)
+#   asio              standalone Asio, without its deprecated parts; platform/ipc compiles it
 #   sdt               sys/sdt.h, static probes
 #   systemd_optional  libsystemd, with HAVE_LIBSYSTEMD=1 where it is there; else empty
 # Imported ones: Threads::Threads EXPAT::EXPAT SQLite::SQLite3 OpenSSL::Crypto CLI11::CLI11
@@ -16,7 +16,8 @@ find_package(PkgConfig REQUIRED)
 find_path(ASIO_INCLUDE_DIR asio.hpp REQUIRED)
 add_library(asio INTERFACE)
 target_include_directories(asio SYSTEM INTERFACE ${ASIO_INCLUDE_DIR})
-target_compile_definitions(asio INTERFACE ASIO_STANDALONE ASIO_NO_DEPRECATED)
+target_compile_definitions(asio INTERFACE
+  ASIO_STANDALONE ASIO_NO_DEPRECATED ASIO_SEPARATE_COMPILATION)
 target_link_libraries(asio INTERFACE Threads::Threads)
 
 find_path(SDT_INCLUDE_DIR sys/sdt.h REQUIRED)
