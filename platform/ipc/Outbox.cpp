@@ -1,0 +1,136 @@
+#include "platform/ipc/Outbox.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <climits>
+#include <sys/socket.h>
+
+#include "platform/ipc/CborEncoder.h"
+
+namespace platform::ipc {
+
+namespace {
+
+iovec part(const char* data, std::size_t size) {
+    return {const_cast<char*>(data), size}; // sendmsg only reads
+}
+
+// The first pieces of a frame, as many as one call takes.
+std::vector<iovec>& partsOf(std::string_view text, const CborEncoder& encoder) {
+    thread_local std::vector<iovec> parts;
+    parts.clear();
+    encoder.forEachPiece(
+        [&](std::size_t from, std::size_t size) {
+            if (parts.size() < IOV_MAX)
+                parts.push_back(part(text.data() + from, size));
+        },
+        [&](const SharedBytes& piece) {
+            if (parts.size() < IOV_MAX)
+                parts.push_back(part(piece.data(), piece.size()));
+        });
+    return parts;
+}
+
+} // namespace
+
+void Outbox::open(int descriptor) {
+    const std::lock_guard lock(mutex_);
+    descriptor_ = descriptor;
+}
+
+void Outbox::close() {
+    const std::lock_guard lock(mutex_);
+    closed_ = true;
+    descriptor_ = -1;
+    pieces_.clear();
+    waiting_.store(false, std::memory_order_release);
+}
+
+// False when the socket is broken; `count` is what was written.
+bool Outbox::write(std::span<iovec> parts, std::size_t& count) {
+    count = 0;
+    msghdr message{};
+    message.msg_iov = parts.data();
+    message.msg_iovlen = parts.size();
+    ssize_t sent = 0;
+    do {
+        sent = ::sendmsg(descriptor_, &message, MSG_NOSIGNAL | MSG_DONTWAIT);
+    } while (sent < 0 && errno == EINTR);
+    if (sent < 0)
+        return errno == EAGAIN || errno == ENOBUFS || errno == ENOMEM;
+    count = static_cast<std::size_t>(sent);
+    written_.fetch_add(count, std::memory_order_relaxed);
+    return true;
+}
+
+Outbox::Outcome Outbox::send(std::string_view text, const CborEncoder& encoder) {
+    const std::lock_guard lock(mutex_);
+    if (closed_)
+        return Outcome::broken;
+    std::size_t count = 0;
+    if (descriptor_ >= 0 && pieces_.empty() && !write(partsOf(text, encoder), count))
+        return Outcome::broken;
+    if (count == encoder.size())
+        return Outcome::done;
+    queue(text, encoder, count);
+    return settle();
+}
+
+// Keeps what comes after the first `skip` bytes of a frame.
+void Outbox::queue(std::string_view text, const CborEncoder& encoder, std::size_t skip) {
+    const auto keep = [&](std::size_t size, auto&& piece) {
+        const std::size_t skipped = std::min(skip, size);
+        skip -= skipped;
+        if (skipped != size)
+            pieces_.push_back(piece(skipped));
+    };
+    encoder.forEachPiece(
+        [&](std::size_t from, std::size_t size) {
+            keep(size, [&](std::size_t skipped) {
+                return Piece{SharedBytes(text.substr(from + skipped, size - skipped))};
+            });
+        },
+        [&](const SharedBytes& shared) {
+            keep(shared.size(), [&](std::size_t skipped) { return Piece{shared, skipped}; });
+        });
+}
+
+Outbox::Outcome Outbox::flush() {
+    const std::lock_guard lock(mutex_);
+    if (closed_)
+        return Outcome::broken;
+    if (pieces_.empty() || descriptor_ < 0)
+        return settle();
+    std::vector<iovec> parts;
+    parts.reserve(std::min<std::size_t>(pieces_.size(), IOV_MAX));
+    for (const Piece& piece : pieces_) {
+        if (parts.size() == IOV_MAX)
+            break;
+        parts.push_back(part(piece.bytes.data() + piece.offset, piece.bytes.size() - piece.offset));
+    }
+    std::size_t count = 0;
+    if (!write(parts, count))
+        return Outcome::broken;
+    drop(count);
+    return settle();
+}
+
+void Outbox::drop(std::size_t count) {
+    while (count > 0) {
+        Piece& first = pieces_.front();
+        const std::size_t left = first.bytes.size() - first.offset;
+        if (count < left) {
+            first.offset += count;
+            return;
+        }
+        count -= left;
+        pieces_.pop_front();
+    }
+}
+
+Outbox::Outcome Outbox::settle() {
+    waiting_.store(!pieces_.empty(), std::memory_order_release);
+    return pieces_.empty() ? Outcome::done : Outcome::waiting;
+}
+
+} // namespace platform::ipc

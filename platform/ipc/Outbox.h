@@ -1,0 +1,68 @@
+#pragma once
+
+#include <atomic>
+#include <cstddef>
+#include <cstdint>
+#include <deque>
+#include <mutex>
+#include <span>
+#include <string_view>
+#include <sys/uio.h>
+#include <vector>
+
+#include "platform/value/SharedBytes.h"
+
+namespace platform::ipc {
+
+class CborEncoder;
+
+// What a connection has to write. A frame is written at once as far as the socket takes it; the
+// rest waits here, sharing the pieces that are encoded values, until the loop calls `flush`.
+//
+// Owned by a connection, which owns the descriptor too and calls `close` before it closes that.
+// Any thread.
+class Outbox {
+public:
+    enum class Outcome {
+        done,    // all of it is written
+        waiting, // some of it waits: for the socket to take more, or for `open`
+        broken,  // the peer does not read any more, or the outbox is closed
+    };
+
+    // Nothing is written before; what was sent by then goes out with the next `flush`.
+    void open(int descriptor);
+    // After it returns the descriptor is not used any more. What waits is dropped.
+    void close();
+
+    // Sends one frame: `text` with the cuts of `encoder` in it.
+    [[nodiscard]] Outcome send(std::string_view text, const CborEncoder& encoder);
+    // Writes on, once.
+    [[nodiscard]] Outcome flush();
+
+    [[nodiscard]] bool empty() const noexcept { return !waiting_.load(std::memory_order_acquire); }
+
+    // Bytes that were written ever.
+    [[nodiscard]] std::uint64_t written() const noexcept {
+        return written_.load(std::memory_order_relaxed);
+    }
+
+private:
+    struct Piece {
+        SharedBytes bytes;
+        std::size_t offset = 0;
+    };
+
+    void queue(std::string_view text, const CborEncoder& encoder, std::size_t skip);
+    [[nodiscard]] bool write(std::span<iovec> parts, std::size_t& count);
+    void drop(std::size_t count);
+    Outcome settle();
+
+    std::mutex mutex_;
+    int descriptor_ = -1;
+    bool closed_ = false;
+    std::deque<Piece> pieces_;
+    std::atomic<bool> waiting_ = false;
+    std::atomic<std::uint64_t> written_ = 0;
+};
+
+} // namespace platform::ipc
