@@ -1,0 +1,199 @@
+#include <cerrno>
+#include <fcntl.h>
+#include <sys/socket.h>
+#include <utility>
+
+#include "platform/ipc/Cbor.h"
+#include "platform/ipc/ConnectionImpl.h"
+#include "platform/ipc/IpcLog.h"
+
+namespace platform::ipc {
+
+namespace {
+
+constexpr std::size_t scratchSize = 64UL << 10;
+
+// What a started frame may take before it counts as waiting.
+constexpr std::size_t freePartial = scratchSize;
+
+// Memory that all reading of a thread goes through.
+char* scratch() {
+    thread_local const std::unique_ptr<char[]> memory(new char[scratchSize]);
+    return memory.get();
+}
+
+// Whether what was read was written by the process `pid`.
+bool cameFrom(pid_t pid, msghdr& message) {
+    for (cmsghdr* c = CMSG_FIRSTHDR(&message); c; c = CMSG_NXTHDR(&message, c)) {
+        if (c->cmsg_level != SOL_SOCKET || c->cmsg_type != SCM_CREDENTIALS)
+            continue;
+        ucred writer{};
+        __builtin_memcpy(&writer, CMSG_DATA(c), sizeof(writer));
+        return writer.pid == pid && pid != 0;
+    }
+    return false;
+}
+
+// Reads once. Descriptors that a client sends along find no room and are closed by the kernel.
+ssize_t readOnce(int socket, std::array<iovec, 2> room, pid_t pid, bool& fromPeer) {
+    alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(ucred))> control{};
+    msghdr message{};
+    const bool held = room[0].iov_len != 0;
+    message.msg_iov = room.data() + (held ? 0 : 1);
+    message.msg_iovlen = held ? 2 : 1;
+    message.msg_control = control.data();
+    message.msg_controllen = CMSG_LEN(sizeof(ucred));
+    const ssize_t count = ::recvmsg(socket, &message, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
+    fromPeer = count > 0 && cameFrom(pid, message);
+    return count;
+}
+
+} // namespace
+
+void Connection::Impl::readable() {
+    if (ended || !socket)
+        return;
+    bool fromPeer = false;
+    const ssize_t count =
+        readOnce(socket->descriptor(), reader.room(scratch(), scratchSize), peer.pid, fromPeer);
+    if (count < 0 && (errno == EAGAIN || errno == EINTR))
+        return socket->waitReadable(target());
+    if (count <= 0)
+        return end(Replies::flush);
+    reader.filled(static_cast<std::size_t>(count), fromPeer);
+    takeFrames();
+}
+
+// Takes up what has come as far as the limits allow, and then either reads on or pauses.
+void Connection::Impl::takeFrames() {
+    while (mayTake()) {
+        const auto frame = reader.next();
+        if (!frame)
+            return end(Replies::drop, frame.error());
+        if (!*frame)
+            break;
+        ++framesTaken;
+        if (const auto complaint = take(**frame))
+            return end(Replies::drop, *complaint);
+    }
+    reader.keep();
+    chargePartial(reader.pending() > freePartial ? reader.pending() : 0);
+    if (pauseUnlessRoom())
+        pause();
+    else
+        socket->waitReadable(target());
+}
+
+// Answers with what is malformed about the frame.
+Connection::Impl::Complaint Connection::Impl::take(const Frame& frame) {
+    return frame.header.kind == FrameKind::greetingAnswer ? takeAnswer(frame) : takeRequest(frame);
+}
+
+Connection::Impl::Complaint Connection::Impl::takeRequest(const Frame& frame) {
+    auto decoded = decodeCounted(frame.body, {.maxValues = mostRequestValues});
+    if (!decoded)
+        return decoded.error().description;
+    const Dictionary* body = decoded->value.dictionary();
+    if (!body)
+        return "a body that is not a map";
+    Message message;
+    message.body = *body;
+    message.id = frame.header.messageId;
+    message.expectsReply = frame.header.kind == FrameKind::request;
+    message.fromPeer = frame.fromPeer;
+    message.greeted = greeted;
+    decoded->value = Value();
+    enqueue(std::move(message), frameHeaderSize + frame.body.size() + decoded->values * valueCost);
+    return std::nullopt;
+}
+
+Connection::Impl::Complaint Connection::Impl::takeAnswer(const Frame& frame) {
+    if (std::exchange(answered, true))
+        return "a second answer to the greeting";
+    const auto body = decode(frame.body);
+    const Dictionary* map = body ? body->dictionary() : nullptr;
+    const Value* value = map && map->size() == 1 ? map->find("challenge") : nullptr;
+    const Data* data = value ? value->data() : nullptr;
+    if (!data || data->bytes != challenge)
+        return "a wrong answer to the greeting";
+    greeted = frame.fromPeer;
+    return std::nullopt;
+}
+
+// A large request counts from its first bytes on.
+void Connection::Impl::chargePartial(std::size_t pending) {
+    const std::size_t before = std::exchange(chargedPartial, pending);
+    if (pending > before)
+        account->add(pending - before);
+    else if (pending < before)
+        account->release(before - pending);
+}
+
+// REQUIRES: mutex held.
+bool Connection::Impl::hasRoom() const {
+    return unfinished < limits.waitingRequests && unfinishedCost < limits.waitingBytes &&
+           (!account->full() || (unfinished == 0 && chargedPartial == 0));
+}
+
+bool Connection::Impl::mayTake() {
+    const std::lock_guard lock(mutex);
+    return hasRoom();
+}
+
+bool Connection::Impl::pauseUnlessRoom() {
+    const std::lock_guard lock(mutex);
+    paused = !hasRoom();
+    return paused;
+}
+
+// While nothing is read, only the socket's hang-up and the end of the process tell that the client
+// is gone.
+void Connection::Impl::pause() {
+    socket->waitHangUp(target());
+    if (peer.process && !process) {
+        UniqueFd copy(::fcntl(peer.process.get(), F_DUPFD_CLOEXEC, 0));
+        if (copy) {
+            process = loop.watchDescriptor(std::move(copy), [connection = owner->weak_from_this()] {
+                if (const auto there = connection.lock())
+                    there->impl().hungUp();
+            });
+        }
+    }
+    watchProgress();
+    if (!account->full() || std::exchange(awaitsUser, true))
+        return;
+    account->whenRoom([connection = owner->weak_from_this()] {
+        if (const auto there = connection.lock())
+            there->impl().post(&Impl::userHasRoom);
+    });
+}
+
+void Connection::Impl::userHasRoom() {
+    awaitsUser = false;
+    goOn();
+}
+
+void Connection::Impl::goOn() {
+    {
+        const std::lock_guard lock(mutex);
+        if (ended)
+            return;
+        paused = false;
+    }
+    process.reset();
+    takeFrames();
+}
+
+void Connection::Impl::hungUp() {
+    {
+        const std::lock_guard lock(mutex);
+        if (!paused && !ended)
+            return; // reading finds the end in its turn
+    }
+    if (ended)
+        close();
+    else
+        end(Replies::drop);
+}
+
+} // namespace platform::ipc

@@ -1,0 +1,97 @@
+#include <algorithm>
+
+#include "platform/ipc/CborEncoder.h"
+#include "platform/ipc/ConnectionImpl.h"
+#include "platform/ipc/FrameText.h"
+#include "platform/ipc/IpcLog.h"
+
+namespace platform::ipc {
+
+namespace {
+
+constexpr std::chrono::milliseconds longestProgressCheck{5'000};
+
+// What goes out in place of a reply that does not fit the wire.
+const Dictionary& oversizedReply() {
+    static const Dictionary body{{"errorcode", 4U}, {"error", "invalid request format"}};
+    return body;
+}
+
+} // namespace
+
+void Connection::Impl::greet() {
+    challenge = randomChallenge();
+    write(FrameKind::greeting, 0, Dictionary{{"challenge", Data{challenge}}});
+}
+
+void Connection::Impl::write(FrameKind kind, std::uint64_t id, const Dictionary& body) {
+    FrameText text(kind, id, body);
+    if (!text.fits(largestReplyBody)) {
+        ipcLog().error("a reply to process %d is past the limits of the wire: %lu bytes", peer.pid,
+                       text.bodySize());
+        return write(kind, id, oversizedReply());
+    }
+    if (outbox.send(text.text(), text.encoder()) == Outbox::Outcome::waiting)
+        post(&Impl::writeRest);
+}
+
+void Connection::Impl::writeRest() {
+    if (!socket || outbox.empty())
+        return;
+    watchProgress();
+    socket->waitWritable(target());
+}
+
+void Connection::Impl::writable() {
+    if (!socket)
+        return;
+    switch (outbox.flush()) {
+    case Outbox::Outcome::waiting:
+        return socket->waitWritable(target());
+    case Outbox::Outcome::broken:
+        return ended ? close() : end(Replies::drop);
+    case Outbox::Outcome::done:
+        return ended ? settle() : goOnDelivering();
+    }
+}
+
+// A client that lets replies lie, or a request that finds no room among its user's, must not hold
+// on for ever.
+bool Connection::Impl::isStalled() {
+    const std::lock_guard lock(mutex);
+    return !outbox.empty() || (paused && unfinished == 0);
+}
+
+void Connection::Impl::watchProgress() {
+    if (timing || !isStalled())
+        return;
+    timing = true;
+    progressSeen = outbox.written() + framesTaken;
+    progressAt = Clock::now();
+    checkProgress();
+}
+
+void Connection::Impl::checkProgress() {
+    const std::uint64_t progress = outbox.written() + framesTaken;
+    const auto now = Clock::now();
+    if (progress != progressSeen)
+        progressAt = now;
+    progressSeen = progress;
+    timing = socket && isStalled();
+    if (!timing)
+        return;
+    if (now - progressAt >= limits.stalled) {
+        timing = false;
+        end(Replies::drop, "no progress for too long");
+        return close();
+    }
+    if (!timer)
+        timer = loop.makeTimer();
+    timer->start(std::min(longestProgressCheck, limits.stalled / 4 + std::chrono::milliseconds(1)),
+                 [connection = owner->weak_from_this()] {
+                     if (const auto there = connection.lock())
+                         there->impl().checkProgress();
+                 });
+}
+
+} // namespace platform::ipc

@@ -1,0 +1,57 @@
+#pragma once
+
+#include <atomic>
+#include <cstddef>
+#include <functional>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <sys/types.h>
+#include <vector>
+
+namespace platform::ipc {
+
+// What one user id has of a service: its connections, and the memory of its waiting requests.
+//
+// Shared by the user's connections; forgotten when the last one is gone. `open` on the loop, the
+// rest on any thread.
+class UserAccount {
+public:
+    explicit UserAccount(std::size_t mostWaitingBytes) : mostWaiting_(mostWaitingBytes) {}
+
+    // False when the user has `most` connections already.
+    [[nodiscard]] bool open(std::size_t most);
+
+    void close() noexcept { --connections_; }
+
+    void add(std::size_t bytes) noexcept { waiting_.fetch_add(bytes); }
+
+    void release(std::size_t bytes);
+
+    [[nodiscard]] bool full() const noexcept { return waiting_.load() >= mostWaiting_; }
+
+    // Calls `retry` (on any thread) when the account is full no more; at once when it is not.
+    void whenRoom(std::move_only_function<void()> retry);
+
+private:
+    const std::size_t mostWaiting_;
+    std::atomic<std::size_t> connections_ = 0;
+    std::atomic<std::size_t> waiting_ = 0;
+    std::mutex mutex_;
+    std::vector<std::move_only_function<void()>> retries_;
+    std::atomic<bool> awaited_ = false;
+};
+
+// The accounts of all users that are connected. Owned by the listener; used on its loop.
+class UserAccounts {
+public:
+    explicit UserAccounts(std::size_t mostWaitingBytes) : mostWaiting_(mostWaitingBytes) {}
+
+    [[nodiscard]] std::shared_ptr<UserAccount> of(uid_t uid);
+
+private:
+    const std::size_t mostWaiting_;
+    std::map<uid_t, std::weak_ptr<UserAccount>> accounts_;
+};
+
+} // namespace platform::ipc
