@@ -7,6 +7,7 @@
 #include <string>
 #include <variant>
 
+#include "platform/ipc/Limits.h"
 #include "platform/ipc/Message.h"
 #include "platform/value/Error.h"
 
@@ -34,14 +35,14 @@ public:
     // Binds the path. Fails when another daemon serves it, when the path is too long for a socket,
     // and when the system refuses.
     [[nodiscard]] static std::expected<std::unique_ptr<Listener>, Error>
-    create(Loop& loop, const std::string& path, Handler handler);
+    create(Loop& loop, const std::string& path, Handler handler, const Limits& limits = {});
     Listener(const Listener&) = delete;
     Listener& operator=(const Listener&) = delete;
     ~Listener(); // cancels
 
     // Replaces the handler. REQUIRES: before `resume`.
     void setEventHandler(Handler handler);
-    // Begins to accept. Any thread.
+    // Begins to accept: clients can connect from when it returns. Any thread.
     void resume();
     // Stops accepting and removes the socket before it returns; connections live on. The handler
     // gets the invalid event, as its last one. Any thread.

@@ -1,0 +1,38 @@
+#pragma once
+
+#include <cstddef>
+#include <expected>
+#include <string>
+
+#include "platform/file/File.h"
+#include "platform/value/Error.h"
+
+namespace platform::ipc {
+
+// A socket bound to a service's path, and the lock that makes it ours. Owned by a listener, which
+// listens on it; letting it go removes the socket from the path. Any thread.
+class ServiceSocket {
+public:
+    // Takes the lock beside the path (so that no other daemon serves it), replaces a socket that
+    // was left there, and binds a new one, 0666 in a folder 0755.
+    [[nodiscard]] static std::expected<ServiceSocket, Error> bind(const std::string& path);
+    ServiceSocket(ServiceSocket&&) = default;
+    ServiceSocket& operator=(ServiceSocket&&) = delete;
+    ~ServiceSocket();
+
+    // The socket, for whoever accepts on it. The path stays ours.
+    [[nodiscard]] UniqueFd takeSocket() { return std::move(socket_); }
+
+private:
+    ServiceSocket(std::string path, UniqueFd lock, UniqueFd socket)
+        : path_(std::move(path)), lock_(std::move(lock)), socket_(std::move(socket)) {}
+
+    std::string path_;
+    UniqueFd lock_; // empty once moved from
+    UniqueFd socket_;
+};
+
+// A socket connected to the service at a path.
+[[nodiscard]] std::expected<UniqueFd, Error> connectToService(const std::string& path);
+
+} // namespace platform::ipc
