@@ -1,0 +1,193 @@
+#include "platform/ipc/ClientSession.h"
+
+#include <cerrno>
+#include <sys/socket.h>
+#include <utility>
+
+#include "platform/ipc/Cbor.h"
+#include "platform/ipc/FrameText.h"
+#include "platform/ipc/IpcLog.h"
+#include "platform/ipc/Loop.h"
+#include "platform/queue/SerialQueue.h"
+
+namespace platform::ipc {
+
+namespace {
+
+constexpr std::size_t scratchSize = 256UL << 10;
+
+char* scratch() {
+    thread_local const std::unique_ptr<char[]> memory(new char[scratchSize]);
+    return memory.get();
+}
+
+} // namespace
+
+void answer(SerialQueue& queue, ClientConnection::ReplyHandler handler,
+            std::expected<Dictionary, ConnectionError> reply) {
+    queue.async([handler = std::move(handler), reply = std::move(reply)]() mutable {
+        handler(std::move(reply));
+    });
+}
+
+ClientSession::ClientSession(Loop& loop, std::shared_ptr<SerialQueue> target,
+                             std::shared_ptr<EventHandler> events)
+    : loop_(loop), target_(std::move(target)), events_(std::move(events)) {}
+
+void ClientSession::start(UniqueFd socket) {
+    loop_.post([self = shared_from_this(), socket = std::move(socket)]() mutable {
+        self->socket_ = std::make_unique<SocketWatch>(self->loop_, std::move(socket));
+        self->socket_->waitReadable(self);
+    });
+}
+
+bool ClientSession::send(const Dictionary& message, ReplyHandler& handler) {
+    const FrameKind kind = handler ? FrameKind::request : FrameKind::oneWay;
+    std::uint64_t id = 0;
+    {
+        const std::lock_guard lock(mutex_);
+        if (over_)
+            return false;
+        id = ++lastId_;
+        if (handler)
+            pending_.emplace(id, std::exchange(handler, nullptr));
+    }
+    const FrameText frame(kind, id, message);
+    if (!frame.fits(largestRequestBody)) {
+        ipcLog().error("a request is past the limits of the wire: %lu bytes", frame.bodySize());
+        ReplyHandler refused;
+        if (kind == FrameKind::request && takeBack(id, refused))
+            answer(*target_, std::move(refused), std::unexpected(ConnectionError::invalid));
+        return true;
+    }
+    const Outbox::Outcome outcome = outbox_.send(frame.text(), frame.encoder());
+    if (outcome == Outbox::Outcome::waiting)
+        loop_.post([self = shared_from_this()] { self->writeRest(); });
+    if (outcome != Outbox::Outcome::broken)
+        return true;
+    const bool untouched = kind == FrameKind::oneWay || takeBack(id, handler);
+    close(ConnectionError::interrupted);
+    return !untouched;
+}
+
+// False when someone answered already.
+bool ClientSession::takeBack(std::uint64_t id, ReplyHandler& handler) {
+    const std::lock_guard lock(mutex_);
+    const auto place = pending_.find(id);
+    if (place == pending_.end())
+        return false;
+    handler = std::move(place->second);
+    pending_.erase(place);
+    return true;
+}
+
+void ClientSession::readable() {
+    if (!socket_)
+        return;
+    auto room = reader_.room(scratch(), scratchSize);
+    msghdr message{};
+    const bool held = room[0].iov_len != 0;
+    message.msg_iov = room.data() + (held ? 0 : 1);
+    message.msg_iovlen = held ? 2 : 1;
+    const ssize_t count = ::recvmsg(socket_->descriptor(), &message, MSG_DONTWAIT);
+    if (count < 0 && (errno == EAGAIN || errno == EINTR))
+        return socket_->waitReadable(shared_from_this());
+    if (count <= 0)
+        return lost();
+    reader_.filled(static_cast<std::size_t>(count));
+    takeFrames();
+}
+
+void ClientSession::takeFrames() {
+    for (;;) {
+        const auto frame = reader_.next();
+        if (!frame || (*frame && !take(**frame))) {
+            ipcLog().error("the daemon sent a malformed frame");
+            return lost();
+        }
+        if (!*frame)
+            break;
+    }
+    reader_.keep();
+    if (socket_)
+        socket_->waitReadable(shared_from_this());
+}
+
+bool ClientSession::take(const Frame& frame) {
+    const auto value = decode(frame.body, {.allowEncoded = true});
+    const Dictionary* body = value ? value->dictionary() : nullptr;
+    if (!body)
+        return false;
+    if (frame.header.kind == FrameKind::greeting)
+        return answerGreeting(*body);
+    if (frame.header.kind == FrameKind::reply)
+        takeReply(frame.header.messageId, *body);
+    else
+        tell(*value);
+    return true;
+}
+
+bool ClientSession::answerGreeting(const Dictionary& greeting) {
+    if (!socket_ || std::exchange(greeted_, true))
+        return false;
+    // On a new socket there is room for so little.
+    Outbox first;
+    first.open(socket_->descriptor());
+    const FrameText frame(FrameKind::greetingAnswer, 0, greeting);
+    if (first.send(frame.text(), frame.encoder()) != Outbox::Outcome::done)
+        return false;
+    outbox_.open(socket_->descriptor());
+    writable();
+    return true;
+}
+
+void ClientSession::takeReply(std::uint64_t id, const Dictionary& body) {
+    ReplyHandler handler;
+    if (takeBack(id, handler))
+        answer(*target_, std::move(handler), body);
+}
+
+void ClientSession::writeRest() {
+    if (socket_ && greeted_ && !outbox_.empty())
+        socket_->waitWritable(shared_from_this());
+}
+
+void ClientSession::writable() {
+    if (!socket_)
+        return;
+    switch (outbox_.flush()) {
+    case Outbox::Outcome::waiting:
+        return socket_->waitWritable(shared_from_this());
+    case Outbox::Outcome::broken:
+    case Outbox::Outcome::done:
+        return; // reading finds the end
+    }
+}
+
+void ClientSession::lost() {
+    close(ConnectionError::interrupted);
+}
+
+void ClientSession::close(ConnectionError error) {
+    std::map<std::uint64_t, ReplyHandler> unanswered;
+    {
+        const std::lock_guard lock(mutex_);
+        if (std::exchange(over_, true))
+            return;
+        unanswered.swap(pending_);
+    }
+    outbox_.close();
+    tell(error);
+    for (auto& [id, handler] : unanswered)
+        answer(*target_, std::move(handler), std::unexpected(error));
+    loop_.post([self = shared_from_this()] { self->socket_.reset(); });
+}
+
+void ClientSession::tell(ClientConnection::Event event) {
+    target_->async([events = events_, event = std::move(event)]() mutable {
+        if (*events)
+            (*events)(std::move(event));
+    });
+}
+
+} // namespace platform::ipc

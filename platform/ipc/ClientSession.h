@@ -1,0 +1,76 @@
+#pragma once
+
+#include <cstdint>
+#include <expected>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <string>
+
+#include "platform/ipc/ClientConnection.h"
+#include "platform/ipc/Frame.h"
+#include "platform/ipc/Outbox.h"
+#include "platform/ipc/SocketWatch.h"
+#include "platform/value/Error.h"
+
+namespace platform::ipc {
+
+class Loop;
+
+// One connection of a client to its daemon, from connect to the end. What is sent before the
+// greeting came waits until it was answered, so that the daemon knows the client from its first
+// request on.
+//
+// Shared by its ClientConnection and the loop's waits. `send` and `close` on any thread; reading
+// and the rest of writing on the loop; handlers are called on the target queue.
+class ClientSession final : public SocketWatch::Target,
+                            public std::enable_shared_from_this<ClientSession> {
+public:
+    using ReplyHandler = ClientConnection::ReplyHandler;
+    using EventHandler = ClientConnection::EventHandler;
+
+    ClientSession(Loop& loop, std::shared_ptr<SerialQueue> target,
+                  std::shared_ptr<EventHandler> events);
+
+    // Begins to read. Called once, on any thread.
+    void start(UniqueFd socket);
+
+    // Sends a message; an empty handler makes it one-way. False when the session is over and
+    // nothing was sent: the handler is then untouched.
+    [[nodiscard]] bool send(const Dictionary& message, ReplyHandler& handler);
+    // Ends the session; what is pending is answered with `error`.
+    void close(ConnectionError error);
+
+private:
+    void readable() override;
+    void writable() override;
+    void takeFrames();
+    [[nodiscard]] bool take(const Frame& frame);
+    [[nodiscard]] bool answerGreeting(const Dictionary& greeting);
+    void takeReply(std::uint64_t id, const Dictionary& body);
+    void writeRest();
+    [[nodiscard]] bool takeBack(std::uint64_t id, ReplyHandler& handler);
+    void lost();
+    void tell(ClientConnection::Event event);
+
+    Loop& loop_;
+    const std::shared_ptr<SerialQueue> target_;
+    const std::shared_ptr<EventHandler> events_;
+    Outbox outbox_;
+
+    // On the loop.
+    std::unique_ptr<SocketWatch> socket_;
+    FrameReader reader_{FrameReader::Side::client};
+    bool greeted_ = false;
+
+    std::mutex mutex_;
+    std::map<std::uint64_t, ReplyHandler> pending_; // guarded
+    std::uint64_t lastId_ = 0;                      // guarded
+    bool over_ = false;                             // guarded
+};
+
+// Calls a reply's handler on a queue.
+void answer(SerialQueue& queue, ClientConnection::ReplyHandler handler,
+            std::expected<Dictionary, ConnectionError> reply);
+
+} // namespace platform::ipc

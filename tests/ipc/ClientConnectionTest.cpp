@@ -1,0 +1,130 @@
+#include "platform/ipc/ClientConnection.h"
+
+#include <gtest/gtest.h>
+
+#include "tests/ipc/Harness.h"
+
+namespace {
+
+using namespace platform;
+using namespace platform::ipc;
+using namespace tests;
+
+// A client whose replies and events are counted and kept.
+class ClientConnectionTest : public testing::Test {
+protected:
+    using Result = std::expected<Dictionary, ConnectionError>;
+
+    void connect() {
+        client_ = std::make_unique<ClientConnection>(path_, queue_);
+        client_->setEventHandler([this](ClientConnection::Event event) {
+            if (const auto* error = std::get_if<ConnectionError>(&event))
+                errors_.push_back(*error);
+            events_.add();
+        });
+        client_->resume();
+    }
+
+    void ask(const Dictionary& body) {
+        client_->sendWithReply(body, [this](Result result) {
+            results_.push_back(std::move(result));
+            replies_.add();
+        });
+    }
+
+    Result askAndWait(const Dictionary& body) {
+        const int before = replies_.value();
+        ask(body);
+        EXPECT_TRUE(replies_.reaches(before + 1));
+        return results_.back();
+    }
+
+    TemporaryFolder folder_;
+    const std::string path_ = folder_.path() + "/run/service";
+    std::shared_ptr<SerialQueue> queue_ = std::make_shared<SerialQueue>("client");
+    Counter replies_;
+    Counter events_;
+    std::vector<Result> results_; // on the queue, or after `replies_` counted them
+    std::vector<ConnectionError> errors_;
+    std::unique_ptr<ClientConnection> client_;
+};
+
+TEST_F(ClientConnectionTest, RepliesComeInOrderOnTheTargetQueue) {
+    EchoServer server(path_);
+    connect();
+    for (int i = 0; i < 1000; ++i)
+        ask({{"number", i}});
+    ASSERT_TRUE(replies_.reaches(1000));
+    for (int i = 0; i < 1000; ++i) {
+        const auto& result = results_[static_cast<std::size_t>(i)];
+        ASSERT_TRUE(result);
+        EXPECT_EQ(*result->find("number"), Value(i));
+    }
+}
+
+TEST_F(ClientConnectionTest, ConnectsAgainAfterTheDaemonRestarted) {
+    auto server = std::make_unique<EchoServer>(path_);
+    connect();
+    EXPECT_TRUE(askAndWait({{"a", 1}}));
+    for (int i = 0; i < 5; ++i) {
+        server.reset();
+        server = std::make_unique<EchoServer>(path_);
+        EXPECT_TRUE(askAndWait({{"a", 2}})) << i;
+    }
+}
+
+TEST_F(ClientConnectionTest, PendingRequestsOfALostDaemonAreInterruptedOnce) {
+    auto server = std::make_unique<EchoServer>(path_, Limits{}, [](Connection&, const Message&) {});
+    connect();
+    for (int i = 0; i < 10; ++i)
+        ask({{"a", i}});
+    ASSERT_TRUE(server->requests.reaches(10));
+    server.reset();
+    ASSERT_TRUE(replies_.reaches(10));
+    ASSERT_TRUE(events_.reaches(1));
+    EXPECT_EQ(replies_.value(), 10);
+    for (const auto& result : results_)
+        EXPECT_EQ(result, Result(std::unexpected(ConnectionError::interrupted)));
+    EXPECT_EQ(askAndWait({{"a", 1}}), Result(std::unexpected(ConnectionError::invalid)));
+}
+
+TEST_F(ClientConnectionTest, FirstOfSeveralRepliesCounts) {
+    EchoServer server(path_, {}, [](Connection& connection, const Message& message) {
+        Reply reply = createReply(message);
+        for (const char* text : {"first", "second", "third"}) {
+            reply.body.set("text", text);
+            connection.send(reply);
+        }
+    });
+    connect();
+    for (int i = 0; i < 3; ++i)
+        EXPECT_EQ(*askAndWait({{"a", i}})->find("text"), Value("first"));
+    EXPECT_EQ(replies_.value(), 3);
+}
+
+TEST_F(ClientConnectionTest, AnswersTheGreetingBeforeItsFirstRequest) {
+    EchoServer server(path_, {}, [](Connection& connection, const Message& message) {
+        Reply reply = createReply(message);
+        reply.body.set("greeted", message.greeted);
+        reply.body.set("fromPeer", message.fromPeer);
+        connection.send(reply);
+    });
+    connect();
+    const Result result = askAndWait({});
+    ASSERT_TRUE(result);
+    EXPECT_EQ(*result, (Dictionary{{"greeted", true}, {"fromPeer", true}}));
+}
+
+TEST_F(ClientConnectionTest, CancelAnswersPendingWithInvalid) {
+    EchoServer server(path_, {}, [](Connection&, const Message&) {});
+    connect();
+    ask({{"a", 1}});
+    ASSERT_TRUE(server.requests.reaches(1));
+    client_->cancel();
+    ASSERT_TRUE(replies_.reaches(1));
+    EXPECT_EQ(results_[0], Result(std::unexpected(ConnectionError::invalid)));
+    EXPECT_EQ(askAndWait({}), Result(std::unexpected(ConnectionError::invalid)));
+    EXPECT_TRUE(server.gone.reaches(1));
+}
+
+} // namespace
