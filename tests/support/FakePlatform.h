@@ -1,0 +1,169 @@
+#pragma once
+
+#include <functional>
+#include <map>
+#include <string>
+#include <vector>
+
+#include "platform/container/Containers.h"
+#include "platform/locale/Locale.h"
+#include "platform/notify/Notifications.h"
+#include "platform/preferences/Preferences.h"
+#include "platform/process/Processes.h"
+#include "platform/sandbox/Sandbox.h"
+#include "platform/signing/CodeSigning.h"
+#include "platform/types/Types.h"
+#include "tests/support/FakeWorkspace.h"
+#include "zpd/Platform.h"
+
+// The services of the operating system as a test wants them. Each remembers what it was asked and
+// fails on demand.
+
+struct FakeProcesses final : platform::Processes {
+    std::map<pid_t, std::string> paths;
+
+    [[nodiscard]] std::expected<std::string, int> executablePath(pid_t pid,
+                                                                 std::size_t room) override {
+        const auto found = paths.find(pid);
+        if (found == paths.end())
+            return std::unexpected(ESRCH);
+        if (found->second.size() >= room)
+            return std::unexpected(ENOMEM);
+        return found->second;
+    }
+};
+
+struct FakeSigning final : platform::CodeSigning {
+    platform::Dictionary clientEntitlements; // every client's
+
+    struct Task final : platform::SigningTask {
+        explicit Task(platform::Dictionary e) : entitlements(std::move(e)) {}
+
+        [[nodiscard]] std::expected<std::optional<platform::Value>, platform::Error>
+        entitlement(std::string_view key) override {
+            const platform::Value* const found = entitlements.find(key);
+            return found ? std::optional(*found) : std::nullopt;
+        }
+
+        platform::Dictionary entitlements;
+    };
+
+    [[nodiscard]] std::unique_ptr<platform::SigningTask>
+    taskFor(const platform::ipc::Peer&) override {
+        return std::make_unique<Task>(clientEntitlements);
+    }
+
+    [[nodiscard]] std::optional<platform::Dictionary>
+    bundleEntitlements(std::string_view) override {
+        return std::nullopt;
+    }
+};
+
+struct FakeSandbox final : platform::Sandbox {
+    int failure = 0; // an errno value
+    bool confined = false;
+    std::vector<std::string> issued;
+
+    [[nodiscard]] bool isSandboxed(pid_t) override { return confined; }
+
+    [[nodiscard]] std::expected<std::string, int>
+    issueFileExtension(std::string_view extensionClass, std::string_view path,
+                       std::uint32_t flags) override {
+        return issue(extensionClass, path, flags);
+    }
+
+    [[nodiscard]] std::expected<std::string, int>
+    issueServiceExtension(std::string_view extensionClass, std::string_view service,
+                          std::uint32_t flags) override {
+        return issue(extensionClass, service, flags);
+    }
+
+private:
+    std::expected<std::string, int> issue(std::string_view what, std::string_view name,
+                                          std::uint32_t flags) {
+        if (failure)
+            return std::unexpected(failure);
+        issued.push_back(std::string(what) + " " + std::string(name) + " " + std::to_string(flags));
+        return "token for " + std::string(name);
+    }
+};
+
+struct FakeTypes final : platform::Types {
+    std::vector<std::pair<std::string, std::string>> conformances; // type, target
+    bool ruleAnswer = false;
+    std::vector<std::pair<platform::Value, platform::Dictionary>> evaluated;
+
+    [[nodiscard]] bool conforms(std::string_view type, std::string_view target) override {
+        for (const auto& [from, to] : conformances) {
+            if (from == type && to == target)
+                return true;
+        }
+        return type == target;
+    }
+
+    [[nodiscard]] bool evaluateActivationRule(const platform::Value& rule,
+                                              const platform::Dictionary& offer) override {
+        evaluated.emplace_back(rule, offer);
+        return ruleAnswer;
+    }
+};
+
+struct FakePreferences final : platform::Preferences {
+    std::map<std::string, platform::Value> values; // "domain key"
+    std::vector<std::string> synchronized;
+
+    void synchronize(std::string_view domain) override { synchronized.emplace_back(domain); }
+
+    [[nodiscard]] std::optional<platform::Value> value(std::string_view domain,
+                                                       std::string_view key) override {
+        const auto found = values.find(std::string(domain) + " " + std::string(key));
+        return found == values.end() ? std::nullopt : std::optional(found->second);
+    }
+};
+
+struct FakeNotifications final : platform::Notifications {
+    std::vector<std::string> posted;
+
+    void post(std::string_view name) override { posted.emplace_back(name); }
+};
+
+struct FakeContainers final : platform::Containers {
+    std::string folder; // where containers are
+    std::optional<platform::Error> failure;
+    std::vector<std::string> asked;
+
+    [[nodiscard]] std::expected<std::string, platform::Error>
+    dataContainer(std::string_view identifier) override {
+        asked.emplace_back(identifier);
+        if (failure)
+            return std::unexpected(*failure);
+        return folder + "/" + std::string(identifier);
+    }
+};
+
+struct FakeLocale final : platform::Locale {
+    std::string language;
+    ChangeHandler changed;
+
+    [[nodiscard]] std::string current() override { return language; }
+
+    void observeChanges(ChangeHandler handler) override { changed = std::move(handler); }
+};
+
+// All of them, and the struct in which they are handed to the server. Outlives what it is given to.
+struct FakePlatform {
+    FakeProcesses processes;
+    FakeSigning signing;
+    FakeSandbox sandbox;
+    FakeTypes types;
+    FakePreferences preferences;
+    FakeNotifications notifications;
+    FakeContainers containers;
+    FakeLocale locale;
+    FakeWorkspace workspace;
+
+    [[nodiscard]] Platform services() {
+        return {processes,     signing,    sandbox, types,    preferences,
+                notifications, containers, locale,  workspace};
+    }
+};

@@ -1,0 +1,178 @@
+#pragma once
+
+#include <map>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "AppRegistry/ARApplicationWorkspace.h"
+
+// An application that says what a test wants.
+struct FakeApplication final : ARApplicationProxy {
+    std::string path;
+    std::optional<std::string> identifier;
+    std::optional<std::string> name;
+    bool placeholder = false;
+    std::vector<ARZephrinProxy::Ptr> plugIns;
+
+    [[nodiscard]] const std::string& bundlePath() const override { return path; }
+
+    [[nodiscard]] std::optional<std::string> bundleIdentifier() const override {
+        return identifier;
+    }
+
+    [[nodiscard]] std::optional<std::string> localizedName() const override { return name; }
+
+    [[nodiscard]] bool isPlaceholder() const override { return placeholder; }
+
+    [[nodiscard]] std::vector<ARZephrinProxy::Ptr> zephrinPlugins() const override {
+        return plugIns;
+    }
+};
+
+// A plug-in that says what a test wants; without changes a sound one inside an application.
+struct FakePlugIn final : ARZephrinProxy {
+    platform::Uuid uuid = platform::Uuid::random();
+    std::optional<std::string> path = "/Applications/Host.app/PlugIns/Sample.appex";
+    std::optional<std::string> identifier = "com.example.sample";
+    std::optional<std::string> original = "com.example.sample";
+    std::optional<platform::Dictionary> info;
+    std::optional<platform::Dictionary> granted;
+    double registered = 1'700'000'000.75;
+    bool onSystem = false;
+    std::optional<std::string> name;
+    std::optional<std::string> shortName;
+    std::shared_ptr<FakeApplication> application;
+    std::optional<std::string> container = "/containers/com.example.sample";
+    std::optional<std::string> version = "7";
+
+    [[nodiscard]] const platform::Uuid& plugInUUID() const override { return uuid; }
+
+    [[nodiscard]] std::optional<std::string> bundlePath() const override { return path; }
+
+    [[nodiscard]] std::optional<std::string> plugInIdentifier() const override {
+        return identifier;
+    }
+
+    [[nodiscard]] std::optional<std::string> originalIdentifier() const override {
+        return original;
+    }
+
+    [[nodiscard]] std::optional<platform::Dictionary> infoDictionary() const override {
+        return info;
+    }
+
+    [[nodiscard]] std::optional<platform::Dictionary> plugInDictionary() const override {
+        const platform::Value* const found = info ? info->find("HXExtension") : nullptr;
+        if (!found || !found->dictionary())
+            return std::nullopt;
+        return *found->dictionary();
+    }
+
+    [[nodiscard]] const std::optional<platform::Dictionary>& entitlements() const override {
+        return granted;
+    }
+
+    [[nodiscard]] platform::Date registrationDate() const override { return {registered}; }
+
+    [[nodiscard]] bool isOnSystemPartition() const override { return onSystem; }
+
+    [[nodiscard]] std::optional<std::string> localizedName() const override { return name; }
+
+    [[nodiscard]] std::optional<std::string> localizedShortName() const override {
+        return shortName;
+    }
+
+    [[nodiscard]] ARApplicationProxy::Ptr containingBundle() const override { return application; }
+
+    [[nodiscard]] std::optional<std::string> dataContainerPath() const override {
+        return container;
+    }
+
+    [[nodiscard]] std::optional<std::string> bundleIdentifier() const override {
+        return identifier;
+    }
+
+    [[nodiscard]] std::optional<std::string> bundleVersion() const override { return version; }
+};
+
+// A registry of what a test puts in. Remembers what it was asked; fails on demand.
+class FakeWorkspace final : public ARApplicationWorkspace {
+public:
+    PlugIns installed;
+    std::map<std::string, std::shared_ptr<FakeApplication>> applications;
+    ARKnowledge known{platform::Uuid::random(), 1};
+    bool failQueries = false;
+    std::optional<platform::Error> registrationFailure;
+
+    ARWorkspaceObserver* observer = nullptr;
+    int proxiesAsked = 0;
+    int schemaCachesCleared = 0;
+    std::vector<std::string> registered;
+    std::vector<std::string> unregistered;
+
+    // Something changed somewhere: a new knowledge UUID.
+    void move() { known = {platform::Uuid::random(), known.sequence + 1}; }
+
+    [[nodiscard]] std::optional<PlugIns> installedPlugins() override {
+        return failQueries ? std::nullopt : std::optional(installed);
+    }
+
+    [[nodiscard]] std::optional<PlugIns> pluginsMatchingQuery(const platform::Dictionary&,
+                                                              const Filter& filter) override {
+        if (failQueries)
+            return std::nullopt;
+        PlugIns kept;
+        for (const auto& plugIn : installed) {
+            if (filter(plugIn->plugInIdentifier().value_or(""), plugIn->entitlements()))
+                kept.push_back(plugIn);
+        }
+        return kept;
+    }
+
+    [[nodiscard]] ARZephrinProxy::Ptr zephrinProxyForUUID(const platform::Uuid& uuid) override {
+        ++proxiesAsked;
+        return first([&](const ARZephrinProxy& p) { return p.plugInUUID() == uuid; });
+    }
+
+    [[nodiscard]] ARZephrinProxy::Ptr zephrinProxyForPath(std::string_view path) override {
+        return first([&](const ARZephrinProxy& p) { return p.bundlePath() == path; });
+    }
+
+    [[nodiscard]] ARApplicationProxy::Ptr
+    applicationProxyForBundlePath(std::string_view path) override {
+        const auto found = applications.find(std::string(path));
+        return found == applications.end() ? nullptr : found->second;
+    }
+
+    [[nodiscard]] std::optional<ARExtensionPoint>
+    extensionPointForIdentifier(std::string_view) override {
+        return std::nullopt;
+    }
+
+    [[nodiscard]] ARKnowledge knowledge() override { return known; }
+
+    [[nodiscard]] std::optional<platform::Error> registerPlugin(std::string_view path) override {
+        registered.emplace_back(path);
+        return registrationFailure;
+    }
+
+    [[nodiscard]] std::optional<platform::Error> unregisterPlugin(std::string_view path) override {
+        unregistered.emplace_back(path);
+        return registrationFailure;
+    }
+
+    void clearSchemaCaches() override { ++schemaCachesCleared; }
+
+    void setObserver(ARWorkspaceObserver* o) override { observer = o; }
+
+private:
+    template <class Test>
+    [[nodiscard]] ARZephrinProxy::Ptr first(Test&& test) const {
+        for (const auto& plugIn : installed) {
+            if (test(*plugIn))
+                return plugIn;
+        }
+        return nullptr;
+    }
+};
