@@ -161,7 +161,7 @@ TEST(Form, TellsWhatTheInfoDictionarySays) {
 }
 
 TEST(Form, CarriesEveryKindOfValueFromBothFormats) {
-    const Item things = Item::map({{"text", "<&> äöü 日本"},
+    const Item things = Item::map({{"text", "<&> äöü 日本 😀"},
                                    {"empty", ""},
                                    {"true", true},
                                    {"false", false},

@@ -1,9 +1,10 @@
 #include "tests/e2e/PlistWriter.h"
 
+#include <algorithm>
 #include <bit>
-#include <cmath>
 #include <ctime>
 #include <stdexcept>
+#include <vector>
 
 namespace e2e {
 
@@ -85,6 +86,29 @@ std::string bigEndian(std::uint64_t n, unsigned size) {
     return out;
 }
 
+bool isAscii(const std::string& text) {
+    return std::all_of(text.begin(), text.end(), [](char c) { return (c & 0x80) == 0; });
+}
+
+// The UTF-16 code units of well-formed UTF-8.
+std::vector<unsigned> utf16Of(const std::string& text) {
+    std::vector<unsigned> units;
+    for (std::size_t i = 0; i < text.size();) {
+        const auto lead = static_cast<unsigned char>(text[i++]);
+        const int more = lead < 0x80 ? 0 : lead < 0xe0 ? 1 : lead < 0xf0 ? 2 : 3;
+        unsigned point = more == 0 ? lead : lead & (0x3fu >> more);
+        for (int k = 0; k < more; ++k)
+            point = point << 6 | (static_cast<unsigned char>(text[i++]) & 0x3fu);
+        if (point < 0x10000) {
+            units.push_back(point);
+            continue;
+        }
+        units.push_back(0xd800 + ((point - 0x10000) >> 10));
+        units.push_back(0xdc00 + ((point - 0x10000) & 0x3ff));
+    }
+    return units;
+}
+
 std::string integerObject(std::uint64_t n) {
     return '\x13' + bigEndian(n, 8);
 }
@@ -121,6 +145,16 @@ private:
         return count < 15 ? marker(count) : marker(15) + integerObject(count);
     }
 
+    static std::string textOf(const std::string& text) {
+        if (isAscii(text))
+            return marked(5, text.size()) + text;
+        const std::vector<unsigned> units = utf16Of(text);
+        std::string out = marked(6, units.size());
+        for (const unsigned unit : units)
+            out += bigEndian(unit, 2);
+        return out;
+    }
+
     std::string reference(const Item& item) { return bigEndian(add(item), 2); }
 
     std::string bytesOf(const Item& item) {
@@ -140,7 +174,7 @@ private:
         case Item::Kind::bytes:
             return marked(4, item.text().size()) + item.text();
         case Item::Kind::text:
-            return marked(5, item.text().size()) + item.text();
+            return textOf(item.text());
         case Item::Kind::array:
             for (const Item& each : item.items())
                 values += reference(each);
