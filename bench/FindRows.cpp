@@ -72,8 +72,9 @@ void besideRow(const Run& run, Cores cores, const std::string& name, double besi
 void findRows(const Run& run, Cores cores) {
     const e2e::Home home;
     fill(home, {.plugIns = run.scaled(1000)});
-    const std::string request = findFrame(addPlugInWithForm(home, formSize));
+    const std::string path = addPlugInWithForm(home, formSize);
     Rig rig(home.path());
+    const std::string request = findByUuidFrame(rig.client(), path);
     const std::size_t reply = replySize(rig.client(), request);
     Exchange find = rig.exchange(request);
     FloorExchange floor(request, reply);
@@ -91,6 +92,13 @@ void findRows(const Run& run, Cores cores) {
     row("find, p50", alone.daemon.p50, alone.floor.p50, 1.3);
     row("find, p99", alone.daemon.p99, alone.floor.p99, 1.5);
     row("find, CPU of the daemon per request", alone.daemon.processor, alone.floor.processor, 1.5);
+
+    Exchange byPath = rig.exchange(findByPathFrame(path));
+    run.table.add({.name = "find by path instead of UUID, p50",
+                   .cores = nameOf(cores),
+                   .measured = compare(byPath, floor.exchange, run.plan).daemon.p50,
+                   .against = alone.floor.p50,
+                   .unit = "us"});
 
     const Rates rates = compareRates(find, floor.exchange, run.plan, window);
     run.table.add({.name = "find, 64 in flight",

@@ -15,6 +15,10 @@ void limitWaiting(int fd) {
     setsockopt(fd, SOL_SOCKET, SO_RCVTIMEO, &patience, sizeof patience);
 }
 
+std::string frameOf(const char* type, const Item& arguments) {
+    return e2e::Frame{.id = 1, .body = encode(e2e::envelope(type, arguments))}.bytes();
+}
+
 } // namespace
 
 Rig::Rig(const std::string& home)
@@ -26,15 +30,20 @@ Exchange Rig::exchange(const std::string& request) {
     return {client_.fd(), daemon_.pid(), request, replySize(client_, request)};
 }
 
-std::string findFrame(const std::string& path) {
-    const Item body = e2e::envelope("find", Item::map({{"paths", "file://" + path}}));
-    return e2e::Frame{.id = 1, .body = encode(body)}.bytes();
+std::string findByPathFrame(const std::string& path) {
+    return frameOf("find", Item::map({{"paths", "file://" + path}}));
+}
+
+std::string findByUuidFrame(e2e::WireClient& client, const std::string& path) {
+    client.send(findByPathFrame(path));
+    const std::optional<e2e::Frame> reply = client.receive();
+    const Item form = decode(reply.value().body)["matches"].embedded();
+    return frameOf("find", Item::map({{"uuids", Item::uuid(form["uuid"].text())}}));
 }
 
 std::string matchFrame(const std::string& point) {
     const Item rules = Item::map({{"HXExtensionPointIdentifier", point}});
-    const Item body = e2e::envelope("match", Item::map({{"rules", rules}}));
-    return e2e::Frame{.id = 1, .body = encode(body)}.bytes();
+    return frameOf("match", Item::map({{"rules", rules}}));
 }
 
 std::size_t replySize(e2e::WireClient& client, const std::string& request) {

@@ -34,7 +34,8 @@ struct FloorExchange {
     Exchange exchange;
 };
 
-[[nodiscard]] std::string findFrame(const std::string& path);
+[[nodiscard]] std::string findByPathFrame(const std::string& path);
+[[nodiscard]] std::string findByUuidFrame(e2e::WireClient& client, const std::string& path);
 [[nodiscard]] std::string matchFrame(const std::string& point);
 // Size of the reply to a request, header included.
 [[nodiscard]] std::size_t replySize(e2e::WireClient& client, const std::string& request);
