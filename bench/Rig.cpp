@@ -37,7 +37,7 @@ std::string findByPathFrame(const std::string& path) {
 std::string findByUuidFrame(e2e::WireClient& client, const std::string& path) {
     client.send(findByPathFrame(path));
     const std::optional<e2e::Frame> reply = client.receive();
-    const Item form = decode(reply.value().body)["matches"].embedded();
+    const Item form = e2e::decode(reply.value().body)["matches"].embedded();
     return frameOf("find", Item::map({{"uuids", Item::uuid(form["uuid"].text())}}));
 }
 
