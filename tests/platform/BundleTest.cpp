@@ -1,0 +1,103 @@
+#include "platform/bundle/Bundle.h"
+
+#include <filesystem>
+#include <sys/stat.h>
+
+#include <gtest/gtest.h>
+
+#include "platform/plist/PropertyList.h"
+#include "tests/platform/TestFolder.h"
+
+namespace fs = std::filesystem;
+using namespace platform;
+using Property = BundleReader::Property;
+
+namespace {
+
+std::string infoNaming(const Value& executable) {
+    return *plist::writeXml(Dictionary{{"BQBundleExecutable", executable}, {"Key", 1}});
+}
+
+} // namespace
+
+TEST(BundleReader, ReadsPathsAndInfo) {
+    const TestFolder folder;
+    folder.write("A.app/Info.plist", infoNaming("Main"));
+    const auto executable = folder.write("A.app/Main", "");
+    fs::create_directory_symlink("A.app", folder / "link");
+    for (const char* name : {"A.app", "A.app/", "link"}) {
+        const auto bundle = BundleReader::atPath(folder / name);
+        EXPECT_EQ(bundle.stringProperty(Property::bundlePath), folder / "A.app");
+        EXPECT_EQ(bundle.stringProperty(Property::supportPath), folder / "A.app");
+        EXPECT_EQ(bundle.stringProperty(Property::executablePath), executable);
+        EXPECT_EQ(*bundle.infoDictionary()->find("Key"), Value(1));
+    }
+}
+
+TEST(BundleReader, TakesOnlyARegularFileInItsFolderForItsExecutable) {
+    const TestFolder folder;
+    fs::create_directories(folder / "A.app/Folder");
+    folder.write("A.app/Folder/Inner", "");
+    folder.write("outside", "");
+    ASSERT_EQ(::mkfifo((folder / "A.app/Pipe").c_str(), 0600), 0);
+    const Value names[] = {"Missing", "Folder", "Pipe", "Folder/Inner", "../outside",
+                           "",        "..",     1,      Array{"Main"}};
+    for (const Value& name : names) {
+        folder.write("A.app/Info.plist", infoNaming(name));
+        const auto bundle = BundleReader::atPath(folder / "A.app");
+        EXPECT_TRUE(bundle.stringProperty(Property::bundlePath)) << describe(name);
+        EXPECT_FALSE(bundle.stringProperty(Property::executablePath)) << describe(name);
+    }
+}
+
+TEST(BundleReader, IsInvalidWithoutAnInfoThatCanBeRead) {
+    const TestFolder folder;
+    folder.write("Broken/Info.plist", "<plist><dict>");
+    folder.write("List/Info.plist", *plist::writeXml(Array{1}));
+    folder.write("Big/Info.plist", infoNaming("x") + std::string(BundleReader::largestInfo, ' '));
+    fs::create_directories(folder / "Empty");
+    fs::create_directories(folder / "Pipe");
+    ASSERT_EQ(::mkfifo((folder / "Pipe/Info.plist").c_str(), 0600), 0);
+    folder.write("File", "");
+    for (const char* name : {"Broken", "List", "Big", "Empty", "Pipe", "File", "Missing"}) {
+        const auto bundle = BundleReader::atPath(folder / name);
+        EXPECT_FALSE(bundle.stringProperty(Property::bundlePath)) << name;
+        EXPECT_FALSE(bundle.stringProperty(Property::executablePath)) << name;
+        EXPECT_FALSE(bundle.infoDictionary()) << name;
+        EXPECT_FALSE(BundleReader::read(folder / name)) << name;
+    }
+    EXPECT_EQ(BundleReader::read(folder / "Empty").error().code, fileErrorNoSuchFile);
+    EXPECT_EQ(BundleReader::read(folder / "Big").error().code, fileErrorTooLarge);
+}
+
+TEST(BundleReader, FindsTheBundleThatNamesAnExecutable) {
+    const TestFolder folder;
+    folder.write("A.app/Info.plist", infoNaming("Main"));
+    folder.write("A.app/Main", "");
+    folder.write("A.app/helper", "");
+    folder.write("A.app/PlugIns/B.appex/Info.plist", infoNaming("B"));
+    folder.write("A.app/PlugIns/B.appex/B", "");
+    folder.write("A.app/PlugIns/C.appex/Info.plist", infoNaming("Linked"));
+    folder.write("A.app/PlugIns/C.appex/bin/real", "");
+    fs::create_symlink("bin/real", folder / "A.app/PlugIns/C.appex/Linked");
+
+    const struct {
+        const char* executable;
+        const char* bundle; // or nothing
+    } cases[] = {
+        {"A.app/Main", "A.app"},
+        {"A.app/helper", nullptr},
+        {"A.app/PlugIns/B.appex/B", "A.app/PlugIns/B.appex"},
+        {"A.app/PlugIns/C.appex/bin/real", "A.app/PlugIns/C.appex"},
+        {"A.app/missing", nullptr},
+        {"A.app", nullptr},
+    };
+
+    for (const auto& c : cases) {
+        const auto expected = c.bundle ? std::optional(folder / c.bundle) : std::nullopt;
+        EXPECT_EQ(
+            BundleReader::forExecutable(folder / c.executable).stringProperty(Property::bundlePath),
+            expected)
+            << c.executable;
+    }
+}

@@ -1,0 +1,148 @@
+#include <cerrno>
+#include <csignal>
+#include <filesystem>
+#include <sched.h>
+#include <set>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include "platform/sandbox/Confinement.h"
+#include "platform/sandbox/HmacSandbox.h"
+#include "tests/platform/TestFolder.h"
+
+using namespace platform;
+using testing::MatchesRegex;
+using testing::StartsWith;
+
+namespace {
+
+// A process that waits, and ends with the object. `prepare` runs in it first.
+class Child {
+public:
+    template <class F>
+    explicit Child(F prepare) {
+        int ends[2];
+        if (::pipe(ends) != 0)
+            std::abort();
+        pid_ = ::fork();
+        if (pid_ == 0) {
+            const char result = prepare() ? 'y' : 'n';
+            if (::write(ends[1], &result, 1) == 1)
+                ::pause();
+            ::_exit(0);
+        }
+        char result = 'n';
+        prepared_ = ::read(ends[0], &result, 1) == 1 && result == 'y';
+        ::close(ends[0]);
+        ::close(ends[1]);
+    }
+
+    ~Child() {
+        ::kill(pid_, SIGKILL);
+        ::waitpid(pid_, nullptr, 0);
+    }
+
+    [[nodiscard]] pid_t pid() const { return pid_; }
+
+    [[nodiscard]] bool prepared() const { return prepared_; }
+
+private:
+    pid_t pid_;
+    bool prepared_;
+};
+
+} // namespace
+
+TEST(HmacSandbox, IssuesTheSameTextForTheSameThing) {
+    const TestFolder folder;
+    folder.write("A b;c/file", "");
+    std::filesystem::create_directory_symlink("A b;c", folder / "link");
+    HmacSandbox sandbox;
+    const auto issue = [&](const std::string& path, std::uint32_t flags) {
+        return sandbox.issueFileExtension(Sandbox::readOnlyClass, path, flags).value_or("none");
+    };
+    const std::string token = issue(folder / "A b;c", Sandbox::canonicalPathFlag);
+    EXPECT_THAT(token, StartsWith("zsx1;com.tovana.app-sandbox.read;1;file;" + folder.path() +
+                                  "/A%20b%3bc;"));
+    EXPECT_THAT(token, MatchesRegex(".*;[0-9a-f]{64}"));
+    EXPECT_EQ(issue(folder / "link/../A b;c/", Sandbox::canonicalPathFlag), token);
+    HmacSandbox other;
+    EXPECT_NE(other.issueFileExtension(Sandbox::readOnlyClass, folder / "A b;c",
+                                       Sandbox::canonicalPathFlag),
+              token)
+        << "another start, another secret";
+}
+
+TEST(HmacSandbox, NeverIssuesOneTextForTwoThings) {
+    HmacSandbox sandbox;
+    std::set<std::string> tokens;
+    const auto add = [&](const std::expected<std::string, int>& token) {
+        ASSERT_TRUE(token);
+        EXPECT_TRUE(tokens.insert(*token).second) << *token;
+    };
+    add(sandbox.issueFileExtension("a", "/x", 0));
+    add(sandbox.issueFileExtension("b", "/x", 0));
+    add(sandbox.issueFileExtension("a", "/y", 0));
+    add(sandbox.issueFileExtension("a", "/x", 2));
+    add(sandbox.issueFileExtension("a", "/%78", 0));
+    add(sandbox.issueFileExtension("a;0;file;/x", "/x", 0));
+    add(sandbox.issueServiceExtension("a", "/x", 0));
+    add(sandbox.issueServiceExtension("a", "/x;0", 0));
+}
+
+TEST(HmacSandbox, RefusesWhatIsNotThere) {
+    const TestFolder folder;
+    HmacSandbox sandbox;
+    const auto file = [&](std::string_view path, std::uint32_t flags) {
+        const auto token = sandbox.issueFileExtension("a", path, flags);
+        return token ? 0 : token.error();
+    };
+    EXPECT_EQ(file(folder / "missing", Sandbox::canonicalPathFlag), ENOENT);
+    EXPECT_EQ(file(folder.path() + std::string("\0x", 2), Sandbox::canonicalPathFlag), ENOENT);
+    EXPECT_EQ(file(std::string_view("/x\0y", 4), 0), ENOENT);
+    EXPECT_EQ(file(folder.write("f", "") + "/below", Sandbox::canonicalPathFlag), ENOTDIR);
+    EXPECT_EQ(sandbox.issueServiceExtension("a", "", 0).error(), EINVAL);
+    EXPECT_EQ(sandbox.issueServiceExtension("a", std::string_view("a\0", 2), 0).error(), EINVAL);
+}
+
+TEST(HmacSandbox, TellsWhoIsMoreConfined) {
+    HmacSandbox sandbox;
+    EXPECT_FALSE(sandbox.isSandboxed(::getpid()));
+    const Child plain([] { return true; });
+    EXPECT_FALSE(sandbox.isSandboxed(plain.pid()));
+    EXPECT_TRUE(sandbox.isSandboxed(0));
+    EXPECT_TRUE(sandbox.isSandboxed(4'194'305)) << "beyond the greatest pid";
+    const Child confined([] { return ::unshare(CLONE_NEWUSER) == 0; });
+    EXPECT_EQ(sandbox.isSandboxed(confined.pid()), confined.prepared());
+}
+
+TEST(Confinement, ComparesFiltersAndNamespaces) {
+    const Confinement self{1, "user:[1]", "mnt:[1]"};
+    const Confinement first{0, "user:[1]", "mnt:[9]"};
+
+    const struct {
+        Confinement process;
+        bool confined;
+        bool confinedWithoutFirst;
+    } cases[] = {
+        {{1, "user:[1]", "mnt:[1]"}, false, false}, {{0, "user:[1]", "mnt:[1]"}, false, false},
+        {{2, "user:[1]", "mnt:[1]"}, true, true},   {{1, "user:[2]", "mnt:[1]"}, true, true},
+        {{1, "user:[1]", "mnt:[9]"}, false, true},  {{1, "user:[1]", "mnt:[2]"}, true, true},
+    };
+
+    for (const auto& c : cases) {
+        EXPECT_EQ(isMoreConfined(c.process, self, first), c.confined);
+        EXPECT_EQ(isMoreConfined(c.process, self, std::nullopt), c.confinedWithoutFirst);
+    }
+}
+
+TEST(Confinement, CountsTheFiltersOfAStatus) {
+    EXPECT_EQ(seccompFiltersIn("Name:\tx\nSeccomp:\t2\nSeccomp_filters:\t12\nx:\t1\n"), 12U);
+    EXPECT_EQ(seccompFiltersIn("Name:\tx\nSeccomp:\t2\n"), 1U);
+    EXPECT_EQ(seccompFiltersIn("Name:\tx\nSeccomp:\t0\n"), 0U);
+    EXPECT_EQ(seccompFiltersIn("Name:\tSeccomp_filters:\t5\n"), 0U);
+    EXPECT_EQ(seccompFiltersIn(""), 0U);
+}

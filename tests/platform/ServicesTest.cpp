@@ -1,0 +1,198 @@
+// The small services that keep their state in files.
+
+#include <cerrno>
+#include <csignal>
+#include <filesystem>
+#include <fstream>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <thread>
+#include <unistd.h>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include "platform/container/FolderContainers.h"
+#include "platform/ipc/Peer.h"
+#include "platform/notify/FileNotifications.h"
+#include "platform/plist/PropertyList.h"
+#include "platform/preferences/FilePreferences.h"
+#include "platform/process/ProcProcesses.h"
+#include "platform/signing/UnsignedPrograms.h"
+#include "tests/platform/TestFolder.h"
+
+namespace fs = std::filesystem;
+using namespace platform;
+
+namespace {
+
+std::uint64_t counterIn(const std::string& path) {
+    std::ifstream file(path, std::ios::binary);
+    std::uint64_t count = 0;
+    for (int i = 0; i < 8; ++i)
+        count |= static_cast<std::uint64_t>(file.get()) << (8 * i);
+    return count;
+}
+
+mode_t modeOf(const std::string& path) {
+    struct ::stat status = {};
+    return ::stat(path.c_str(), &status) == 0 ? status.st_mode & 07777 : 0;
+}
+
+// The umask for as long as it lives.
+class Umask {
+public:
+    explicit Umask(mode_t mask) : before_(::umask(mask)) {}
+
+    ~Umask() { ::umask(before_); }
+
+private:
+    mode_t before_;
+};
+
+} // namespace
+
+TEST(FilePreferences, ReadsADomainAgainWhenItChanged) {
+    const TestFolder folder;
+    FilePreferences preferences(folder.path());
+    EXPECT_FALSE(preferences.value("com.x", "key"));
+    folder.write("com.x.plist", *plist::writeXml(Dictionary{{"key", 1}}));
+    EXPECT_FALSE(preferences.value("com.x", "key")) << "not before synchronize";
+    preferences.synchronize("com.x");
+    EXPECT_EQ(preferences.value("com.x", "key"), Value(1));
+    EXPECT_FALSE(preferences.value("com.x", "other"));
+    EXPECT_FALSE(preferences.value("com.y", "key"));
+
+    folder.write("com.x.plist", *plist::writeXml(Dictionary{{"key", 2}}));
+    preferences.synchronize("com.x");
+    EXPECT_EQ(preferences.value("com.x", "key"), Value(2)) << "of the same size, a moment later";
+    fs::remove(folder / "com.x.plist");
+    preferences.synchronize("com.x");
+    EXPECT_FALSE(preferences.value("com.x", "key"));
+    for (const char* domain : {"", "../x", "a/b"}) {
+        preferences.synchronize(domain);
+        EXPECT_FALSE(preferences.value(domain, "key"));
+    }
+}
+
+TEST(FilePreferences, IgnoresWhatCannotBeTrusted) {
+    const TestFolder folder;
+    const auto file = folder.write("com.x.plist", *plist::writeXml(Dictionary{{"key", 1}}));
+    FilePreferences preferences(folder.path());
+    ASSERT_TRUE(preferences.value("com.x", "key"));
+    ASSERT_EQ(::chmod(file.c_str(), 0666), 0);
+    preferences.synchronize("com.x");
+    EXPECT_FALSE(preferences.value("com.x", "key"));
+    ASSERT_EQ(::chmod(file.c_str(), 0644), 0);
+    preferences.synchronize("com.x");
+    EXPECT_TRUE(preferences.value("com.x", "key"));
+    for (const std::string& content : {std::string("broken"), *plist::writeXml(Array{1})}) {
+        folder.write("com.x.plist", content);
+        preferences.synchronize("com.x");
+        EXPECT_FALSE(preferences.value("com.x", "key")) << content;
+    }
+}
+
+TEST(FileNotifications, CountEachPost) {
+    const TestFolder folder;
+    const Umask umask(077);
+    FileNotifications notifications(folder / "run/notify");
+    notifications.post("com.x.changed");
+    EXPECT_EQ(counterIn(folder / "run/notify/com.x.changed"), 1U);
+    EXPECT_EQ(modeOf(folder / "run/notify"), 0755U) << "everybody may watch";
+    EXPECT_EQ(modeOf(folder / "run/notify/com.x.changed"), 0644U);
+    std::vector<std::thread> threads;
+    for (int t = 0; t < 4; ++t) {
+        threads.emplace_back([&] {
+            for (int i = 0; i < 100; ++i)
+                notifications.post("com.x.changed");
+        });
+    }
+    for (auto& thread : threads)
+        thread.join();
+    EXPECT_EQ(counterIn(folder / "run/notify/com.x.changed"), 401U);
+}
+
+TEST(FileNotifications, NeverWaitAndNeverLeaveTheirFolder) {
+    const TestFolder folder;
+    fs::create_directories(folder / "notify");
+    ASSERT_EQ(::mkfifo((folder / "notify/pipe").c_str(), 0666), 0);
+    folder.write("target", "");
+    fs::create_symlink("../target", folder / "notify/link");
+    FileNotifications notifications(folder / "notify");
+    for (const char* name : {"pipe", "link", "../target", "", "."})
+        notifications.post(name);
+    EXPECT_EQ(fs::file_size(folder / "target"), 0U);
+    notifications.post("fine");
+    EXPECT_EQ(counterIn(folder / "notify/fine"), 1U);
+}
+
+TEST(FolderContainers, MakesAPrivateFolderOnce) {
+    const TestFolder folder;
+    FolderContainers containers(folder / "lib/Containers");
+    const auto made = containers.dataContainer("com.x.app");
+    ASSERT_TRUE(made);
+    EXPECT_EQ(*made, folder / "lib/Containers/com.x.app");
+    EXPECT_EQ(modeOf(*made), 0700U);
+    EXPECT_EQ(modeOf(*made + "/tmp"), 0700U);
+    folder.write("lib/Containers/com.x.app/file", "kept");
+    EXPECT_EQ(containers.dataContainer("com.x.app").value_or("none"), *made);
+    EXPECT_TRUE(fs::exists(*made + "/file"));
+}
+
+TEST(FolderContainers, RefusesWhatWouldLeadElsewhere) {
+    const TestFolder folder;
+    FolderContainers containers(folder / "Containers");
+    fs::create_directories(folder / "elsewhere");
+    fs::create_directories(folder / "Containers");
+    fs::create_directory_symlink("../elsewhere", folder / "Containers/link");
+    folder.write("Containers/file", "");
+    const std::string_view identifiers[] = {
+        "", ".", "..", "a/b", "/a", std::string_view("a\0b", 3), "a\nb", "link", "file"};
+    for (const auto identifier : identifiers)
+        EXPECT_FALSE(containers.dataContainer(identifier)) << identifier;
+    EXPECT_FALSE(containers.dataContainer(std::string(256, 'a')));
+    EXPECT_TRUE(containers.dataContainer(std::string(255, 'a')));
+    EXPECT_TRUE(fs::is_empty(folder / "elsewhere"));
+}
+
+TEST(ProcProcesses, TellTheRunningFileAtItsOwnPath) {
+    ProcProcesses processes;
+    const auto own = processes.executablePath(::getpid(), 4096);
+    ASSERT_TRUE(own);
+    EXPECT_EQ(*own, fs::read_symlink("/proc/self/exe"));
+    EXPECT_EQ(processes.executablePath(::getpid(), own->size() + 1), own);
+    EXPECT_EQ(processes.executablePath(::getpid(), own->size()).error(), ENAMETOOLONG);
+    EXPECT_EQ(processes.executablePath(0, 4096).error(), ESRCH);
+    EXPECT_EQ(processes.executablePath(-1, 4096).error(), ESRCH);
+    EXPECT_FALSE(processes.executablePath(4'194'305, 4096)) << "beyond the greatest pid";
+}
+
+TEST(ProcProcesses, DoNotNameAFileThatIsAnotherByNow) {
+    const TestFolder folder;
+    const std::string program = folder / "sleeper";
+    fs::copy_file("/bin/sleep", program);
+    const pid_t child = ::fork();
+    if (child == 0) {
+        ::execl(program.c_str(), "sleeper", "60", nullptr);
+        ::_exit(127);
+    }
+    ProcProcesses processes;
+    for (int i = 0; i < 500 && processes.executablePath(child, 4096) != program; ++i)
+        ::usleep(10'000);
+    EXPECT_EQ(processes.executablePath(child, 4096), program);
+    fs::remove(program);
+    EXPECT_EQ(processes.executablePath(child, 4096).error(), ENOENT) << "deleted";
+    fs::copy_file("/bin/sleep", program);
+    EXPECT_EQ(processes.executablePath(child, 4096).error(), ENOENT) << "replaced";
+    ::kill(child, SIGKILL);
+    ::waitpid(child, nullptr, 0);
+}
+
+TEST(UnsignedPrograms, HaveNoEntitlements) {
+    UnsignedPrograms signing;
+    const auto answer = signing.taskFor(ipc::Peer())->entitlement("com.x");
+    ASSERT_TRUE(answer);
+    EXPECT_FALSE(*answer);
+    EXPECT_FALSE(signing.bundleEntitlements("/"));
+}

@@ -1,0 +1,107 @@
+#include <sys/stat.h>
+
+#include <gtest/gtest.h>
+
+#include "platform/plist/PropertyList.h"
+#include "platform/types/DeclaredTypes.h"
+#include "tests/platform/TestFolder.h"
+
+using namespace platform;
+
+namespace {
+
+Dictionary conformsTo(const Value& parents) {
+    return {{"ConformsTo", parents}};
+}
+
+// jpeg, png -> image -> data; movie -> data; a ring of two.
+Dictionary declarations() {
+    return {{"jpeg", conformsTo("image")},
+            {"png", conformsTo(Array{"image", 1, "web"})},
+            {"image", conformsTo("data")},
+            {"movie", conformsTo(Array{"data"})},
+            {"ring-a", conformsTo("ring-b")},
+            {"ring-b", conformsTo("ring-a")},
+            {"odd", "image"},
+            {"odder", conformsTo(5)}};
+}
+
+} // namespace
+
+TEST(DeclaredTypes, ConformThroughDeclarations) {
+    const TestFolder folder;
+    DeclaredTypes types(folder.write("Types.plist", *plist::writeXml(declarations())));
+
+    const struct {
+        const char* type;
+        const char* target;
+        bool conforms;
+    } cases[] = {
+        {"jpeg", "jpeg", true},     {"jpeg", "image", true},    {"jpeg", "data", true},
+        {"png", "web", true},       {"image", "jpeg", false},   {"movie", "image", false},
+        {"Jpeg", "image", false},   {"unknown", "data", false}, {"unknown", "unknown", true},
+        {"ring-a", "ring-b", true}, {"ring-a", "data", false},  {"odd", "image", false},
+        {"odder", "image", false},
+    };
+
+    for (const auto& c : cases)
+        EXPECT_EQ(types.conforms(c.type, c.target), c.conforms) << c.type << " " << c.target;
+}
+
+TEST(DeclaredTypes, ComeFromTheFileAndFromBundles) {
+    const TestFolder folder;
+    const std::string file = folder / "Types.plist";
+    DeclaredTypes types(file);
+    EXPECT_FALSE(types.conforms("a", "b"));
+    types.setBundleDeclarations(
+        {Array{Dictionary{{"TypeIdentifier", "a"}, {"ConformsTo", "b"}}, 1, Dictionary{}},
+         Dictionary{{"b", conformsTo("c")}}, "nonsense"});
+    EXPECT_TRUE(types.conforms("a", "c"));
+    folder.write("Types.plist",
+                 *plist::writeXml(Dictionary{
+                     {"TypeDeclarations",
+                      Array{Dictionary{{"TypeIdentifier", "c"}, {"ConformsTo", Array{"d"}}}}}}));
+    EXPECT_TRUE(types.conforms("a", "d")) << "through both";
+    types.setBundleDeclarations({});
+    EXPECT_FALSE(types.conforms("a", "d"));
+    EXPECT_TRUE(types.conforms("c", "d"));
+    ASSERT_EQ(::chmod(file.c_str(), 0666), 0);
+    EXPECT_FALSE(types.conforms("c", "d")) << "others could have written it";
+}
+
+TEST(DeclaredTypes, EvaluateActivationRules) {
+    const TestFolder folder;
+    DeclaredTypes types(folder.write("Types.plist", *plist::writeXml(declarations())));
+    const Value rule = Dictionary{{"image", 2}, {"png", 3}, {"movie", true}, {"text", "many"}};
+
+    const struct {
+        Value rule;
+        Dictionary offer;
+        bool accepted;
+    } cases[] = {
+        {true, {{"jpeg", 1}}, true},
+        {1, {{"jpeg", 1}}, true},
+        {false, {{"jpeg", 1}}, false},
+        {0.0, {{"jpeg", 1}}, false},
+        {true, {}, false},
+        {true, {{"jpeg", "one"}}, false},
+        {"TRUE", {{"jpeg", 1}}, false},
+        {Value(), {{"jpeg", 1}}, false},
+        {Array{"image"}, {{"jpeg", 1}}, false},
+        {Dictionary{}, {{"jpeg", 1}}, false},
+        {rule, {}, false},
+        {rule, {{"jpeg", 2}}, true},
+        {rule, {{"jpeg", 3}}, false},
+        {rule, {{"png", 3}}, true}, // by its own key
+        {rule, {{"jpeg", 2}, {"png", 3}, {"movie", 1}}, true},
+        {rule, {{"jpeg", 2}, {"data", 1}}, false},
+        {rule, {{"movie", 2}}, false},
+        {rule, {{"text", 1}}, false},
+        {rule, {{"jpeg", -1}}, false},
+        {rule, {{"jpeg", true}}, true},
+    };
+
+    for (const auto& c : cases)
+        EXPECT_EQ(types.evaluateActivationRule(c.rule, c.offer), c.accepted)
+            << describe(c.rule) << " " << describe(c.offer);
+}
