@@ -1,0 +1,12 @@
+#pragma once
+
+#include "zpctl/Verb.h"
+
+// The `declare` of each verb, each in a source named after it.
+namespace zpctl {
+
+Action declareMatch(CLI::App& command);
+Action declareFind(CLI::App& command);
+Action declareTree(CLI::App& command);
+
+} // namespace zpctl
