@@ -1,0 +1,121 @@
+#include "zpctl/CommandLine.h"
+
+#include <cstdlib>
+#include <filesystem>
+#include <sstream>
+#include <string>
+#include <sys/socket.h>
+#include <sys/un.h>
+#include <vector>
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <nlohmann/json.hpp>
+
+#include "platform/file/File.h"
+#include "platform/log/Log.h"
+
+namespace {
+
+using testing::HasSubstr;
+using zpctl::Status;
+
+// Runs the tool where there is no daemon.
+class CommandLine : public testing::Test {
+protected:
+    void SetUp() override {
+        platform::log::silence();
+        char name[] = "/tmp/zpctl-home-XXXXXX";
+        ASSERT_TRUE(mkdtemp(name));
+        home_ = name;
+        setenv("ZEPHRIN_HOME", name, 1);
+    }
+
+    void TearDown() override { std::filesystem::remove_all(home_); }
+
+    Status run(const std::vector<std::string>& arguments) {
+        out_.str("");
+        err_.str("");
+        return zpctl::run(arguments, {.out = out_, .err = err_});
+    }
+
+    std::filesystem::path home_;
+    std::ostringstream out_;
+    std::ostringstream err_;
+};
+
+TEST_F(CommandLine, ExplainsItselfOnStandardOutput) {
+    EXPECT_EQ(run({"--help"}), Status::done);
+    for (const zpctl::Verb& verb : zpctl::verbs())
+        EXPECT_THAT(out_.str(), HasSubstr(verb.name));
+    EXPECT_EQ(run({"match", "--help"}), Status::done);
+    EXPECT_THAT(out_.str(), HasSubstr("KEY=PATTERN"));
+    EXPECT_EQ(run({"--version"}), Status::done);
+    EXPECT_THAT(out_.str(), testing::StartsWith("zpctl "));
+    EXPECT_EQ(err_.str(), "");
+}
+
+TEST_F(CommandLine, RefusesWrongUsage) {
+    const std::vector<std::string> cases[] = {
+        {},
+        {"fly"},
+        {"find"},
+        {"find", "a", "b"},
+        {"match", "--flags", "-1"},
+        {"match", "--flags", "many"},
+        {"match", "--flags", "18446744073709551616"},
+        {"match", "no rule"},
+        {"match", "--rules", "/does/not/exist"},
+        {"--timeout", "0", "tree"},
+        {"--timeout", "soon", "tree"},
+        {"--service", "../else", "tree"},
+        {"--service", "", "tree"},
+        {"tree", "up"},
+    };
+    for (const auto& arguments : cases) {
+        EXPECT_EQ(run(arguments), Status::wrongUsage) << testing::PrintToString(arguments);
+        EXPECT_EQ(out_.str(), "") << testing::PrintToString(arguments);
+        EXPECT_NE(err_.str(), "") << testing::PrintToString(arguments);
+    }
+}
+
+TEST_F(CommandLine, TellsWhenThereIsNoDaemon) {
+    const std::vector<std::string> cases[] = {
+        {"tree"}, {"match", "--flags", "0x5", "a=b"}, {"--service", "other", "find", "/x.appex"}};
+    for (const auto& arguments : cases) {
+        EXPECT_EQ(run(arguments), Status::noDaemon);
+        EXPECT_THAT(err_.str(), testing::StartsWith("zpctl: no daemon"));
+    }
+    EXPECT_EQ(run({"--json", "tree"}), Status::noDaemon);
+    EXPECT_TRUE(nlohmann::json::parse(err_.str())["error"]["message"].is_string());
+}
+
+// Listens at the daemon's place and never accepts.
+class SilentDaemon {
+public:
+    explicit SilentDaemon(const std::filesystem::path& home)
+        : socket_(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
+        std::filesystem::create_directories(home / "run");
+        sockaddr_un address{.sun_family = AF_UNIX, .sun_path = {}};
+        const std::string path = home / "run/com.tovana.zephrin.zpd";
+        path.copy(address.sun_path, sizeof address.sun_path - 1);
+        listening_ = ::bind(socket_.get(), reinterpret_cast<const sockaddr*>(&address),
+                            sizeof address) == 0 &&
+                     ::listen(socket_.get(), 1) == 0;
+    }
+
+    [[nodiscard]] bool listening() const { return listening_; }
+
+private:
+    platform::UniqueFd socket_;
+    bool listening_ = false;
+};
+
+TEST_F(CommandLine, GivesUpOnADaemonThatDoesNotAnswer) {
+    const SilentDaemon daemon(home_);
+    ASSERT_TRUE(daemon.listening());
+    EXPECT_EQ(run({"--timeout", "0.2", "tree"}), Status::noDaemon);
+    EXPECT_EQ(err_.str(), "zpctl: the daemon did not answer within 0.2 s\n");
+}
+
+} // namespace
