@@ -1,0 +1,202 @@
+#!/bin/sh
+# demo.sh [BUILD-FOLDER]: shows the daemon at work on the sample applications, in a home of its own.
+# Every step prints its command as a user would type it, and is checked. Exit status 0 only if all
+# of it worked; else the daemon's log is shown.
+set -eu
+cd "$(dirname "$0")/.."
+umask 022
+
+build=$(realpath "${1:-build/release}")
+step_limit=100 # tenths of a second that anything here may take
+
+home=
+daemon=
+
+clean_up() {
+    status=$?
+    trap - EXIT INT TERM
+    if [ -n "$daemon" ]; then
+        kill "$daemon" 2>/dev/null || true
+        wait "$daemon" 2>/dev/null || true
+    fi
+    [ -z "$home" ] || rm -rf "$home"
+    exit $status
+}
+trap clean_up EXIT
+trap 'exit 130' INT
+trap 'exit 143' TERM
+
+# Not below TMPDIR: the path of a socket must be short.
+home=$(mktemp -d /tmp/zpd-demo.XXXXXX)
+log=$home/zpd.log
+output=$home/output
+PATH=$build/bin:$PATH
+export ZEPHRIN_HOME="$home/home"
+export PATH
+socket=$ZEPHRIN_HOME/run/com.tovana.zephrin.zpd
+# The samples' language comes from the home, not from whoever runs this.
+unset LANG LC_ALL LC_CTYPE NO_COLOR ZEPHRIN_LOG ZEPHRIN_LOG_PRIVATE XDG_DATA_HOME 2>/dev/null || true
+
+fail() {
+    printf '\nFAILED: %s\n' "$1" >&2
+    if [ -s "$log" ]; then
+        echo "--- the daemon's log:" >&2
+        cat "$log" >&2
+    fi
+    exit 1
+}
+
+title() {
+    printf '\n== %s\n' "$1"
+}
+
+# run STATUS COMMAND...: prints the command, runs it, shows its output, and checks its exit status.
+run() {
+    expected=$1
+    shift
+    printf '$'
+    for word in "$@"; do
+        case $word in
+        *[!A-Za-z0-9_./:=,%+@-]*) printf " '%s'" "$word" ;;
+        *) printf ' %s' "$word" ;;
+        esac
+    done
+    echo
+    status=0
+    "$@" >"$output" 2>&1 || status=$?
+    sed 's/^/  /' "$output"
+    [ "$status" -eq "$expected" ] || fail "exit status $status, expected $expected: $*"
+}
+
+# shows TEXT...: the last output has each of the texts.
+shows() {
+    for text in "$@"; do
+        grep -qF -- "$text" "$output" || fail "the output above lacks: $text"
+    done
+}
+
+# hides TEXT: the last output does not have the text.
+hides() {
+    ! grep -qF -- "$1" "$output" || fail "the output above should not have: $1"
+}
+
+# eventually COMMAND...: tries until the command succeeds; false when it takes too long.
+eventually() {
+    tries=0
+    until "$@"; do
+        tries=$((tries + 1))
+        [ $tries -lt $step_limit ] || return 1
+        sleep 0.1
+    done
+}
+
+answers_or_ended() {
+    [ -S "$socket" ] || ! kill -0 "$daemon" 2>/dev/null
+}
+
+start_daemon() {
+    echo "\$ zpd -d \$ZEPHRIN_HOME/Annotations &"
+    zpd -d "$ZEPHRIN_HOME/Annotations" >>"$log" 2>&1 &
+    daemon=$!
+    eventually answers_or_ended || fail "the daemon made no socket"
+    kill -0 "$daemon" 2>/dev/null || fail "the daemon ended at once"
+}
+
+stop_daemon() {
+    echo "\$ kill %1"
+    kill "$daemon"
+    status=0
+    wait "$daemon" || status=$?
+    daemon=
+    [ $status -eq 0 ] || fail "the daemon ended with status $status, expected 0"
+}
+
+install_samples() {
+    mkdir -p "$ZEPHRIN_HOME/etc"
+    cp -R "$build/examples/Applications" "$build/examples/System" "$ZEPHRIN_HOME/"
+    # The daemon trusts no bundle that others could change.
+    chmod -R u+rwX,go=rX "$ZEPHRIN_HOME"
+    echo 'LANG=en_GB.UTF-8' >"$ZEPHRIN_HOME/etc/locale.conf"
+}
+
+uuid_in_output() {
+    sed -n 's/.*\([0-9A-F]\{8\}\(-[0-9A-F]\{4\}\)\{3\}-[0-9A-F]\{12\}\).*/\1/p' "$output" | head -n 1
+}
+
+tree_is_german() {
+    zpctl tree 2>/dev/null | grep -qF 'Untertitel-Versatz'
+}
+
+for program in "$build/bin/zpd" "$build/bin/zpctl" "$build/examples/Applications"; do
+    [ -e "$program" ] || fail "not built: $program (make demo builds it)"
+done
+
+title "A home with two sample applications, and a daemon on it"
+install_samples
+echo "\$ export ZEPHRIN_HOME=$ZEPHRIN_HOME"
+run 0 ls "$ZEPHRIN_HOME/Applications"
+shows Cinema.app Jukebox.app
+start_daemon
+
+title "What is installed: applications, and the plug-ins in them"
+run 0 zpctl tree
+shows Cinema Jukebox 'Poster Painter' 'Subtitle Shifter' 'Word Prediction' Dusk \
+    '5 plug-ins in 2 applications'
+
+title "A host looks for plug-ins at an extension point: of one identifier the newest version"
+run 0 zpctl match HXExtensionPointIdentifier=com.example.artwork
+shows com.example.posters 1.10 '1 plug-in'
+hides 1.9
+
+title "Versions compare as numbers: 1.9 comes before 1.10 (flag 1: older versions too)"
+run 0 zpctl match --flags 1 HXExtensionIdentifier=com.example.posters 'HXExtensionVersion=<1.10'
+shows 1.9 '1 plug-in'
+hides 1.10
+run 0 zpctl match --flags 1 HXExtensionIdentifier=com.example.posters 'HXExtensionVersion=>=1.9'
+shows 1.9 1.10 '2 plug-ins'
+
+title "Alternatives: a keyboard or a theme"
+run 0 zpctl match HXExtensionPointIdentifier=com.tovana.keyboard-service \
+    HXExtensionPointIdentifier=com.example.themes
+shows com.example.predict com.example.theme.dusk '2 plug-ins'
+
+title "One plug-in, by its UUID and by its path"
+run 0 zpctl match HXExtensionIdentifier=com.example.predict
+uuid=$(uuid_in_output)
+[ -n "$uuid" ] || fail "no UUID in the output above"
+run 0 zpctl find "$uuid"
+shows com.example.predict 'Word Prediction' Predict.appex "$uuid"
+run 0 zpctl find "$ZEPHRIN_HOME/Applications/Jukebox.app/PlugIns/Predict.appex"
+shows com.example.predict "$uuid"
+
+title "The same for programs"
+run 0 zpctl --json find "$uuid"
+shows '"identifier": "com.example.predict"' "\"uuid\": \"$uuid\"" '"systemResident": false'
+
+title "What is not there is refused, with the daemon's words and exit status 1"
+run 1 zpctl find "$ZEPHRIN_HOME/Applications/Nothing.app/PlugIns/Nothing.appex"
+shows 'Cannot locate PlugIn' 'code 15'
+
+title "Host programs ask through libZephrin; an application's own plug-in goes before a newer one"
+run 0 "$ZEPHRIN_HOME/Applications/Jukebox.app/Jukebox" com.example.artwork
+shows 'com.example.posters 1.10' Jukebox.app/PlugIns
+run 0 "$ZEPHRIN_HOME/Applications/Cinema.app/Cinema" com.example.artwork
+shows 'com.example.posters 1.9' Cinema.app/PlugIns
+hides 1.10
+
+title "The box's language changes: so do the names"
+echo "\$ echo LANG=de_DE.UTF-8 > \$ZEPHRIN_HOME/etc/locale.conf"
+echo 'LANG=de_DE.UTF-8' >"$ZEPHRIN_HOME/etc/locale.conf"
+eventually tree_is_german || true
+run 0 zpctl tree
+shows Kino Untertitel-Versatz
+
+title "After a restart everything is still known, under the same UUID"
+stop_daemon
+run 3 zpctl find "$uuid"
+start_daemon
+run 0 zpctl find "$uuid"
+shows com.example.predict "$uuid"
+stop_daemon
+
+printf '\nThe demo worked: every step above did what it should.\n'
