@@ -1,0 +1,216 @@
+#include <gtest/gtest.h>
+
+#include "tests/model/Samples.h"
+
+using platform::Array;
+using platform::Dictionary;
+using platform::Value;
+
+namespace {
+
+// A record with one attribute, "Key", of this value.
+struct AttributeWorld : RecordWorld {
+    explicit AttributeWorld(Value value)
+        : plugIn(record(samplePlugIn(infoWith(extensionWith({{"Key", std::move(value)}}))))) {}
+
+    [[nodiscard]] bool holds(Value pattern) const {
+        return plugIn->match(Dictionary{{"Key", std::move(pattern)}});
+    }
+
+    ZPDPlugIn::Ptr plugIn;
+};
+
+struct Comparison {
+    const char* pattern;
+    const char* value;
+    bool holds;
+};
+
+} // namespace
+
+TEST(Rules, HoldWhenThereAreNone) {
+    RecordWorld world;
+    const auto record = world.record();
+    EXPECT_TRUE(record->match(std::nullopt));
+    EXPECT_TRUE(record->match(Dictionary()));
+}
+
+TEST(Rules, HoldOnlyTogether) {
+    RecordWorld world;
+    const auto record = world.record();
+    EXPECT_TRUE(record->match(Dictionary{{"HXExtensionIdentifier", "com.example.sample"},
+                                         {"HXExtensionVersion", ">=1.9"}}));
+    EXPECT_FALSE(record->match(Dictionary{{"HXExtensionIdentifier", "com.example.sample"},
+                                          {"HXExtensionVersion", "<1.9"}}));
+}
+
+TEST(Rules, CompareTextsByTheirOperators) {
+    const Comparison cases[] = {
+        {"a", "a", true},
+        {"a", "A", false},
+        {"", "", true},
+        {"=a", "a", true},
+        {"=", "", true},
+        {"=<x", "<x", true},
+        {"=<x", "a", false},
+        {"<>a", "b", true},
+        {"<>a", "a", false},
+        {"<>", "", false},
+        {"<>", "a", true},
+        {">=2.10", "2.9", false},
+        {">=2.10", "2.10.1", true},
+        {">=2.10", "2.10", true},
+        {"<=2.10", "2.9", true},
+        {"<=2.10", "2.11", false},
+        {"<2", "10", false},
+        {"<10", "2", true},
+        {"<2", "2", false},
+        {">9", "10", true},
+        {">10", "10", false},
+        {"<=>", "=", true},
+        {"<=>", "?", false},
+        {"01", "1", true},
+        {"*", "a", false},
+        {"*", "*", true},
+        {"a*", "ab", false},
+        {"?KM-OTHER:a", "a", false},
+        {"?", "?", false},
+    };
+    for (const auto& c : cases) {
+        EXPECT_EQ(AttributeWorld(c.value).holds(c.pattern), c.holds)
+            << "\"" << c.value << "\" with \"" << c.pattern << "\"";
+    }
+}
+
+TEST(Rules, AskHowTypesConform) {
+    const auto holds = [](const char* value, const char* pattern) {
+        AttributeWorld world(value);
+        world.platform.types.conformances = {{"public.png", "public.image"}};
+        return world.holds(pattern);
+    };
+    EXPECT_TRUE(holds("public.png", "?KM-CONFORMS:public.image"));
+    EXPECT_FALSE(holds("public.image", "?KM-CONFORMS:public.png"));
+    EXPECT_TRUE(holds("public.image", "?KM-IS:public.png"));
+    EXPECT_FALSE(holds("public.png", "?KM-IS:public.image"));
+}
+
+TEST(Rules, TellWhetherAPropertyIsThere) {
+    const struct {
+        Value value;
+        bool isThere;
+    } cases[] = {{"text", true},  {"", true},     {"NO", true}, {true, true}, {7, true},
+                 {Array(), true}, {false, false}, {0, false},   {0.0, false}};
+
+    for (const auto& c : cases) {
+        AttributeWorld world(c.value);
+        for (const auto& yes : {Value(true), Value(1), Value(1.0)})
+            EXPECT_EQ(world.holds(yes), c.isThere) << describe(c.value);
+        for (const auto& no : {Value(false), Value(0), Value(0.0)})
+            EXPECT_EQ(world.holds(no), !c.isThere) << describe(c.value);
+    }
+    RecordWorld world;
+    EXPECT_TRUE(world.record()->match(Dictionary{{"Absent", false}}));
+    EXPECT_FALSE(world.record()->match(Dictionary{{"Absent", true}}));
+    EXPECT_FALSE(world.record()->match(Dictionary{{"Absent", "<>x"}}));
+}
+
+TEST(Rules, HoldForAnyOfSeveral) {
+    const struct {
+        Value value;
+        Value pattern;
+        bool holds;
+    } cases[] = {
+        {Array{"a", "b"}, "b", true},
+        {Array{"a", "b"}, Array{"c", "a"}, true},
+        {Array{"a", "b"}, Array{"c", "d"}, false},
+        {Array{"a", 3}, "3", false},
+        {Array{3, "a"}, "a", true},
+        {Array(), "a", false},
+        {"a", Array{7, "a"}, true},
+        {"a", Array(), false},
+        {"a", 7, false},
+        {"a", nullptr, false},
+        {3, "3", false},
+        {Dictionary{{"a", 1}}, "a", false},
+        {platform::Date{1}, "1", false},
+    };
+
+    for (const auto& c : cases) {
+        EXPECT_EQ(AttributeWorld(c.value).holds(c.pattern), c.holds)
+            << describe(c.value) << " with " << describe(c.pattern);
+    }
+}
+
+TEST(Rules, HandDictionariesToTheActivationRule) {
+    const Dictionary offer{{"public.png", 2}};
+    for (const bool answer : {true, false}) {
+        AttributeWorld world(Dictionary{{"public.image", 3}});
+        world.platform.types.ruleAnswer = answer;
+        EXPECT_EQ(world.holds(offer), answer);
+        ASSERT_EQ(world.platform.types.evaluated.size(), 1U);
+        EXPECT_EQ(world.platform.types.evaluated[0].first, Value(Dictionary{{"public.image", 3}}));
+        EXPECT_EQ(world.platform.types.evaluated[0].second, offer);
+    }
+}
+
+TEST(Rules, ReadTheirPropertyWhereTheKeySays) {
+    RecordWorld world;
+    auto info = infoWith(extensionWith({{"Both", "attribute"}, {"com.tovana.uuid", "no"}}));
+    info.set("Both", "info");
+    info.set("HXExtensionPointIdentifier", "com.example.point");
+    auto plugIn = samplePlugIn(info);
+    plugIn->granted = Dictionary{{"right", "x"}, {"off", false}, {"HXExtensionIdentifier", "e"}};
+    const auto record = world.record(plugIn);
+
+    const struct {
+        std::string key;
+        Value pattern;
+        bool holds;
+    } cases[] = {
+        {"Both", "attribute", true},
+        {"BQBundleDisplayName", "Sample", true},
+        {"HXExtensionPointIdentifier", "com.example.point", true},
+        {"com.tovana.uuid", record->uuid().text(), true},
+        {"com.tovana.uuid", "no", false},
+        {"HXExtensionIdentifier", "com.example.sample", true},
+        {"HXExtensionContainingApp", "/Applications/Host.app", true},
+        {"ENTITLEMENT:right", true, true},
+        {"ENTITLEMENT:right", "=x", true},
+        {"ENTITLEMENT:right", "=y", false},
+        {"ENTITLEMENT:off", false, true},
+        {"ENTITLEMENT:absent", false, true},
+        {"ENTITLEMENT:HXExtensionIdentifier", "e", true},
+        {"ENTITLEMENT:", true, false},
+    };
+
+    for (const auto& c : cases)
+        EXPECT_EQ(record->match(Dictionary{{c.key, c.pattern}}), c.holds)
+            << c.key << " with " << describe(c.pattern);
+}
+
+TEST(Rules, AboutTheContainingApplicationFailWithoutOne) {
+    RecordWorld world;
+    auto plugIn = samplePlugIn();
+    plugIn->application.reset();
+    plugIn->path = "/System/Library/X.appex";
+    const auto record = world.record(plugIn);
+    for (const auto& pattern : {Value(false), Value(true), Value("<>x")})
+        EXPECT_FALSE(record->match(Dictionary{{"HXExtensionContainingApp", pattern}}));
+}
+
+TEST(Rules, CompareElectionsWithoutTheirSecondByte) {
+    RecordWorld world;
+    const auto record = world.record();
+    const std::pair<std::optional<Value>, const char*> cases[] = {
+        {std::nullopt, "0"}, {0, "0"},       {1, "1"},    {257, "1"},
+        {65537, "65537"},    {-1, "-65281"}, {true, "1"}, {"1", "0"},
+    };
+    for (const auto& [election, text] : cases) {
+        world.annotations.stored =
+            election ? Dictionary{{"election", *election}} : Dictionary{{"other", 1}};
+        EXPECT_TRUE(record->match(Dictionary{{"HXUserElection", text}})) << text;
+    }
+    world.annotations.stored.reset();
+    EXPECT_TRUE(record->match(Dictionary{{"HXUserElection", "0"}}));
+    EXPECT_TRUE(record->match(Dictionary{{"HXUserElection", true}})); // the text "0" is there
+}
