@@ -1,10 +1,8 @@
-#include <bit>
-#include <cmath>
 #include <optional>
 #include <vector>
 
+#include "platform/plist/BinaryForms.h"
 #include "platform/plist/Readers.h"
-#include "platform/plist/Utf8.h"
 
 namespace platform::plist {
 
@@ -45,7 +43,6 @@ private:
         return std::nullopt;
     }
 
-    [[nodiscard]] static std::uint64_t number(std::string_view bytes);
     [[nodiscard]] bool readTrailer();
     [[nodiscard]] std::optional<std::size_t> offsetOf(std::uint64_t object);
     [[nodiscard]] std::optional<std::size_t> takeCount(Content& content);
@@ -73,14 +70,6 @@ private:
     std::size_t bytesRead_ = 0;
 };
 
-// REQUIRES: at most 8 bytes
-std::uint64_t Reader::number(std::string_view bytes) {
-    std::uint64_t made = 0;
-    for (const char c : bytes)
-        made = (made << 8) | static_cast<unsigned char>(c);
-    return made;
-}
-
 bool Reader::readTrailer() {
     const auto bad = [this] {
         fail("bad trailer");
@@ -91,9 +80,9 @@ bool Reader::readTrailer() {
     const std::string_view trailer = bytes_.substr(bytes_.size() - trailerSize);
     offsetSize_ = static_cast<unsigned char>(trailer[6]);
     referenceSize_ = static_cast<unsigned char>(trailer[7]);
-    count_ = number(trailer.substr(8, 8));
-    top_ = number(trailer.substr(16, 8));
-    const std::uint64_t tableStart = number(trailer.substr(24, 8));
+    count_ = binaryNumber(trailer.substr(8, 8));
+    top_ = binaryNumber(trailer.substr(16, 8));
+    const std::uint64_t tableStart = binaryNumber(trailer.substr(24, 8));
     const std::size_t tableEnd = bytes_.size() - trailerSize;
     if (offsetSize_ < 1 || offsetSize_ > 8 || referenceSize_ < 1 || referenceSize_ > 8)
         return bad();
@@ -109,7 +98,7 @@ bool Reader::readTrailer() {
 std::optional<std::size_t> Reader::offsetOf(std::uint64_t object) {
     if (object >= count_)
         return fail("a reference to no object");
-    const std::uint64_t offset = number(offsets_.substr(object * offsetSize_, offsetSize_));
+    const std::uint64_t offset = binaryNumber(offsets_.substr(object * offsetSize_, offsetSize_));
     if (offset < binaryMagic.size() || offset >= objects_.size())
         return fail("an offset outside the objects");
     return offset;
@@ -125,7 +114,7 @@ std::optional<std::size_t> Reader::takeCount(Content& content) {
     const std::size_t size = std::size_t{1} << (marker & 0x0f);
     if ((marker & 0xf0) != 0x10 || size > 8 || size >= content.bytes.size())
         return fail("a bad count");
-    const std::uint64_t count = number(content.bytes.substr(1, size));
+    const std::uint64_t count = binaryNumber(content.bytes.substr(1, size));
     content.bytes.remove_prefix(1 + size);
     return count;
 }
@@ -184,36 +173,20 @@ std::optional<Value> Reader::readSimple(unsigned low) {
     return fail("an object of an unknown kind");
 }
 
-// One, two and four bytes are unsigned; eight and sixteen are signed.
 std::optional<Value> Reader::readInteger(const Content& content) {
     const std::size_t size = std::size_t{1} << content.low;
-    if (content.low > 4 || size > content.bytes.size())
-        return fail("a bad integer");
-    const std::uint64_t low =
-        number(content.bytes.substr(size < 8 ? 0 : size - 8, size < 8 ? size : 8));
-    if (size < 8)
-        return Value(low);
-    if (size == 8)
-        return Value(static_cast<std::int64_t>(low));
-    const std::uint64_t high = number(content.bytes.substr(0, 8));
-    const bool negative = static_cast<std::int64_t>(low) < 0;
-    if (high == 0)
-        return Value(low);
-    if (high == ~std::uint64_t{0} && negative)
-        return Value(static_cast<std::int64_t>(low));
-    return fail("an integer beyond 64 bits");
+    if (size > content.bytes.size())
+        return fail("a cut object");
+    const auto integer = binaryInteger(content.bytes.substr(0, size));
+    return integer ? integer : fail("an integer beyond 64 bits");
 }
 
 std::optional<Value> Reader::readReal(const Content& content) {
     const std::size_t size = std::size_t{1} << content.low;
-    if ((size != 4 && size != 8) || size > content.bytes.size())
-        return fail("a bad number");
-    const std::uint64_t bits = number(content.bytes.substr(0, size));
-    const double real = size == 8 ? std::bit_cast<double>(bits)
-                                  : std::bit_cast<float>(static_cast<std::uint32_t>(bits));
-    if (!std::isfinite(real))
-        return fail("a number that is not finite");
-    return Value(real);
+    if (size > content.bytes.size())
+        return fail("a cut object");
+    const auto real = binaryReal(content.bytes.substr(0, size));
+    return real ? std::optional<Value>(*real) : fail("a bad number");
 }
 
 std::optional<Value> Reader::readDate(const Content& content) {
@@ -243,23 +216,8 @@ std::optional<Value> Reader::readUtf16(Content content) {
     const auto units = takeBytes(content, 2);
     if (!units)
         return std::nullopt;
-    const auto unitAt = [&](std::size_t at) {
-        return static_cast<char32_t>(number(units->substr(at, 2)));
-    };
-    const auto isHigh = [](char32_t unit) { return unit >= 0xd800 && unit <= 0xdbff; };
-    const auto isLow = [](char32_t unit) { return unit >= 0xdc00 && unit <= 0xdfff; };
-    std::string text;
-    for (std::size_t at = 0; at < units->size(); at += 2) {
-        char32_t character = unitAt(at);
-        if (isHigh(character) && at + 2 < units->size() && isLow(unitAt(at + 2))) {
-            at += 2;
-            character = 0x10000 + ((character - 0xd800) << 10) + (unitAt(at) - 0xdc00);
-        } else if (isHigh(character) || isLow(character)) {
-            return fail("half of a surrogate pair");
-        }
-        appendCharacter(text, character);
-    }
-    return Value(text);
+    const auto text = utf8OfUtf16(*units);
+    return text ? std::optional<Value>(*text) : fail("half of a surrogate pair");
 }
 
 std::optional<Value> Reader::readArray(Content content, std::size_t level) {
@@ -270,7 +228,7 @@ std::optional<Value> Reader::readArray(Content content, std::size_t level) {
         return std::nullopt;
     std::vector<Value> items;
     for (std::size_t at = 0; at < references->size(); at += referenceSize_) {
-        auto item = readObject(number(references->substr(at, referenceSize_)), level + 1);
+        auto item = readObject(binaryNumber(references->substr(at, referenceSize_)), level + 1);
         if (!item)
             return std::nullopt;
         items.push_back(std::move(*item));
@@ -288,10 +246,11 @@ std::optional<Value> Reader::readDictionary(Content content, std::size_t level) 
     const std::size_t half = references->size() / 2;
     std::vector<DictionaryEntry> entries;
     for (std::size_t at = 0; at < half; at += referenceSize_) {
-        const auto key = readObject(number(references->substr(at, referenceSize_)), deepest_);
+        const auto key = readObject(binaryNumber(references->substr(at, referenceSize_)), deepest_);
         if (!key || !key->sharedString())
             return fail("a key that is not text");
-        auto value = readObject(number(references->substr(half + at, referenceSize_)), level + 1);
+        auto value =
+            readObject(binaryNumber(references->substr(half + at, referenceSize_)), level + 1);
         if (!value)
             return std::nullopt;
         entries.push_back({*key->sharedString(), std::move(*value)});
