@@ -38,11 +38,18 @@ Examples:
   zpctl --json find /Applications/Cinema.app/PlugIns/Posters.appex
   zpctl VERB --help)";
 
+std::string whatIsWrong(const CLI::App& app, const CLI::Error& error) {
+    const std::vector<std::string> unknown = app.remaining();
+    if (!unknown.empty())
+        return "unknown verb or option: " + unknown.front();
+    if (error.get_name() == "RequiredError" && app.get_subcommands().empty())
+        return "a verb is required";
+    return error.what();
+}
+
 std::string failureText(const CLI::App* app, const CLI::Error& error) {
-    const std::vector<std::string> unknown = app->remaining();
-    const std::string what =
-        unknown.empty() ? error.what() : "unknown verb or option: " + unknown.front();
-    return "zpctl: " + printable(what) + "\nzpctl --help tells how it is used.\n";
+    return "zpctl: " + printable(whatIsWrong(*app, error)) +
+           "\nzpctl --help tells how it is used.\n";
 }
 
 // A parsed command line: what to run, and with which options.
