@@ -1,0 +1,249 @@
+#include <filesystem>
+#include <fstream>
+#include <sstream>
+
+#include <gmock/gmock.h>
+
+#include "Zephrin/ZPDError.h"
+#include "platform/file/File.h"
+#include "platform/plist/PropertyList.h"
+#include "tests/model/Samples.h"
+#include "tests/platform/TestFolder.h"
+#include "zpd/ZPDAnnotationStore.h"
+
+using platform::Array;
+using platform::Dictionary;
+using platform::Value;
+using testing::ElementsAre;
+using testing::IsEmpty;
+
+namespace {
+
+constexpr const char* sampleKey = "com.example.sample";
+
+std::string storeText(Value version, Value data) {
+    return platform::plist::writeXml(
+               Dictionary{{"version", std::move(version)}, {"data", std::move(data)}})
+        .value();
+}
+
+const Dictionary someAnnotations{{sampleKey, Dictionary{{"election", 1}, {"note", "x"}}},
+                                 {"com.example.other", Dictionary{{"election", -1}}}};
+
+std::string contentOf(const std::string& path) {
+    std::ostringstream content;
+    content << std::ifstream(path, std::ios::binary).rdbuf();
+    return content.str();
+}
+
+// A store in a folder of its own, and a plug-in to annotate.
+struct StoreTest : testing::Test {
+    TestFolder folder;
+    std::string path = folder / "annotations";
+    RecordWorld world;
+    ZPDPlugIn::Ptr plugIn = world.record();
+
+    StoreTest() { world.platform.containers.folder = folder / "containers"; }
+
+    [[nodiscard]] ZPDAnnotationStore open() {
+        return ZPDAnnotationStore(path, world.platform.containers);
+    }
+
+    void write(std::string_view content) { folder.write("annotations", content); }
+
+    void writeOlder(std::string_view content) {
+        folder.write("containers/com.tovana.zpd/Zephrin-Annotations", content);
+    }
+
+    // What the file holds for the sample.
+    [[nodiscard]] Value saved() {
+        const auto root = platform::plist::parse(contentOf(path));
+        return root ? *root : Value();
+    }
+};
+
+Value savedWith(Dictionary data) {
+    return Dictionary{{"version", 16}, {"data", std::move(data)}};
+}
+
+} // namespace
+
+TEST_F(StoreTest, StartsEmptyWithoutAFile) {
+    auto store = open();
+    EXPECT_EQ(store.annotationForPlugIn(*plugIn), std::nullopt);
+    EXPECT_FALSE(std::filesystem::exists(path));
+}
+
+TEST_F(StoreTest, KeepsItsUsualPlace) {
+    EXPECT_EQ(ZPDAnnotationStore::defaultDatabasePath(), "/var/db/Zephrin-Annotations");
+}
+
+TEST_F(StoreTest, MergesAndSavesWhatIsSet) {
+    write(storeText(16, someAnnotations));
+    auto store = open();
+    store.setAnnotation(Dictionary{{"election", 0}, {"more", Array{1}}}, *plugIn);
+    const Dictionary merged{{"election", 0}, {"note", "x"}, {"more", Array{1}}};
+    EXPECT_EQ(store.annotationForPlugIn(*plugIn), merged);
+    EXPECT_EQ(saved(), savedWith({{sampleKey, merged},
+                                  {"com.example.other", Dictionary{{"election", -1}}}}));
+    EXPECT_EQ(open().annotationForPlugIn(*plugIn), merged);
+
+    store.setAnnotation(std::nullopt, *plugIn);
+    EXPECT_EQ(store.annotationForPlugIn(*plugIn), std::nullopt);
+    EXPECT_EQ(saved(), savedWith({{"com.example.other", Dictionary{{"election", -1}}}}));
+}
+
+TEST_F(StoreTest, LeavesTheFileAloneWhenNothingChanges) {
+    write(storeText(16, someAnnotations));
+    auto store = open();
+    const auto before = platform::stampOf(path);
+    const auto annotation = store.annotationForPlugIn(*plugIn);
+    store.setAnnotation(Dictionary{{"election", 1}}, *plugIn);
+    EXPECT_EQ(platform::stampOf(path), before);
+    EXPECT_TRUE(store.annotationForPlugIn(*plugIn)->sameObject(*annotation));
+}
+
+TEST_F(StoreTest, SharesTheAnnotationOfWhatIsReplaced) {
+    const auto replacing = [&](const char* identifier) {
+        auto proxy = samplePlugIn();
+        proxy->identifier = identifier;
+        proxy->granted = Dictionary{{"com.tovana.developer.replace-plugin", sampleKey}};
+        return world.record(proxy);
+    };
+    const auto one = replacing("com.example.one");
+    const auto two = replacing("com.example.two");
+    auto store = open();
+    store.setAnnotation(Dictionary{{"election", 1}}, *one);
+    EXPECT_EQ(store.annotationForPlugIn(*two), (Dictionary{{"election", 1}}));
+    EXPECT_EQ(store.annotationForPlugIn(*plugIn), (Dictionary{{"election", 1}}));
+}
+
+// ---- Damage
+
+TEST_F(StoreTest, CutAnywhereStartsEmptyAndIsMendedByTheNextChange) {
+    const std::string whole = storeText(16, someAnnotations);
+    const std::size_t end = whole.rfind("</plist>") + std::string_view("</plist>").size();
+    for (std::size_t length = 0; length < end; ++length) {
+        write(whole.substr(0, length));
+        auto store = open();
+        ASSERT_EQ(store.annotationForPlugIn(*plugIn), std::nullopt) << length;
+        ASSERT_EQ(contentOf(path), whole.substr(0, length)) << length; // left as it is
+    }
+    auto store = open();
+    store.setAnnotation(Dictionary{{"election", 1}}, *plugIn);
+    EXPECT_EQ(saved(), savedWith({{sampleKey, Dictionary{{"election", 1}}}}));
+}
+
+TEST_F(StoreTest, RefusesWhatIsNoStore) {
+    const struct {
+        std::string content;
+        platform::ErrorDomain const* domain;
+        std::int64_t code;
+    } cases[] = {
+        {"text", &platform::formatErrorDomain, platform::formatErrorCorrupt},
+        {platform::plist::writeXml(Array{1}).value(), &ZPDErrorDomain, 7},
+        {storeText(15, someAnnotations), &ZPDErrorDomain, 7},
+        {storeText(17, someAnnotations), &ZPDErrorDomain, 7},
+        {storeText("16", someAnnotations), &ZPDErrorDomain, 7},
+        {storeText(16, Array{1}), &platform::formatErrorDomain, platform::formatErrorCorrupt},
+        {platform::plist::writeXml(Dictionary{{"version", 16}}).value(),
+         &platform::formatErrorDomain, platform::formatErrorCorrupt},
+    };
+
+    for (const auto& c : cases) {
+        write(storeText(16, someAnnotations));
+        auto store = open();
+        write(c.content);
+        const auto failure = store.loadDb(path);
+        ASSERT_TRUE(failure) << c.content;
+        EXPECT_EQ(failure->domain, c.domain) << c.content;
+        EXPECT_EQ(failure->code, c.code) << c.content;
+        EXPECT_TRUE(store.annotationForPlugIn(*plugIn)) << c.content; // unchanged
+    }
+    write(storeText(15, someAnnotations));
+    EXPECT_EQ(open().loadDb(path)->description, "found database version 15 needed version 16");
+}
+
+TEST_F(StoreTest, DropsEntriesThatAreNoAnnotations) {
+    write(storeText(16, Dictionary{{"a", 1}, {"b", Array()}, {sampleKey, Dictionary()}}));
+    auto store = open();
+    EXPECT_EQ(store.annotationForIdentifier("a"), std::nullopt);
+    EXPECT_EQ(store.annotationForIdentifier("b"), std::nullopt);
+    EXPECT_EQ(store.annotationForPlugIn(*plugIn), Dictionary());
+}
+
+TEST_F(StoreTest, KeepsChangesThatCannotBeSavedAndSavesThemLater) {
+    path = folder / "missing/annotations";
+    auto store = open();
+    store.setAnnotation(Dictionary{{"election", 1}}, *plugIn);
+    EXPECT_EQ(store.annotationForPlugIn(*plugIn), (Dictionary{{"election", 1}}));
+
+    std::filesystem::create_directory(folder / "missing");
+    store.setAnnotation(Dictionary{{"election", 1}}, *plugIn); // changes nothing more
+    EXPECT_EQ(saved(), savedWith({{sampleKey, Dictionary{{"election", 1}}}}));
+}
+
+TEST_F(StoreTest, SavesTheOthersWhereOneCannotBeWritten) {
+    write(storeText(16, someAnnotations));
+    auto store = open();
+    store.setAnnotation(Dictionary{{"odd", nullptr}}, *plugIn);
+    EXPECT_EQ(saved(), savedWith({{"com.example.other", Dictionary{{"election", -1}}}}));
+    EXPECT_TRUE(store.annotationForPlugIn(*plugIn)->contains("odd"));
+}
+
+TEST_F(StoreTest, ReadsBackWhatIsAsDeepAsTheWireAllows) {
+    Value deep = 1;
+    for (int level = 0; level < 62; ++level)
+        deep = Dictionary{{"d", deep}};
+    auto store = open();
+    store.setAnnotation(Dictionary{{"extension", deep}}, *plugIn);
+    EXPECT_EQ(open().annotationForPlugIn(*plugIn), (Dictionary{{"extension", deep}}));
+}
+
+// ---- The older place
+
+TEST_F(StoreTest, TakesOverTheOlderStoreOnlyWhereNoneCouldBeLoaded) {
+    const Dictionary older{{sampleKey, Dictionary{{"election", 5}}}};
+
+    const struct {
+        const char* name;
+        std::optional<std::string> content;
+        bool takenOver;
+    } cases[] = {
+        {"no file", std::nullopt, true},
+        {"damaged", "text", true},
+        {"another version", storeText(15, someAnnotations), true},
+        {"good", storeText(16, someAnnotations), false},
+        {"good and empty", storeText(16, Dictionary()), false},
+    };
+
+    writeOlder(storeText(16, older));
+    for (const auto& c : cases) {
+        std::filesystem::remove(path);
+        world.platform.containers.asked.clear();
+        if (c.content)
+            write(*c.content);
+        auto store = open();
+        if (c.takenOver) {
+            EXPECT_EQ(saved(), savedWith(older)) << c.name;
+            EXPECT_EQ(store.annotationForPlugIn(*plugIn), (Dictionary{{"election", 5}})) << c.name;
+            EXPECT_THAT(world.platform.containers.asked, ElementsAre("com.tovana.zpd"));
+        } else {
+            EXPECT_EQ(contentOf(path), *c.content) << c.name;
+            EXPECT_THAT(world.platform.containers.asked, IsEmpty());
+        }
+    }
+}
+
+TEST_F(StoreTest, GoesOnWithoutAnOlderStore) {
+    world.platform.containers.failure = platform::posixError(EACCES, "container");
+    auto store = open();
+    store.setAnnotation(Dictionary{{"election", 1}}, *plugIn);
+    EXPECT_EQ(saved(), savedWith({{sampleKey, Dictionary{{"election", 1}}}}));
+
+    std::filesystem::remove(path);
+    world.platform.containers.failure.reset();
+    writeOlder("text");
+    EXPECT_EQ(open().annotationForPlugIn(*plugIn), std::nullopt);
+    EXPECT_FALSE(std::filesystem::exists(path));
+}

@@ -1,0 +1,283 @@
+#include <algorithm>
+
+#include <gmock/gmock.h>
+
+#include "platform/plist/PropertyList.h"
+#include "tests/model/Samples.h"
+#include "tests/platform/TestFolder.h"
+#include "zpd/ZPDElectionFilter.h"
+#include "zpd/ZPDatabase.h"
+
+using platform::Array;
+using platform::Dictionary;
+using platform::Uuid;
+using platform::Value;
+using testing::ElementsAre;
+using testing::IsEmpty;
+using testing::UnorderedElementsAre;
+
+namespace {
+
+constexpr const char* autoElectKey = "com.tovana.developer.auto-elect-plugin";
+constexpr const char* replaceKey = "com.tovana.developer.replace-plugin";
+
+struct FakeDelegate final : ZPDatabaseDelegate {
+    std::vector<ARZephrinProxy::Ptr> removed;
+    std::function<void()> meanwhile;
+
+    void removedPlugIns(const std::vector<ARZephrinProxy::Ptr>& plugIns) override {
+        removed = plugIns;
+        if (meanwhile)
+            meanwhile();
+    }
+};
+
+struct DatabaseTest : testing::Test {
+    TestFolder folder;
+    FakePlatform platform;
+    std::optional<ZPDatabase> database;
+
+    DatabaseTest() {
+        platform.containers.folder = folder / "containers";
+        reopen();
+    }
+
+    void reopen() { database.emplace(platform.services(), folder / "annotations"); }
+
+    std::shared_ptr<FakePlugIn> install(const std::string& identifier, Dictionary granted = {}) {
+        auto plugIn = samplePlugIn();
+        plugIn->identifier = identifier;
+        plugIn->path = "/Applications/Host.app/PlugIns/" + identifier + ".appex";
+        if (!granted.empty())
+            plugIn->granted = std::move(granted);
+        platform.workspace.installed.push_back(plugIn);
+        return plugIn;
+    }
+
+    [[nodiscard]] std::vector<std::string> found(const std::optional<Dictionary>& query) {
+        std::vector<std::string> identifiers;
+        const auto plugIns = database->findPlugIns(query).value();
+        for (const auto& plugIn : plugIns)
+            identifiers.push_back(plugIn->identifier());
+        return identifiers;
+    }
+
+    [[nodiscard]] std::optional<Value> election(const std::shared_ptr<FakePlugIn>& plugIn) {
+        const auto annotation = database->annotationForPlugIn(*database->findPlugIn(plugIn->uuid));
+        const Value* const stored = annotation ? annotation->find("election") : nullptr;
+        return stored ? std::optional(*stored) : std::nullopt;
+    }
+
+    // What would be there had someone elected before.
+    void elect(const std::string& key, int election) {
+        const Dictionary data{{key, Dictionary{{"election", election}, {"note", "kept"}}}};
+        folder.write(
+            "annotations",
+            platform::plist::writeXml(Dictionary{{"version", 16}, {"data", data}}).value());
+        reopen();
+    }
+};
+
+} // namespace
+
+// ---- Cache
+
+TEST_F(DatabaseTest, KeepsRecords) {
+    const auto plugIn = install("a");
+    const auto record = database->findPlugIn(plugIn->uuid);
+    ASSERT_TRUE(record);
+    EXPECT_EQ(database->findPlugIn(plugIn->uuid), record);
+    EXPECT_EQ(database->findPlugInAtPath(*plugIn->path), record);
+    EXPECT_EQ(database->plugInForProxy(plugIn), record);
+    EXPECT_EQ(database->findPlugIns(std::nullopt)->front(), record);
+}
+
+TEST_F(DatabaseTest, EmptiesTheCacheWhenItHoldsMoreThanTheLimit) {
+    database->setCacheLimit(2);
+    std::vector<ZPDPlugIn::Ptr> records;
+    const auto make = [&](const std::string& identifier) {
+        records.push_back(database->findPlugIn(install(identifier)->uuid));
+    };
+    for (const char* const identifier : {"a", "b", "c"})
+        make(identifier);
+    EXPECT_EQ(platform.workspace.schemaCachesCleared, 0); // three, one more than the limit
+    EXPECT_EQ(database->findPlugIn(records[0]->uuid()), records[0]);
+
+    make("d");
+    EXPECT_EQ(platform.workspace.schemaCachesCleared, 1);
+    EXPECT_EQ(database->findPlugIn(records[3]->uuid()), records[3]);
+    EXPECT_NE(database->findPlugIn(records[0]->uuid()), records[0]);
+}
+
+TEST_F(DatabaseTest, RebuildsRecordsInAnotherLanguage) {
+    auto plugIn = install("a");
+    plugIn->name = "One";
+    EXPECT_EQ(database->findPlugIn(plugIn->uuid)->localizedName(), "One");
+    plugIn->name = "Eins";
+    platform.locale.changed();
+    EXPECT_EQ(database->findPlugIn(plugIn->uuid)->localizedName(), "Eins");
+    EXPECT_EQ(platform.workspace.schemaCachesCleared, 1);
+}
+
+TEST_F(DatabaseTest, StopsObservingWhenItGoes) {
+    EXPECT_TRUE(platform.workspace.observer && platform.locale.changed);
+    database.reset();
+    EXPECT_FALSE(platform.workspace.observer || platform.locale.changed);
+}
+
+// ---- Look-ups
+
+TEST_F(DatabaseTest, FindsNothingForWhatIsUnknown) {
+    EXPECT_FALSE(database->findPlugIn(Uuid::random()));
+    EXPECT_FALSE(database->findPlugInAtPath("/nowhere"));
+    EXPECT_FALSE(database->plugInsWithinApplication("/Applications/Host.app"));
+    EXPECT_THAT(found(std::nullopt), IsEmpty());
+    platform.workspace.failQueries = true;
+    EXPECT_EQ(database->findPlugIns(std::nullopt), std::nullopt);
+    EXPECT_EQ(database->findPlugIns(Dictionary{{"a", "b"}}), std::nullopt);
+}
+
+TEST_F(DatabaseTest, SkipsWhatIsNotReady) {
+    install("a");
+    install("no path")->path.reset();
+    install("unfinished")->application->placeholder = true;
+    install("mis-configured")->container.reset();
+    auto alone = install("alone");
+    alone->application.reset();
+    alone->path = "/System/Library/alone.appex";
+    EXPECT_THAT(found(std::nullopt), ElementsAre("a", "alone"));
+    EXPECT_THAT(found(Dictionary()), ElementsAre("a", "alone"));
+    EXPECT_THAT(found(Dictionary{{"HXExtensionPointIdentifier", "x"}}), ElementsAre("a", "alone"));
+}
+
+TEST_F(DatabaseTest, FindsThePlugInsOfAnApplicationInOrder) {
+    auto application = sampleApplication();
+    application->plugIns = {install("b"), install("a")};
+    auto broken = install("c");
+    broken->container.reset();
+    application->plugIns.push_back(broken);
+    platform.workspace.applications[application->path] = application;
+    const auto within = database->plugInsWithinApplication(application->path);
+    ASSERT_EQ(within->size(), 2U);
+    EXPECT_EQ((*within)[0]->identifier(), "b");
+    EXPECT_EQ((*within)[1]->identifier(), "a");
+
+    application->plugIns.clear();
+    EXPECT_EQ(database->plugInsWithinApplication(application->path), std::nullopt);
+}
+
+// ---- Elections in a query
+
+TEST_F(DatabaseTest, NarrowsByElection) {
+    install("none");
+    install("elected");
+    install("replacing", {{replaceKey, "elected"}});
+    install("automatic", {{autoElectKey, true}});
+    install("not automatic", {{autoElectKey, "yes"}});
+    elect("elected", -1); // 255 in its low 8 bits
+    const auto elected = [&](Value pattern) {
+        return found(Dictionary{{"HXUserElection", std::move(pattern)}});
+    };
+    // Before any record is made, an entitlement alone decides for the automatic one.
+    EXPECT_THAT(elected("1"), ElementsAre("automatic"));
+    EXPECT_THAT(elected("=1"), ElementsAre("automatic"));
+    EXPECT_THAT(elected("255"), ElementsAre("elected", "replacing"));
+    EXPECT_THAT(elected(Array{"1", "=255"}), ElementsAre("elected", "replacing", "automatic"));
+    EXPECT_THAT(elected(Array()), IsEmpty());
+    EXPECT_EQ(elected("0").size(), 2U); // and makes records: "not automatic" is elected from now on
+    EXPECT_THAT(elected("1"), ElementsAre("automatic", "not automatic"));
+}
+
+TEST(ElectionFilter, IsDroppedWholeForWhatItDoesNotUnderstand) {
+    const Value dropped[] = {
+        "", "<>1", "?x", Array{"1", ""}, Array{"1", "-1"}, Array{"1", 1}, true, 1, Dictionary()};
+    for (const auto& pattern : dropped)
+        EXPECT_FALSE(ZPDElectionFilter::of({{"HXUserElection", pattern}})) << describe(pattern);
+    EXPECT_FALSE(ZPDElectionFilter::of({{"other", "1"}}));
+    EXPECT_TRUE(ZPDElectionFilter::of({{"HXUserElection", "=-1"}}));
+}
+
+TEST(ElectionFilter, LooksAtTheLowBits) {
+    const auto filter = ZPDElectionFilter::of({{"HXUserElection", Array{"1", "255"}}});
+    ASSERT_TRUE(filter);
+    for (const std::int64_t election : {1, 257, -1, 255, 65537})
+        EXPECT_TRUE(filter->accepts(election)) << election;
+    for (const std::int64_t election : {0, 2, 256, -2})
+        EXPECT_FALSE(filter->accepts(election)) << election;
+}
+
+// ---- Annotations
+
+TEST_F(DatabaseTest, ElectsEntitledPlugInsThatHaveNoElection) {
+    const struct {
+        const char* name;
+        std::optional<int> stored;
+        Value entitlement;
+        std::optional<Value> expected;
+    } cases[] = {
+        {"none", std::nullopt, true, 1},
+        {"no choice", 0, true, 1},
+        {"refused", -1, true, -1},
+        {"chosen", 3, true, 3},
+        {"any entitlement counts", std::nullopt, false, 1},
+    };
+
+    for (const auto& c : cases) {
+        if (c.stored)
+            elect(c.name, *c.stored);
+        const auto plugIn = install(c.name, {{autoElectKey, c.entitlement}});
+        EXPECT_EQ(election(plugIn), c.expected) << c.name;
+    }
+    EXPECT_EQ(election(install("plain")), std::nullopt);
+    EXPECT_THAT(platform.notifications.posted, IsEmpty());
+}
+
+TEST_F(DatabaseTest, KeepsOtherAnnotationsWhenItElects) {
+    elect("a", 0);
+    const auto plugIn = install("a", {{autoElectKey, true}});
+    const auto record = database->findPlugIn(plugIn->uuid);
+    EXPECT_EQ(database->annotationForPlugIn(*record),
+              (Dictionary{{"election", 1}, {"note", "kept"}}));
+    reopen();
+    EXPECT_EQ(database->annotationForPlugIn(*record),
+              (Dictionary{{"election", 1}, {"note", "kept"}}));
+}
+
+TEST_F(DatabaseTest, TellsOfChangesOnlyWhenAsked) {
+    const auto record = database->findPlugIn(install("a")->uuid);
+    EXPECT_EQ(database->setAnnotation(Dictionary{{"election", 1}}, *record), std::nullopt);
+    EXPECT_THAT(platform.notifications.posted, IsEmpty());
+    database->notifyAnnotationChange();
+    EXPECT_THAT(platform.notifications.posted, ElementsAre("com.tovana.zephrin.annotation-change"));
+}
+
+// ---- Registration
+
+TEST_F(DatabaseTest, PassesRegistrationOn) {
+    EXPECT_EQ(database->addPlugIn("/a"), std::nullopt);
+    EXPECT_EQ(database->removePlugIn("/b"), std::nullopt);
+    EXPECT_THAT(platform.workspace.registered, ElementsAre("/a"));
+    EXPECT_THAT(platform.workspace.unregistered, ElementsAre("/b"));
+
+    platform.workspace.registrationFailure = platform::posixError(EIO, "store");
+    const auto notAdded = database->addPlugIn("/a");
+    const auto notRemoved = database->removePlugIn("/b");
+    EXPECT_EQ(notAdded->code, 2);
+    EXPECT_EQ(notAdded->description, "AppRegistry failed to register the plug-in");
+    EXPECT_EQ(notRemoved->code, 2);
+    EXPECT_EQ(notRemoved->description, "AppRegistry failed to deregister the plug-in");
+}
+
+TEST_F(DatabaseTest, ForgetsRemovedPlugInsBeforeItTellsOfThem) {
+    FakeDelegate delegate;
+    database->setDelegate(&delegate);
+    const auto plugIn = install("a");
+    const auto unseen = install("b");
+    const auto record = database->findPlugIn(plugIn->uuid);
+    delegate.meanwhile = [&] { EXPECT_NE(database->findPlugIn(plugIn->uuid), record); };
+
+    platform.workspace.observer->pluginsDidInstall({plugIn});
+    EXPECT_EQ(database->findPlugIn(plugIn->uuid), record);
+    platform.workspace.observer->pluginsWillUninstall({plugIn, unseen});
+    EXPECT_THAT(delegate.removed, ElementsAre(plugIn, unseen));
+}
