@@ -16,10 +16,10 @@ Array alternatives(std::size_t count) {
 }
 
 Dictionary keys(std::size_t count) {
-    Dictionary rules;
+    std::vector<platform::DictionaryEntry> rules;
     for (std::size_t i = 0; i < count; ++i)
-        rules.set("key" + std::to_string(i), "x");
-    return rules;
+        rules.push_back({platform::SharedBytes("key" + std::to_string(i)), "x"});
+    return Dictionary(std::move(rules));
 }
 
 TEST(RulePatterns, CountsEachOneAndEachAlternative) {

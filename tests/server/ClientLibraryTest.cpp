@@ -1,0 +1,226 @@
+// What ZPDaemonClient puts on the wire, and what it makes of replies.
+
+#include <chrono>
+#include <functional>
+#include <future>
+#include <memory>
+#include <optional>
+#include <stdexcept>
+#include <string>
+#include <utility>
+#include <variant>
+
+#include <gtest/gtest.h>
+
+#include "Zephrin/ZPDError.h"
+#include "Zephrin/ZPDaemonClient.h"
+#include "platform/ipc/Cbor.h"
+#include "platform/ipc/Connection.h"
+#include "platform/ipc/Listener.h"
+#include "platform/ipc/Loop.h"
+#include "platform/paths/Places.h"
+#include "tests/server/TemporaryHome.h"
+
+namespace {
+
+using platform::Array;
+using platform::Dictionary;
+using platform::Uuid;
+using platform::Value;
+using platform::ipc::Connection;
+using platform::ipc::ConnectionError;
+using Reply = ZPDaemonClient::Reply;
+
+// A daemon that answers each request with {"echo": the request}.
+class EchoService {
+public:
+    explicit EchoService(const std::string& name) : loop_("echo") {
+        auto listener = platform::ipc::Listener::create(
+            loop_, platform::Places::forThisProcess().socketPath(name),
+            [](platform::ipc::ListenerEvent event) {
+                if (auto* const peer = std::get_if<std::shared_ptr<Connection>>(&event))
+                    serve(*peer);
+            });
+        if (!listener)
+            throw std::runtime_error(platform::describe(listener.error()));
+        listener_ = std::move(*listener);
+        loop_.start();
+        listener_->resume();
+    }
+
+    ~EchoService() {
+        listener_.reset();
+        loop_.stop();
+    }
+
+private:
+    static void serve(const std::shared_ptr<Connection>& peer) {
+        peer->setEventHandler([weak = std::weak_ptr(peer)](platform::ipc::Event event) {
+            auto* const request = std::get_if<platform::ipc::Message>(&event);
+            const auto there = weak.lock();
+            if (!request || !there)
+                return;
+            auto reply = platform::ipc::createReply(*request);
+            reply.body.set("echo", request->body);
+            there->send(reply);
+            request->ticket.taken();
+        });
+        peer->resume();
+    }
+
+    platform::ipc::Loop loop_;
+    std::unique_ptr<platform::ipc::Listener> listener_;
+};
+
+class ClientLibrary : public testing::Test {
+protected:
+    // The reply to what `call` sends.
+    template <class Call>
+    Reply replyTo(Call&& call) {
+        std::promise<Reply> arrived;
+        call(client_, [&](const Reply& reply) { arrived.set_value(reply); });
+        return arrived.get_future().get();
+    }
+
+    // What `call` sends, as it arrives.
+    template <class Call>
+    Dictionary sentBy(Call&& call) {
+        const Reply reply = replyTo(std::forward<Call>(call));
+        const Value* const echo = reply ? reply->find("echo") : nullptr;
+        return echo && echo->dictionary() ? *echo->dictionary() : Dictionary();
+    }
+
+    TemporaryHome home_;
+    EchoService service_{"com.tovana.test.echo"};
+    ZPDaemonClient client_{"com.tovana.test.echo"};
+    const Uuid one_ = *Uuid::parse("00112233-4455-6677-8899-AABBCCDDEEFF");
+    const Uuid two_ = *Uuid::parse("FFEEDDCC-BBAA-9988-7766-554433221100");
+};
+
+Dictionary envelope(const char* type, Dictionary keys = {}) {
+    keys.set("request", type);
+    keys.set("version", 3);
+    return keys;
+}
+
+TEST_F(ClientLibrary, SendsTheKeysOfEachRequest) {
+    const Dictionary rules{{"HXExtensionPointIdentifier", "com.tovana.x"}};
+    const Dictionary both{{"uuids", Array{two_, one_}}, {"paths", Array{"/a", "/b"}}};
+    const Dictionary environment{{"K", "V"}};
+    const ZPDaemonClient::PlugInsByPath plugIns{{"/b", one_}, {"/a", two_}};
+    const auto with = [](Dictionary keys, const char* key, const Value& value) {
+        keys.set(key, value);
+        return keys;
+    };
+    using Block = ZPDaemonClient::ReplyBlock;
+    const struct {
+        std::function<void(ZPDaemonClient&, Block)> call;
+        Dictionary sent;
+    } cases[] = {
+        {[](auto& c, Block b) { c.addPlugIns({"/a", "/b"}, std::move(b)); },
+         envelope("add", {{"paths", Array{"/a", "/b"}}})},
+        {[](auto& c, Block b) { c.removePlugIns({}, std::move(b)); },
+         envelope("remove", {{"paths", Array()}})},
+        {[](auto& c, Block b) { c.bulkPlugins(5, std::move(b)); },
+         envelope("bulk", {{"flags", 5}})},
+        {[&](auto& c, Block b) { c.readyPlugIns(plugIns, 1, environment, std::move(b)); },
+         envelope("ready", with(with(both, "flags", 1), "environment", environment))},
+        {[&](auto& c, Block b) { c.readyPlugIns({}, 0, std::nullopt, std::move(b)); },
+         envelope("ready", {{"uuids", Array()}, {"paths", Array()}, {"flags", 0}})},
+        {[&](auto& c, Block b) { c.accessPlugIns(plugIns, 2, std::move(b)); },
+         envelope("access", with(both, "flags", 2))},
+        {[&](auto& c, Block b) { c.findPlugInByUUID(one_, std::move(b)); },
+         envelope("find", {{"uuids", one_}})},
+        {[](auto& c, Block b) {
+             c.findPlugInByPathURL({platform::SharedBytes("file:///x/y.appex")}, std::move(b));
+         },
+         envelope("find", {{"paths", "file:///x/y.appex"}})},
+        {[&](auto& c, Block b) { c.matchPlugIns(rules, 0x201, std::move(b)); },
+         envelope("match", {{"rules", rules}, {"flags", 0x201}})},
+        {[&](auto& c, Block b) { c.setPluginAnnotations({one_, two_}, rules, std::move(b)); },
+         envelope("annotate", {{"uuids", Array{one_, two_}}, {"annotations", rules}})},
+        {[&](auto& c, Block b) { c.bulkSetPluginAnnotations(rules, std::move(b)); },
+         envelope("bulk-annotate", {{"annotations", rules}})},
+        {[](auto& c, Block b) { c.holdPlugins({"/a"}, 3, std::move(b)); },
+         envelope("lock", {{"paths", Array{"/a"}}, {"flags", 3}})},
+        {[&](auto& c, Block b) { c.releaseHold(one_, std::move(b)); },
+         envelope("lock", {{"uuids", Array{one_}}})},
+    };
+    for (const auto& test : cases)
+        EXPECT_EQ(describe(sentBy(test.call)), describe(test.sent));
+}
+
+TEST_F(ClientLibrary, RepliesComeInOrderOnItsQueue) {
+    std::promise<std::string> all;
+    std::string seen;
+    constexpr int count = 50;
+    for (int i = 0; i < count; ++i) {
+        client_.bulkPlugins(static_cast<std::uint64_t>(i), [&, i](const Reply& reply) {
+            EXPECT_EQ(reply->find("echo")->dictionary()->find("flags")->integerValue(), i);
+            seen += 'x';
+            if (seen.size() == count)
+                all.set_value(seen);
+        });
+    }
+    EXPECT_EQ(all.get_future().get().size(), std::size_t{count});
+}
+
+TEST_F(ClientLibrary, AnAbsentDaemonIsAnErrorInTheReply) {
+    ZPDaemonClient nobody("com.tovana.test.nobody");
+    std::promise<Reply> arrived;
+    nobody.bulkPlugins(0, [&](const Reply& reply) { arrived.set_value(reply); });
+    const auto error = ZPDaemonClient::errorInReply(arrived.get_future().get());
+    ASSERT_TRUE(error);
+    EXPECT_EQ(error->domain, &ZPDErrorDomain);
+    EXPECT_EQ(error->code, 4);
+    EXPECT_EQ(error->description, platform::ipc::describe(ConnectionError::invalid));
+}
+
+TEST(ErrorInReply, IsReadFromCodeAndText) {
+    const struct {
+        Dictionary reply;
+        std::int64_t code;
+        const char* text;
+    } cases[] = {
+        {{}, 0, ""},
+        {{{"errorcode", 0}}, 0, ""},
+        {{{"matches", Array()}}, 0, ""},
+        {{{"errorcode", 15}, {"error", "Cannot locate PlugIn"}}, 15, "Cannot locate PlugIn"},
+        {{{"errorcode", 7}}, 7, "unknown error returned by Zephrin subsystem"},
+        {{{"errorcode", 7}, {"error", 1}}, 7, "unknown error returned by Zephrin subsystem"},
+        {{{"errorcode", "7"}}, 0, ""},
+    };
+    for (const auto& test : cases) {
+        const auto error = ZPDaemonClient::errorInReply(test.reply);
+        EXPECT_EQ(error ? error->code : 0, test.code) << describe(test.reply);
+        EXPECT_EQ(error ? error->description : "", test.text) << describe(test.reply);
+    }
+}
+
+TEST(ErrorInReply, ThrowsForAMessageWithoutACode) {
+    const Reply broken = Dictionary{{"errorcode", 0}, {"error", "what"}};
+    try {
+        (void)ZPDaemonClient::errorInReply(broken);
+        FAIL();
+    } catch (const std::logic_error& error) {
+        EXPECT_STREQ(error.what(), "zpd reported error without a code: what");
+    }
+}
+
+TEST(RecordConversion, IsForTheCurrentVersionOnly) {
+    ZPDaemonClient client("com.tovana.test.nobody");
+    const Array forms{Dictionary{{"uuid", "x"}, {"when", platform::Date{1.5}}}};
+    EXPECT_FALSE(ZPDaemonClient::convertToIPC(forms, 2));
+    EXPECT_FALSE(ZPDaemonClient::convertToIPC(forms, 4));
+    const auto record = ZPDaemonClient::convertToIPC(forms, 3);
+    ASSERT_TRUE(record);
+    const auto asReceived = platform::ipc::decode(
+        platform::ipc::encode(*record), platform::ipc::DecodeLimits{.allowEncoded = true});
+    ASSERT_TRUE(asReceived);
+    EXPECT_EQ(client.convertFromIPC(*asReceived), Value(forms));
+    EXPECT_FALSE(client.convertFromIPC(Value(forms))) << "not a record";
+    client.setProtocolVersion(2);
+    EXPECT_FALSE(client.convertFromIPC(*asReceived));
+}
+
+} // namespace
