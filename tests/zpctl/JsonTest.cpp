@@ -10,7 +10,6 @@ namespace {
 
 using platform::Array;
 using platform::Data;
-using platform::Date;
 using platform::Dictionary;
 using platform::SharedBytes;
 using platform::Url;
