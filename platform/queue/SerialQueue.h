@@ -14,8 +14,9 @@ namespace platform {
 // only into one of a higher rank. So two queues of one rank are never held together and no two
 // threads can wait for each other.
 enum class QueueRank : int {
-    service = 1, // requests, and other work that may enter the leaves
-    leaf = 2,    // "ZPDatabase", "serverSync": enter nothing further
+    service = 1,  // requests, and other work that may enter the ones below
+    registry = 2, // "AppRegistry": changes of the registry, whose observers enter the leaves
+    leaf = 3,     // "ZPDatabase", "serverSync": enter nothing further
 };
 
 // Runs blocks one at a time, in the order in which they were submitted. An own thread, started
