@@ -1,0 +1,144 @@
+#include "AppRegistry/ARStore.h"
+
+#include <cstring>
+
+#include "AppRegistry/ARStoreImpl.h"
+#include "AppRegistry/ARStoreRow.h"
+
+namespace {
+
+const platform::ErrorDomain databaseErrorDomain{"SQLite"}; // codes are SQLite's
+
+constexpr const char* insertEntrySql =
+    "INSERT INTO entries (id, kind, presence, placeholder, types, uuid, path, identifier, original,"
+    " bundle, version, executable, registered, stamps, points)"
+    " VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13, ?14, ?15)";
+constexpr const char* updateEntrySql =
+    "UPDATE entries SET presence = ?2, placeholder = ?3, stamps = ?4 WHERE id = ?1";
+
+std::optional<std::string_view> view(const std::optional<platform::SharedBytes>& text) {
+    return text ? std::optional(text->view()) : std::nullopt;
+}
+
+template <class E>
+std::int64_t number(E e) {
+    return static_cast<std::int64_t>(e);
+}
+
+} // namespace
+
+ARStore::Impl::Impl(ARSqlConnection writing, ARSqlConnection reading)
+    : writer(std::move(writing)),
+      begin(writer, "BEGIN IMMEDIATE"),
+      end(writer, "COMMIT"),
+      rollback(writer, "ROLLBACK"),
+      insertEntry(writer, insertEntrySql),
+      insertDetail(writer, "INSERT INTO details (id, digests, info) VALUES (?1, ?2, ?3)"),
+      updateEntry(writer, updateEntrySql),
+      removeEntry(writer, "DELETE FROM entries WHERE id = ?1"),
+      removeDetail(writer, "DELETE FROM details WHERE id = ?1"),
+      setKnowledge(writer, "UPDATE knowledge SET sequence = ?1, uuid = ?2 WHERE id = 1"),
+      selectDigests(writer, "SELECT digests FROM details WHERE id = ?1"),
+      reader(std::move(reading)),
+      selectInfo(reader, "SELECT info FROM details WHERE id = ?1") {}
+
+int ARStore::Impl::prepared() const {
+    for (const ARSqlStatement* statement :
+         {&begin, &end, &rollback, &insertEntry, &insertDetail, &updateEntry, &removeEntry,
+          &removeDetail, &setKnowledge, &selectDigests, &selectInfo}) {
+        if (statement->prepared() != SQLITE_OK)
+            return statement->prepared();
+    }
+    return SQLITE_OK;
+}
+
+int ARStore::Impl::insert(const ARNewEntry& entry) {
+    const ARBundleRow& row = entry.row;
+    const std::string points = AREncodePoints(row.points);
+    const int code = insertEntry.run(
+        row.id, number(row.kind), number(row.presence), number(row.placeholder),
+        number(row.declaresTypes), ARBytesOf(row.uuid.bytes), row.path.view(),
+        row.identifier.view(), row.originalIdentifier.view(), view(row.bundleIdentifier),
+        view(row.bundleVersion), row.executable.view(), row.registered.secondsSinceEpoch,
+        ARBytesOf(row.stamps), std::string_view(points));
+    if (code != SQLITE_OK)
+        return code;
+    return insertDetail.run(row.id, ARBytesOf(entry.digests), std::string_view(entry.info));
+}
+
+int ARStore::Impl::update(const ARBundleRow& row) {
+    return updateEntry.run(row.id, number(row.presence), number(row.placeholder),
+                           ARBytesOf(row.stamps));
+}
+
+int ARStore::Impl::remove(std::int64_t id) {
+    const int code = removeEntry.run(id);
+    return code == SQLITE_OK ? removeDetail.run(id) : code;
+}
+
+int ARStore::Impl::setTo(const ARKnowledge& known) {
+    const auto uuid = known.uuid ? std::optional(ARBytesOf(known.uuid->bytes))
+                                 : std::optional<std::string_view>();
+    return setKnowledge.run(static_cast<std::int64_t>(known.sequence), uuid);
+}
+
+int ARStore::Impl::write(const ARStoreChanges& changes) {
+    for (const std::int64_t id : changes.removed) {
+        if (const int code = remove(id); code != SQLITE_OK)
+            return code;
+    }
+    for (const ARBundleRow& row : changes.updated) {
+        if (const int code = update(row); code != SQLITE_OK)
+            return code;
+    }
+    for (const ARNewEntry& entry : changes.added) {
+        if (const int code = insert(entry); code != SQLITE_OK)
+            return code;
+    }
+    return setTo(changes.knowledge);
+}
+
+ARStore::ARStore(std::unique_ptr<Impl> impl) : impl_(std::move(impl)) {}
+
+ARStore::~ARStore() = default;
+
+std::optional<platform::Error> ARStore::commit(const ARStoreChanges& changes) {
+    int code = impl_->begin.run();
+    if (code == SQLITE_OK) {
+        code = impl_->write(changes);
+        if (code == SQLITE_OK)
+            code = impl_->end.run();
+        if (code != SQLITE_OK)
+            static_cast<void>(impl_->rollback.run());
+    }
+    if (code == SQLITE_OK)
+        return std::nullopt;
+    return platform::Error{&databaseErrorDomain, code, sqlite3_errstr(code)};
+}
+
+std::optional<ARDigests> ARStore::digests(std::int64_t id) {
+    ARSqlStatement& select = impl_->selectDigests;
+    std::optional<ARDigests> found;
+    select.bindAll(id);
+    if (select.step() == SQLITE_ROW && select.bytes(0).size() == sizeof(ARDigests))
+        std::memcpy(&found.emplace(), select.bytes(0).data(), sizeof(ARDigests));
+    select.reset();
+    return found;
+}
+
+void ARStore::checkpoint() {
+    sqlite3_wal_checkpoint_v2(impl_->writer.handle(), nullptr, SQLITE_CHECKPOINT_PASSIVE, nullptr,
+                              nullptr);
+    sqlite3_db_release_memory(impl_->writer.handle());
+}
+
+std::optional<std::string> ARStore::info(std::int64_t id) const {
+    const std::lock_guard lock(impl_->readerLock);
+    ARSqlStatement& select = impl_->selectInfo;
+    std::optional<std::string> found;
+    select.bindAll(id);
+    if (select.step() == SQLITE_ROW)
+        found = select.bytes(0);
+    select.reset();
+    return found;
+}

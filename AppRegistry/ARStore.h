@@ -1,0 +1,80 @@
+#pragma once
+
+#include <cstdint>
+#include <expected>
+#include <memory>
+#include <optional>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "AppRegistry/ARApplicationWorkspace.h"
+#include "AppRegistry/ARBundleRow.h"
+#include "platform/value/Error.h"
+
+// A new entry with all that is stored of it.
+struct ARNewEntry {
+    ARBundleRow row;
+    ARDigests digests{};
+    std::string info; // its info dictionary, encoded
+};
+
+// Changes that are stored together or not at all.
+struct ARStoreChanges {
+    std::vector<ARNewEntry> added;
+    // Entries whose files moved without a change of content, or whose presence or placeholder
+    // state changed.
+    std::vector<ARBundleRow> updated;
+    std::vector<std::int64_t> removed;
+    ARKnowledge knowledge; // after the change
+
+    [[nodiscard]] bool empty() const { return added.empty() && updated.empty() && removed.empty(); }
+};
+
+// Why a database could not be used. Damage (also a database of another version) is healed by
+// setting it aside; anything else is not the database's fault.
+struct ARStoreFailure {
+    bool damaged = false;
+    std::string reason;
+};
+
+// The registry's database: what the registry learnt about the bundles, in SQLite. Nothing in it
+// is the only copy of what the folders tell, so that it may be thrown away at any time.
+// Owned by the registry. One thread at a time, except info(), which any thread may call at any
+// time: it has a connection of its own that no writer keeps waiting.
+class ARStore {
+public:
+    struct Content {
+        std::vector<ARBundleRow> rows; // in order of registration
+        ARKnowledge knowledge;
+    };
+
+    // Opens or makes the database, checks that it is whole, and prepares everything.
+    [[nodiscard]] static std::expected<std::unique_ptr<ARStore>, ARStoreFailure>
+    open(const std::string& path);
+    ~ARStore();
+
+    [[nodiscard]] std::expected<Content, ARStoreFailure> load();
+    [[nodiscard]] std::optional<platform::Error> commit(const ARStoreChanges& changes);
+    // What the files of an entry hashed to when they were read.
+    [[nodiscard]] std::optional<ARDigests> digests(std::int64_t id);
+    // Brings what was committed from the log into the database file.
+    void checkpoint();
+
+    // The encoded info dictionary of an entry; nothing when it is gone or cannot be read.
+    [[nodiscard]] std::optional<std::string> info(std::int64_t id) const;
+
+private:
+    struct Impl;
+    explicit ARStore(std::unique_ptr<Impl> impl);
+
+    std::unique_ptr<Impl> impl_;
+};
+
+// The path under which a damaged database is kept for a look; an earlier one is replaced.
+[[nodiscard]] std::string ARDamagedStorePath(const std::string& path);
+
+// Opens the database and reads it. A damaged one is set aside with one log line, and an empty one
+// takes its place.
+[[nodiscard]] std::expected<std::pair<std::unique_ptr<ARStore>, ARStore::Content>, platform::Error>
+AROpenStore(const std::string& path);

@@ -1,0 +1,38 @@
+#pragma once
+
+#include <mutex>
+
+#include "AppRegistry/ARSql.h"
+#include "AppRegistry/ARStore.h"
+
+// The database's connections and statements, for the sources of ARStore alone. Statements are
+// declared after the connection that they belong to, so that they go first.
+struct ARStore::Impl {
+    Impl(ARSqlConnection writing, ARSqlConnection reading);
+
+    // SQLITE_OK when all statements could be prepared.
+    [[nodiscard]] int prepared() const;
+
+    // Parts of one transaction. Each gives SQLite's result code.
+    [[nodiscard]] int write(const ARStoreChanges& changes);
+    [[nodiscard]] int insert(const ARNewEntry& entry);
+    [[nodiscard]] int update(const ARBundleRow& row);
+    [[nodiscard]] int remove(std::int64_t id);
+    [[nodiscard]] int setTo(const ARKnowledge& known);
+
+    ARSqlConnection writer;
+    ARSqlStatement begin;
+    ARSqlStatement end;
+    ARSqlStatement rollback;
+    ARSqlStatement insertEntry;
+    ARSqlStatement insertDetail;
+    ARSqlStatement updateEntry;
+    ARSqlStatement removeEntry;
+    ARSqlStatement removeDetail;
+    ARSqlStatement setKnowledge;
+    ARSqlStatement selectDigests;
+
+    std::mutex readerLock; // held for one look-up at a time, never by a writer
+    ARSqlConnection reader;
+    ARSqlStatement selectInfo;
+};

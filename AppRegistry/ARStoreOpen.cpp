@@ -1,0 +1,183 @@
+#include <cerrno>
+#include <cstdio>
+#include <unistd.h>
+
+#include "AppRegistry/ARLog.h"
+#include "AppRegistry/ARStoreImpl.h"
+#include "AppRegistry/ARStoreRow.h"
+#include "platform/file/File.h"
+
+// Opening, checking, reading and setting aside the registry's database.
+
+namespace {
+
+// Raised with every change of the tables: a database of another version is rebuilt.
+constexpr std::int64_t schemaVersion = 1;
+constexpr int waitForOtherProcessMilliseconds = 5000;
+
+constexpr const char* schema =
+    "BEGIN;"
+    "CREATE TABLE entries (id INTEGER PRIMARY KEY, kind INTEGER NOT NULL, presence INTEGER NOT "
+    "NULL,"
+    " placeholder INTEGER NOT NULL, types INTEGER NOT NULL, uuid BLOB NOT NULL, path BLOB NOT NULL,"
+    " identifier BLOB NOT NULL, original BLOB NOT NULL, bundle BLOB, version BLOB,"
+    " executable BLOB NOT NULL, registered REAL NOT NULL, stamps BLOB NOT NULL,"
+    " points BLOB NOT NULL);"
+    // Apart from the entries, which a start reads all, without these.
+    "CREATE TABLE details (id INTEGER PRIMARY KEY, digests BLOB NOT NULL, info BLOB NOT NULL);"
+    "CREATE TABLE knowledge (id INTEGER PRIMARY KEY, sequence INTEGER NOT NULL, uuid BLOB);"
+    "INSERT INTO knowledge VALUES (1, 0, NULL);"
+    "PRAGMA user_version = 1;"
+    "COMMIT;";
+
+// In the log, commits need no sync to be whole after a crash; checkpoints are made by the registry.
+constexpr const char* writerSettings =
+    "PRAGMA page_size = 8192; PRAGMA journal_mode = WAL; PRAGMA synchronous = NORMAL;"
+    "PRAGMA wal_autocheckpoint = 0; PRAGMA journal_size_limit = 1048576;";
+constexpr const char* readerSettings = "PRAGMA cache_size = -64; PRAGMA query_only = 1;";
+
+constexpr int openFlags = SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_PRIVATECACHE;
+
+ARStoreFailure failure(int code) {
+    const int kind = code & 0xff; // without the extension
+    const bool damaged = kind == SQLITE_CORRUPT || kind == SQLITE_NOTADB || kind == SQLITE_ERROR ||
+                         kind == SQLITE_SCHEMA || kind == SQLITE_FORMAT || kind == SQLITE_MISMATCH;
+    return {damaged, sqlite3_errstr(code)};
+}
+
+std::expected<std::int64_t, int> firstNumber(ARSqlConnection& connection, const char* sql) {
+    ARSqlStatement statement(connection, sql);
+    if (statement.prepared() != SQLITE_OK)
+        return std::unexpected(statement.prepared());
+    const int code = statement.step();
+    if (code != SQLITE_ROW)
+        return std::unexpected(code == SQLITE_DONE ? SQLITE_CORRUPT : code);
+    return statement.integer(0);
+}
+
+// Makes the tables of a new database, and refuses one of another version or with damage.
+std::optional<ARStoreFailure> makeUsable(ARSqlConnection& connection) {
+    const auto version = firstNumber(connection, "PRAGMA user_version");
+    const auto tables = firstNumber(connection, "SELECT count(*) FROM sqlite_schema");
+    if (!version || !tables)
+        return failure(version ? tables.error() : version.error());
+    if (*tables == 0 && *version == 0) {
+        const int code = connection.execute(schema);
+        return code == SQLITE_OK ? std::nullopt : std::optional(failure(code));
+    }
+    if (*version != schemaVersion)
+        return ARStoreFailure{true, "its version is " + std::to_string(*version)};
+    ARSqlStatement check(connection, "PRAGMA quick_check(1)");
+    const int code = check.step();
+    if (code != SQLITE_ROW)
+        return failure(code);
+    if (check.bytes(0) != "ok")
+        return ARStoreFailure{true, std::string(check.bytes(0))};
+    return std::nullopt;
+}
+
+std::expected<ARSqlConnection, int> connect(const std::string& path, int flags,
+                                            const char* settings) {
+    auto connection = ARSqlConnection::open(path, flags);
+    if (!connection)
+        return connection;
+    sqlite3_busy_timeout(connection->handle(), waitForOtherProcessMilliseconds);
+    if (const int code = connection->execute(settings); code != SQLITE_OK)
+        return std::unexpected(code);
+    return connection;
+}
+
+std::string folderOf(const std::string& path) {
+    const auto slash = path.rfind('/');
+    return slash == std::string::npos ? "." : path.substr(0, slash + 1);
+}
+
+std::optional<std::string> setAside(const std::string& path) {
+    const std::string kept = ARDamagedStorePath(path);
+    ::unlink((kept + "-wal").c_str());
+    if (std::rename(path.c_str(), kept.c_str()) != 0)
+        return "cannot rename it: " + describe(platform::posixError(errno, kept));
+    std::rename((path + "-wal").c_str(), (kept + "-wal").c_str());
+    ::unlink((path + "-shm").c_str());
+    return std::nullopt;
+}
+
+using OpenedStore = std::pair<std::unique_ptr<ARStore>, ARStore::Content>;
+
+std::expected<OpenedStore, ARStoreFailure> openAndLoad(const std::string& path) {
+    auto store = ARStore::open(path);
+    if (!store)
+        return std::unexpected(store.error());
+    auto content = (*store)->load();
+    if (!content)
+        return std::unexpected(content.error());
+    return OpenedStore(std::move(*store), std::move(*content));
+}
+
+} // namespace
+
+std::expected<std::unique_ptr<ARStore>, ARStoreFailure> ARStore::open(const std::string& path) {
+    auto writer = connect(path, openFlags | SQLITE_OPEN_CREATE, writerSettings);
+    if (!writer)
+        return std::unexpected(failure(writer.error()));
+    if (auto trouble = makeUsable(*writer))
+        return std::unexpected(std::move(*trouble));
+    auto reader = connect(path, openFlags, readerSettings);
+    if (!reader)
+        return std::unexpected(failure(reader.error()));
+    auto impl = std::make_unique<Impl>(std::move(*writer), std::move(*reader));
+    if (const int code = impl->prepared(); code != SQLITE_OK)
+        return std::unexpected(failure(code));
+    return std::unique_ptr<ARStore>(new ARStore(std::move(impl)));
+}
+
+std::expected<ARStore::Content, ARStoreFailure> ARStore::load() {
+    Content content;
+    ARSqlStatement rows(impl_->writer, ARSelectRows);
+    int code = rows.prepared();
+    while (code == SQLITE_OK && (code = rows.step()) == SQLITE_ROW) {
+        auto row = ARReadRow(rows);
+        if (!row)
+            return std::unexpected(ARStoreFailure{true, "an entry makes no sense"});
+        content.rows.push_back(std::move(*row));
+        code = SQLITE_OK;
+    }
+    if (code != SQLITE_DONE)
+        return std::unexpected(failure(code));
+    ARSqlStatement known(impl_->writer, "SELECT sequence, uuid FROM knowledge WHERE id = 1");
+    if (known.step() != SQLITE_ROW)
+        return std::unexpected(ARStoreFailure{true, "its state is missing"});
+    content.knowledge.sequence = static_cast<std::uint64_t>(known.integer(0));
+    if (!known.isNull(1))
+        content.knowledge.uuid =
+            platform::Uuid::fromBytes(std::as_bytes(std::span(known.bytes(1))));
+    return content;
+}
+
+std::string ARDamagedStorePath(const std::string& path) {
+    return path + ".damaged";
+}
+
+std::expected<OpenedStore, platform::Error> AROpenStore(const std::string& path) {
+    if (auto error = platform::makeFolders(folderOf(path), 0755))
+        return std::unexpected(std::move(*error));
+    auto opened = openAndLoad(path);
+    if (!opened && opened.error().damaged) {
+        const std::string reason = opened.error().reason;
+        if (const auto trouble = setAside(path)) {
+            return std::unexpected(platform::Error{&platform::fileErrorDomain,
+                                                   platform::fileErrorWriteUnknown,
+                                                   path + " is damaged; " + *trouble});
+        }
+        ARLog().error("the registry database %{public}@ is damaged (%{public}@): kept as "
+                      "%{public}@ and rebuilt",
+                      path, reason, ARDamagedStorePath(path));
+        opened = openAndLoad(path);
+    }
+    if (!opened) {
+        return std::unexpected(platform::Error{&platform::fileErrorDomain,
+                                               platform::fileErrorReadUnknown,
+                                               path + ": " + opened.error().reason});
+    }
+    return std::move(*opened);
+}
