@@ -1,0 +1,102 @@
+#include "AppRegistry/ARIdentity.h"
+
+#include <algorithm>
+
+#include "AppRegistry/ARBundleFiles.h"
+#include "AppRegistry/ARFolder.h"
+#include "AppRegistry/ARInfoKeys.h"
+#include "AppRegistry/ARPointKeys.h"
+
+using platform::Dictionary;
+using platform::SharedBytes;
+using platform::Value;
+
+namespace {
+
+constexpr std::string_view extensionPointSuffix = ".plist";
+
+std::optional<SharedBytes> textEntry(const Dictionary& info, const char* key) {
+    const Value* value = info.find(key);
+    const SharedBytes* text = value ? value->sharedString() : nullptr;
+    return text ? std::optional(*text) : std::nullopt;
+}
+
+const Dictionary* declarationOf(const Dictionary& info) {
+    const Value* extension = info.find(ARInfoKey::extension);
+    return extension ? extension->dictionary() : nullptr;
+}
+
+std::optional<SharedBytes> plugInIdentifier(const Dictionary& info) {
+    if (const Dictionary* declaration = declarationOf(info)) {
+        if (auto own = textEntry(*declaration, ARInfoKey::extensionIdentifier))
+            return own;
+    }
+    if (auto own = textEntry(info, ARInfoKey::extensionIdentifier))
+        return own;
+    return textEntry(info, ARInfoKey::bundleIdentifier);
+}
+
+// The second byte of U+0080 to U+009F, whose first is c2.
+bool isHighControl(std::string_view text, std::size_t at) {
+    const auto byte = static_cast<unsigned char>(text[at]);
+    return byte >= 0x80 && byte <= 0x9f && at > 0 &&
+           static_cast<unsigned char>(text[at - 1]) == 0xc2;
+}
+
+std::optional<SharedBytes> identifierOf(ARKind kind, std::string_view path,
+                                        const Dictionary& info) {
+    switch (kind) {
+    case ARKind::plugIn:
+        return plugInIdentifier(info);
+    case ARKind::application:
+        return textEntry(info, ARInfoKey::bundleIdentifier);
+    case ARKind::extensionPoint:
+        break;
+    }
+    std::string_view name = ARNameOf(path);
+    name.remove_suffix(std::min(name.size(), extensionPointSuffix.size()));
+    return SharedBytes(name);
+}
+
+} // namespace
+
+bool ARIsIdentifier(std::string_view text) {
+    if (text.empty() || text.size() > ARLongestIdentifier || text == "." || text == "..")
+        return false;
+    for (std::size_t at = 0; at < text.size(); ++at) {
+        const auto byte = static_cast<unsigned char>(text[at]);
+        if (byte < 0x20 || byte == 0x7f || byte == '/' || isHighControl(text, at))
+            return false;
+    }
+    return true;
+}
+
+Dictionary ARReportedInfo(ARKind kind, Dictionary info) {
+    if (kind != ARKind::plugIn || info.contains(ARInfoKey::extensionPoint))
+        return info;
+    const Dictionary* declaration = declarationOf(info);
+    const Value* point = declaration ? declaration->find(ARInfoKey::extensionPoint) : nullptr;
+    if (point)
+        info.set(ARInfoKey::extensionPoint, Value(*point));
+    return info;
+}
+
+std::optional<std::string> ARIdentify(ARBundleRow& row, std::string_view path,
+                                      const Dictionary& info) {
+    const auto identifier = identifierOf(row.kind, path, info);
+    if (!identifier && row.kind != ARKind::application)
+        return "it has no identifier";
+    if (identifier && !ARIsIdentifier(identifier->view()))
+        return "its identifier is not one";
+    row.identifier = identifier.value_or(SharedBytes());
+    row.originalIdentifier = row.identifier;
+    row.bundleIdentifier = textEntry(info, ARInfoKey::bundleIdentifier);
+    row.bundleVersion = textEntry(info, ARInfoKey::bundleVersion);
+    row.declaresTypes = info.contains(ARInfoKey::typeDeclarations);
+    const auto executable = textEntry(info, ARInfoKey::executable);
+    if (executable && ARIsExecutableName(executable->view()))
+        row.executable = *executable;
+    if (row.kind == ARKind::plugIn)
+        row.points = ARPointKeysOf(info);
+    return std::nullopt;
+}
