@@ -1,0 +1,51 @@
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <string_view>
+#include <unordered_map>
+#include <vector>
+
+#include "AppRegistry/ARBundleRow.h"
+
+using ARRowPtr = std::shared_ptr<const ARBundleRow>;
+
+// Everything that the registry keeps, by path: what a pass compares the folders with. Holds
+// withdrawn entries too, which readers never see. Owned by the registry, used on its queue.
+class ARModel {
+public:
+    struct Entry {
+        ARRowPtr row;
+        std::uint64_t seen = 0; // the number of the pass that met it last
+    };
+
+    void fill(std::vector<ARBundleRow> rows);
+
+    [[nodiscard]] Entry* find(std::string_view path);
+    // Adds a row, or puts it in the place of the one with the same path.
+    Entry& put(ARRowPtr row);
+    void remove(std::string_view path);
+
+    [[nodiscard]] std::int64_t takeId() { return ++lastId_; }
+
+    [[nodiscard]] std::uint64_t beginPass() { return ++pass_; }
+
+    // All rows that `wanted` (called with each entry) picks, in order of registration.
+    template <class Wanted>
+    [[nodiscard]] std::vector<ARRowPtr> pick(Wanted&& wanted) const {
+        std::vector<ARRowPtr> picked;
+        for (const auto& [path, entry] : entries_) {
+            if (wanted(entry))
+                picked.push_back(entry.row);
+        }
+        sortById(picked);
+        return picked;
+    }
+
+private:
+    static void sortById(std::vector<ARRowPtr>& rows);
+
+    std::unordered_map<std::string_view, Entry> entries_; // keys lie in the rows
+    std::int64_t lastId_ = 0;
+    std::uint64_t pass_ = 0;
+};
