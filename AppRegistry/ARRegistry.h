@@ -1,0 +1,80 @@
+#pragma once
+
+#include <atomic>
+#include <expected>
+#include <memory>
+#include <string>
+
+#include "AppRegistry/ARApplicationWorkspace.h"
+#include "AppRegistry/ARComplaints.h"
+#include "AppRegistry/ARModel.h"
+#include "AppRegistry/ARProxyContext.h"
+#include "AppRegistry/ARSnapshotEditor.h"
+#include "AppRegistry/ARStore.h"
+#include "platform/paths/Places.h"
+#include "platform/queue/SerialQueue.h"
+#include "platform/value/Error.h"
+
+namespace platform {
+class Types;
+} // namespace platform
+
+// Registrations that fail; the code is always 1.
+extern const platform::ErrorDomain ARErrorDomain;
+
+// The registry of installed applications and plug-ins: the folders' content, remembered in a
+// database. Owned by the daemon's main; the platform services must outlive it and all proxies.
+//
+// Questions are answered from a published snapshot, on any thread. Everything that changes the
+// registry runs on its own queue "AppRegistry": compare with the folders (ARPass), store, publish,
+// tell the observer.
+class ARRegistry final : public ARApplicationWorkspace {
+public:
+    // Reads what is known and looks once at everything. Fails only when there can be no database.
+    [[nodiscard]] static std::expected<std::unique_ptr<ARRegistry>, platform::Error>
+    open(platform::Places places, platform::Locale& locale, platform::Containers& containers,
+         platform::Types& types, platform::CodeSigning& signing);
+    ~ARRegistry() override;
+
+    [[nodiscard]] std::optional<PlugIns> installedPlugins() override;
+    [[nodiscard]] std::optional<PlugIns> pluginsMatchingQuery(const platform::Dictionary& query,
+                                                              const Filter& filter) override;
+    [[nodiscard]] ARZephrinProxy::Ptr zephrinProxyForUUID(const platform::Uuid& uuid) override;
+    [[nodiscard]] ARZephrinProxy::Ptr zephrinProxyForPath(std::string_view path) override;
+    [[nodiscard]] ARApplicationProxy::Ptr
+    applicationProxyForBundlePath(std::string_view path) override;
+    [[nodiscard]] std::optional<ARExtensionPoint>
+    extensionPointForIdentifier(std::string_view identifier) override;
+    [[nodiscard]] ARKnowledge knowledge() override;
+    [[nodiscard]] std::optional<platform::Error> registerPlugin(std::string_view path) override;
+    [[nodiscard]] std::optional<platform::Error> unregisterPlugin(std::string_view path) override;
+    void clearSchemaCaches() override;
+    void setObserver(ARWorkspaceObserver* observer) override;
+
+    // Compares everything with the folders again, and waits for it.
+    void rescan();
+
+private:
+    ARRegistry(platform::Places places, std::shared_ptr<ARStore> store, ARStore::Content content,
+               std::shared_ptr<ARProxyContext> context, platform::Types& types);
+
+    void firstPass();
+    void store(ARBatch& batch);
+    void applyLive(ARBatch&& batch);
+    void publish(std::shared_ptr<ARSnapshot> snapshot);
+    void declareTypes();
+
+    const platform::Places places_;
+    const std::shared_ptr<ARStore> store_;
+    const std::shared_ptr<ARProxyContext> context_;
+    platform::Types& types_;
+    std::atomic<ARWorkspaceObserver*> observer_ = nullptr;
+
+    // On the queue.
+    ARModel model_;
+    ARComplaints complaints_;
+    ARSnapshotEditor editor_;
+    ARKnowledge knowledge_;
+
+    platform::SerialQueue queue_{"AppRegistry", platform::QueueRank::registry}; // goes first
+};
