@@ -16,12 +16,13 @@ ARModel::Entry* ARModel::find(std::string_view path) {
 }
 
 ARModel::Entry& ARModel::put(ARRowPtr row) {
-    const auto found = entries_.find(row->path.view());
+    const std::string_view path = row->path.view();
+    const auto found = entries_.find(path);
     if (found == entries_.end())
-        return entries_.emplace(row->path.view(), Entry{std::move(row)}).first->second;
+        return entries_.emplace(path, Entry{std::move(row)}).first->second;
     // The key must lie in the row that stays.
     auto node = entries_.extract(found);
-    node.key() = row->path.view();
+    node.key() = path;
     node.mapped().row = std::move(row);
     return entries_.insert(std::move(node)).position->second;
 }
