@@ -38,11 +38,26 @@ constexpr const char* readerSettings = "PRAGMA cache_size = -64; PRAGMA query_on
 
 constexpr int openFlags = SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_PRIVATECACHE;
 
+// What a database made of any bytes may answer counts as damage; only what the box itself is short
+// of does not.
+bool isDamage(int code) {
+    switch (code & 0xff) { // without the extension
+    case SQLITE_AUTH:
+    case SQLITE_BUSY:
+    case SQLITE_CANTOPEN:
+    case SQLITE_FULL:
+    case SQLITE_LOCKED:
+    case SQLITE_NOMEM:
+    case SQLITE_PERM:
+    case SQLITE_READONLY:
+        return false;
+    default:
+        return true;
+    }
+}
+
 ARStoreFailure failure(int code) {
-    const int kind = code & 0xff; // without the extension
-    const bool damaged = kind == SQLITE_CORRUPT || kind == SQLITE_NOTADB || kind == SQLITE_ERROR ||
-                         kind == SQLITE_SCHEMA || kind == SQLITE_FORMAT || kind == SQLITE_MISMATCH;
-    return {damaged, sqlite3_errstr(code)};
+    return {isDamage(code), sqlite3_errstr(code)};
 }
 
 std::expected<std::int64_t, int> firstNumber(ARSqlConnection& connection, const char* sql) {
