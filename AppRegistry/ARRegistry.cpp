@@ -72,6 +72,7 @@ void ARRegistry::applyLive(ARBatch&& batch) {
     auto next = std::make_shared<ARSnapshot>(*context_->published.get());
     const auto outcome = editor_.apply(*next, batch);
     publish(std::move(next));
+    declareTypes();
     ARWorkspaceObserver* const observer = observer_;
     if (observer && !outcome.uninstalled.empty())
         observer->pluginsWillUninstall(outcome.uninstalled);
@@ -82,6 +83,20 @@ void ARRegistry::applyLive(ARBatch&& batch) {
 void ARRegistry::publish(std::shared_ptr<ARSnapshot> snapshot) {
     snapshot->setKnowledge(knowledge_);
     context_->published.set(std::move(snapshot));
+}
+
+void ARRegistry::declareTypes() {
+    std::vector<platform::Value> declarations;
+    const auto declaring = model_.pick([](const ARModel::Entry& entry) {
+        return entry.row->declaresTypes && entry.row->kind != ARKind::plugIn;
+    });
+    for (const ARRowPtr& row : declaring) {
+        const auto info = context_->infos.dictionary(*row);
+        const platform::Value* declared = info ? info->find(ARInfoKey::typeDeclarations) : nullptr;
+        if (declared)
+            declarations.push_back(*declared);
+    }
+    types_.setBundleDeclarations(std::move(declarations));
 }
 
 void ARRegistry::rescan() {

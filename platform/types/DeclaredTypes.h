@@ -17,8 +17,7 @@ class DeclaredTypes final : public Types {
 public:
     explicit DeclaredTypes(std::string path) : file_(std::move(path)) {}
 
-    // The "TypeDeclarations" entries of all that is registered; replaces those of before.
-    void setBundleDeclarations(std::vector<Value> declarations);
+    void setBundleDeclarations(std::vector<Value> declarations) override;
 
     [[nodiscard]] bool conforms(std::string_view type, std::string_view target) override;
     [[nodiscard]] bool evaluateActivationRule(const Value& rule, const Dictionary& offer) override;

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <string_view>
+#include <vector>
 
 #include "platform/value/Value.h"
 
@@ -11,6 +12,10 @@ namespace platform {
 class Types {
 public:
     virtual ~Types() = default;
+
+    // The "TypeDeclarations" entries of all that is registered; replaces those of before. Types
+    // that bundles have no say in ignore them.
+    virtual void setBundleDeclarations(std::vector<Value> /*declarations*/) {}
 
     // True when `type` is `target` or conforms to it, directly or through others.
     [[nodiscard]] virtual bool conforms(std::string_view type, std::string_view target) = 0;
