@@ -1,0 +1,269 @@
+#include <functional>
+#include <thread>
+
+#include "platform/plist/PropertyList.h"
+#include "tests/registry/RegistryFixture.h"
+
+using platform::Dictionary;
+using platform::Uuid;
+using Strings = std::vector<std::string>;
+
+namespace {
+
+constexpr const char* one = "Applications/A.app/PlugIns/One.appex";
+constexpr const char* two = "Applications/A.app/PlugIns/Two.appex";
+
+// Longer than the tick of a file system's clock, so that a stamp can be told from the next.
+void letClockTick() {
+    std::this_thread::sleep_for(std::chrono::milliseconds(50));
+}
+
+class FirstPass : public RegistryTest {
+protected:
+    void makeUsual() const {
+        makeApplication("Applications/A.app", "com.example.a");
+        makePlugIn(one, "com.example.a.one");
+        makePlugIn(two, "com.example.a.two");
+        letClockTick();
+    }
+};
+
+} // namespace
+
+TEST_F(FirstPass, KnowsNothingInAnEmptyHome) {
+    open();
+    EXPECT_EQ(identifiers(), Strings());
+    EXPECT_FALSE(registry->knowledge().uuid);
+    EXPECT_EQ(registry->knowledge().sequence, 0U);
+}
+
+TEST_F(FirstPass, FindsPlugInsInApplicationsAndBesidesThem) {
+    makeUsual();
+    makePlugIn("Elsewhere/Alone.appex", "com.example.alone");
+    makeApplication("System/Applications/S.app", "com.example.s");
+    makePlugIn("System/Applications/S.app/PlugIns/In.appex", "com.example.s.in");
+    makePlugIn("Applications/A.app/PlugIns/.Hidden.appex", "com.example.hidden");
+    places.plugInFolders.push_back(home / "Elsewhere");
+    open();
+    EXPECT_EQ(identifiers(), (Strings{"com.example.a.one", "com.example.a.two", "com.example.s.in",
+                                      "com.example.alone"}));
+
+    const auto plugIn = at(one);
+    EXPECT_EQ(registry->zephrinProxyForUUID(plugIn->plugInUUID()), plugIn);
+    EXPECT_EQ(plugIn->originalIdentifier(), "com.example.a.one");
+    EXPECT_EQ(plugIn->bundleVersion(), "1.0");
+    EXPECT_EQ(plugIn->containingBundle()->bundleIdentifier(), "com.example.a");
+    EXPECT_FALSE(plugIn->isOnSystemPartition());
+    EXPECT_EQ(plugIn->dataContainerPath(), places.containers + "/com.example.a.one");
+    EXPECT_FALSE(at("Elsewhere/Alone.appex")->containingBundle());
+    EXPECT_TRUE(at("System/Applications/S.app/PlugIns/In.appex")->isOnSystemPartition());
+
+    const auto application = registry->applicationProxyForBundlePath(home / "Applications/A.app");
+    EXPECT_EQ(application->zephrinPlugins(), (std::vector{at(one), at(two)}));
+}
+
+TEST_F(FirstPass, ReportsTheExtensionPointAtTheTopOfTheInfoDictionary) {
+    makeUsual();
+    open();
+    const auto info = at(one)->infoDictionary();
+    ASSERT_TRUE(info);
+    EXPECT_EQ(*info->find("HXExtensionPointIdentifier"), platform::Value("com.tovana.point"));
+    EXPECT_EQ(*at(one)->plugInDictionary(),
+              (Dictionary{{"HXExtensionPointIdentifier", "com.tovana.point"}}));
+}
+
+TEST_F(FirstPass, TakesTheIdentifierFromTheExtensionThenTheTopThenTheBundle) {
+    Dictionary info = plugInInfo("com.example.bundle", "p");
+    const auto identifier = [&](std::string_view path) {
+        makeBundle(path, info);
+        open();
+        return *at(path)->plugInIdentifier();
+    };
+    makeApplication("Applications/A.app", "com.example.a");
+    EXPECT_EQ(identifier("Applications/A.app/PlugIns/1.appex"), "com.example.bundle");
+    info.set("HXExtensionIdentifier", "com.example.top");
+    EXPECT_EQ(identifier("Applications/A.app/PlugIns/2.appex"), "com.example.top");
+    info.set("HXExtension", Dictionary{{"HXExtensionIdentifier", "com.example.extension"}});
+    EXPECT_EQ(identifier("Applications/A.app/PlugIns/3.appex"), "com.example.extension");
+}
+
+TEST_F(FirstPass, KeepsUuidsAndKnowledgeWhileNothingChanges) {
+    makeUsual();
+    open();
+    const Uuid uuid = uuidOf(one);
+    const auto registered = at(one)->registrationDate();
+    const ARKnowledge known = registry->knowledge();
+    ASSERT_TRUE(known.uuid);
+
+    open();
+    EXPECT_EQ(uuidOf(one), uuid);
+    EXPECT_EQ(at(one)->registrationDate(), registered);
+    EXPECT_EQ(registry->knowledge().uuid, known.uuid);
+    EXPECT_EQ(registry->knowledge().sequence, known.sequence);
+    EXPECT_EQ(*at(one)->infoDictionary()->find("BQBundleVersion"), platform::Value("1.0"));
+}
+
+TEST_F(FirstPass, TellsATouchedBundleFromAChangedOne) {
+    struct Case {
+        const char* what;
+        std::function<void()> act;
+        bool changed;
+    };
+
+    const std::string program = std::string(one) + "/program";
+    const std::string signature = std::string(one) + "/Signature";
+    const Case cases[] = {
+        {"the same bytes written again", [&] { home.write(program, "code of com.example.a.one"); },
+         false},
+        {"a copy in place of the file",
+         [&] {
+             std::filesystem::copy_file(home / program, home / "copy");
+             std::filesystem::rename(home / "copy", home / program);
+         },
+         false},
+        {"other bytes of the same length",
+         [&] { home.write(program, "CODE of com.example.a.one"); }, true},
+        {"a signature", [&] { home.write(signature, "signed"); }, true},
+        {"another signature", [&] { home.write(signature, "SIGNED"); }, true},
+        {"no signature", [&] { std::filesystem::remove(home / signature); }, true},
+        {"a file that does not count", [&] { home.write(std::string(one) + "/data", "x"); }, false},
+    };
+    makeUsual();
+    open();
+    for (const Case& c : cases) {
+        SCOPED_TRACE(c.what);
+        const Uuid before = uuidOf(one);
+        const Uuid other = uuidOf(two);
+        const ARKnowledge known = registry->knowledge();
+        letClockTick();
+        c.act();
+        open();
+        EXPECT_EQ(uuidOf(one) != before, c.changed);
+        EXPECT_EQ(uuidOf(two), other);
+        EXPECT_EQ(registry->knowledge().sequence > known.sequence, c.changed);
+        EXPECT_EQ(registry->knowledge().uuid != known.uuid, c.changed);
+    }
+}
+
+TEST_F(FirstPass, SeesAChangeOfTheSameSizeRightAfterItRead) {
+    makeUsual();
+    for (int round = 0; round < 20; ++round) {
+        home.write(std::string(one) + "/program", "A" + std::to_string(100 + round));
+        open();
+        const Uuid uuid = uuidOf(one);
+        home.write(std::string(one) + "/program", "B" + std::to_string(100 + round));
+        open();
+        ASSERT_NE(uuidOf(one), uuid);
+    }
+}
+
+TEST_F(FirstPass, KeepsTheFirstIdentifierOfAPath) {
+    makeUsual();
+    open();
+    makePlugIn(one, "com.example.renamed");
+    open();
+    EXPECT_EQ(at(one)->plugInIdentifier(), "com.example.renamed");
+    EXPECT_EQ(at(one)->originalIdentifier(), "com.example.a.one");
+    open();
+    EXPECT_EQ(at(one)->originalIdentifier(), "com.example.a.one");
+}
+
+TEST_F(FirstPass, ForgetsWhatVanished) {
+    makeUsual();
+    open();
+    const ARKnowledge known = registry->knowledge();
+    remove(one);
+    open();
+    EXPECT_EQ(identifiers(), Strings{"com.example.a.two"});
+    EXPECT_GT(registry->knowledge().sequence, known.sequence);
+    remove("Applications/A.app");
+    open();
+    EXPECT_EQ(identifiers(), Strings());
+    EXPECT_FALSE(registry->applicationProxyForBundlePath(home / "Applications/A.app"));
+}
+
+TEST_F(FirstPass, MarksAnApplicationThatIsBeingInstalled) {
+    makeUsual();
+    home.write("Applications/A.app/.installing", "");
+    open();
+    EXPECT_TRUE(at(one)->containingBundle()->isPlaceholder());
+    const Uuid uuid = uuidOf(one);
+    remove("Applications/A.app/.installing");
+    open();
+    EXPECT_FALSE(at(one)->containingBundle()->isPlaceholder());
+    EXPECT_EQ(uuidOf(one), uuid);
+}
+
+TEST_F(FirstPass, RegistersOnceWhatIsReachedTwice) {
+    makeUsual();
+    std::filesystem::create_directory_symlink(home / "Applications/A.app",
+                                              home / "Applications/Z.app");
+    std::filesystem::create_directory_symlink(home / one,
+                                              home / "Applications/A.app/PlugIns/Again.appex");
+    makeApplication("Real/B.app", "com.example.b");
+    makePlugIn("Real/B.app/PlugIns/In.appex", "com.example.b.in");
+    std::filesystem::create_directory_symlink(home / "Real/B.app", home / "Applications/B.app");
+    places.applicationFolders.push_back(places.applicationFolders.front() + "/");
+    const std::string log = open();
+    EXPECT_EQ(identifiers(),
+              (Strings{"com.example.a.one", "com.example.a.two", "com.example.b.in"}));
+    EXPECT_TRUE(at("Real/B.app/PlugIns/In.appex")->containingBundle());
+    EXPECT_EQ(log, "");
+}
+
+TEST_F(FirstPass, KnowsExtensionPointsAndTypeDeclarations) {
+    const platform::Value declared(platform::Array{Dictionary{
+        {"TypeIdentifier", "com.example.picture"}, {"ConformsTo", "com.example.thing"}}});
+    const std::string folder = "System/Library/ExtensionPoints/";
+    const Dictionary entry{{"Default", 7}, {"TypeDeclarations", declared}};
+    home.write(folder + "com.example.point.plist", *platform::plist::writeXml(entry));
+    home.write(folder + "com.example.bad.plist", "nothing");
+    const std::string log = open();
+    EXPECT_NE(log.find("com.example.bad.plist"), std::string::npos);
+    const auto point = registry->extensionPointForIdentifier("com.example.point");
+    ASSERT_TRUE(point && point->sdkEntry);
+    EXPECT_EQ(*point->sdkEntry, entry);
+    EXPECT_TRUE(types.conforms("com.example.picture", "com.example.thing"));
+    EXPECT_FALSE(types.conforms("com.example.thing", "com.example.picture"));
+    EXPECT_FALSE(registry->extensionPointForIdentifier("com.example.bad"));
+    EXPECT_FALSE(registry->extensionPointForIdentifier("com.example"));
+}
+
+TEST_F(FirstPass, NamesThingsInTheLanguageInUse) {
+    makeBundle("Applications/A.app", {{"BQBundleIdentifier", "com.example.a"},
+                                      {"BQBundleDisplayName", "Pictures"},
+                                      {"BQBundleDisplayName[de]", "Bilder"}});
+    Dictionary info = plugInInfo("com.example.a.one", "p");
+    info.set("BQBundleDisplayName", "Long");
+    info.set("BQBundleDisplayName[de]", "Lang");
+    info.set("BQBundleDisplayName[de_CH]", "Lang CH");
+    info.set("BQBundleName[de]", "Kurz");
+    makeBundle(one, info);
+    open();
+    const auto plugIn = at(one);
+    EXPECT_EQ(plugIn->localizedName(), "Long");
+    EXPECT_EQ(plugIn->localizedShortName(), std::nullopt);
+    EXPECT_EQ(plugIn->containingBundle()->localizedName(), "Pictures");
+    locale.language = "de_AT";
+    EXPECT_EQ(plugIn->localizedName(), "Lang");
+    EXPECT_EQ(plugIn->localizedShortName(), "Kurz");
+    EXPECT_EQ(plugIn->containingBundle()->localizedName(), "Bilder");
+    locale.language = "de_CH";
+    EXPECT_EQ(plugIn->localizedName(), "Lang CH");
+}
+
+TEST_F(FirstPass, AsksForEntitlementsOfTheBundle) {
+    makeUsual();
+    signing.granted[home / one] = Dictionary{{"com.example.may", true}};
+    open();
+    EXPECT_EQ(at(one)->entitlements(), (Dictionary{{"com.example.may", true}}));
+    EXPECT_FALSE(at(two)->entitlements());
+    std::vector<std::string> asked;
+    const auto kept = registry->pluginsMatchingQuery(
+        {}, [&](std::string_view identifier, const auto& entitlements) {
+            asked.emplace_back(identifier);
+            return entitlements.has_value();
+        });
+    EXPECT_EQ(asked, (Strings{"com.example.a.one", "com.example.a.two"}));
+    EXPECT_EQ(kept, (ARApplicationWorkspace::PlugIns{at(one)}));
+}

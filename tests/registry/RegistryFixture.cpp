@@ -1,0 +1,75 @@
+#include "tests/registry/RegistryFixture.h"
+
+#include "platform/plist/PropertyList.h"
+
+using platform::Dictionary;
+
+RegistryTest::RegistryTest()
+    : places(platform::Places::forHome(home.path())),
+      containers(places.containers),
+      types(places.types) {
+    std::filesystem::create_directories(home / "Applications");
+}
+
+void RegistryTest::makeBundle(std::string_view path, const Dictionary& info) const {
+    home.write(std::string(path) + "/Info.plist", *platform::plist::writeXml(info));
+}
+
+void RegistryTest::makeApplication(std::string_view path, std::string_view identifier) const {
+    makeBundle(path, {{"BQBundleIdentifier", identifier}});
+}
+
+void RegistryTest::makePlugIn(std::string_view path, std::string_view identifier,
+                              std::string_view point) const {
+    makeBundle(path, plugInInfo(identifier, point));
+    home.write(std::string(path) + "/program", "code of " + std::string(identifier));
+}
+
+void RegistryTest::remove(std::string_view path) const {
+    std::filesystem::remove_all(home / path);
+}
+
+Dictionary RegistryTest::plugInInfo(std::string_view identifier, std::string_view point) {
+    return {{"BQBundleIdentifier", identifier},
+            {"BQBundleExecutable", "program"},
+            {"BQBundleVersion", "1.0"},
+            {"HXExtension", Dictionary{{"HXExtensionPointIdentifier", point}}}};
+}
+
+std::string RegistryTest::open() {
+    return logOf([this] {
+        registry.reset();
+        auto opened = ARRegistry::open(places, locale, containers, types, signing);
+        ASSERT_TRUE(opened) << describe(opened.error());
+        registry = std::move(*opened);
+    });
+}
+
+ARZephrinProxy::Ptr RegistryTest::at(std::string_view path) const {
+    return registry->zephrinProxyForPath(home / path);
+}
+
+platform::Uuid RegistryTest::uuidOf(std::string_view path) const {
+    const auto proxy = at(path);
+    return proxy ? proxy->plugInUUID() : platform::Uuid{};
+}
+
+namespace {
+
+std::vector<std::string> identifiersOf(const ARApplicationWorkspace::PlugIns& plugIns) {
+    std::vector<std::string> found;
+    for (const auto& plugIn : plugIns)
+        found.push_back(*plugIn->plugInIdentifier());
+    return found;
+}
+
+} // namespace
+
+std::vector<std::string> RegistryTest::identifiers() const {
+    return identifiersOf(*registry->installedPlugins());
+}
+
+std::vector<std::string> RegistryTest::matching(const platform::Value& pointPattern) const {
+    const Dictionary query{{"HXExtensionPointIdentifier", pointPattern}};
+    return identifiersOf(*registry->pluginsMatchingQuery(query, {}));
+}

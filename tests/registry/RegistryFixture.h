@@ -1,0 +1,91 @@
+#pragma once
+
+#include <map>
+#include <memory>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include "AppRegistry/ARRegistry.h"
+#include "platform/container/FolderContainers.h"
+#include "platform/locale/Locale.h"
+#include "platform/log/Log.h"
+#include "platform/signing/CodeSigning.h"
+#include "platform/types/DeclaredTypes.h"
+#include "tests/platform/TestFolder.h"
+
+// The language is what the test says.
+class FakeLocale final : public platform::Locale {
+public:
+    [[nodiscard]] std::string current() override { return language; }
+
+    void observeChanges(ChangeHandler /*handler*/) override {}
+
+    std::string language;
+};
+
+// Grants what the test says, by bundle path.
+class FakeSigning final : public platform::CodeSigning {
+public:
+    [[nodiscard]] std::unique_ptr<platform::SigningTask>
+    taskFor(const platform::ipc::Peer& /*peer*/) override {
+        return nullptr;
+    }
+
+    [[nodiscard]] std::optional<platform::Dictionary>
+    bundleEntitlements(std::string_view path) override {
+        const auto found = granted.find(std::string(path));
+        return found == granted.end() ? std::nullopt : std::optional(found->second);
+    }
+
+    std::map<std::string, platform::Dictionary> granted;
+};
+
+// A temporary home with bundles in it, and the registry over it: opened, closed and opened again
+// as the daemon would.
+class RegistryTest : public testing::Test {
+protected:
+    RegistryTest();
+
+    // Writes an application or a plug-in (path relative to the home) with an info dictionary.
+    void makeBundle(std::string_view path, const platform::Dictionary& info) const;
+    void makeApplication(std::string_view path, std::string_view identifier) const;
+    void makePlugIn(std::string_view path, std::string_view identifier,
+                    std::string_view point = "com.tovana.point") const;
+    void remove(std::string_view path) const;
+
+    [[nodiscard]] static platform::Dictionary plugInInfo(std::string_view identifier,
+                                                         std::string_view point);
+
+    // Opens the registry anew; the one before is closed first. Returns what it logged.
+    std::string open();
+    // What `act` logs.
+    template <class Act>
+    static std::string logOf(Act&& act);
+
+    [[nodiscard]] ARZephrinProxy::Ptr at(std::string_view path) const;
+    // The UUID of the plug-in at a path, all zero when there is none.
+    [[nodiscard]] platform::Uuid uuidOf(std::string_view path) const;
+    // The identifiers of all plug-ins, in the registry's order.
+    [[nodiscard]] std::vector<std::string> identifiers() const;
+    [[nodiscard]] std::vector<std::string> matching(const platform::Value& pointPattern) const;
+
+    TestFolder home;
+    platform::Places places;
+    FakeLocale locale;
+    platform::FolderContainers containers;
+    platform::DeclaredTypes types;
+    FakeSigning signing;
+    std::unique_ptr<ARRegistry> registry;
+};
+
+template <class Act>
+std::string RegistryTest::logOf(Act&& act) {
+    platform::log::flush();
+    testing::internal::CaptureStderr();
+    act();
+    platform::log::flush();
+    return testing::internal::GetCapturedStderr();
+}
