@@ -38,11 +38,5 @@ template <class... A>
                                                  const A&... args) {
     if (!format)
         return ZPDErrorMake(code, std::nullopt);
-    constexpr bool showPrivate = true;
-    if constexpr (sizeof...(A) == 0) {
-        return ZPDErrorMake(code, platform::log::render(format, {}, showPrivate));
-    } else {
-        const platform::log::Argument list[] = {platform::log::Argument(args)...};
-        return ZPDErrorMake(code, platform::log::render(format, list, showPrivate));
-    }
+    return ZPDErrorMake(code, platform::log::renderText(format, args...));
 }

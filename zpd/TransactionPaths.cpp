@@ -27,7 +27,8 @@ bool Transaction::marshalPath(const Value& entry, const PathBlock& block) {
         return false;
     }
     if (!path->starts_with('/')) {
-        fail(ZPDErrorCode::badPath, "absolute path required: " + std::string(*path));
+        fail(ZPDErrorCode::badPath,
+             ZPDErrorMakeFormat(ZPDErrorCode::badPath, "absolute path required: %s", *path));
         return false;
     }
     const auto resolved = platform::canonicalPath(*path);

@@ -76,12 +76,8 @@ bool ZPDIpcClient::hasEntitlement(std::string_view key) {
 std::string ZPDIpcClient::description() const {
     const void* const self = this;
     const auto there = connection();
-    if (!there) {
-        const platform::log::Argument list[] = {platform::log::Argument(self)};
-        return platform::log::render("<ZPDIpcClient %p NO CONNECTION>", list, true);
-    }
-    const platform::log::Argument list[] = {
-        platform::log::Argument(self), platform::log::Argument(*there),
-        platform::log::Argument(pid()), platform::log::Argument(path_)};
-    return platform::log::render("<ZPDIpcClient %p con=%@ pid=%d path=%@>", list, true);
+    if (!there)
+        return platform::log::renderText("<ZPDIpcClient %p NO CONNECTION>", self);
+    return platform::log::renderText("<ZPDIpcClient %p con=%@ pid=%d path=%@>", self, *there, pid(),
+                                     path_);
 }

@@ -13,8 +13,7 @@ using platform::Value;
 namespace {
 
 std::string lacksEntitlement(const Value& entitlement) {
-    const platform::log::Argument argument[] = {platform::log::Argument(entitlement)};
-    return platform::log::render("the host does not have the \"%@\" entitlement", argument, true);
+    return platform::log::renderText("the host does not have the \"%@\" entitlement", entitlement);
 }
 
 } // namespace

@@ -40,7 +40,7 @@ std::atomic<Level> Category::least = Level::standard;
 void Category::write(Level level, const char* format, std::span<const Argument> args) const {
     std::string text = std::exchange(renderingRoom, std::string());
     text.clear();
-    renderTo(text, format, args, showPrivate.load(std::memory_order_relaxed));
+    renderLineTo(text, format, args, showPrivate.load(std::memory_order_relaxed));
     Writer::shared().append(level, name_, nowNanoseconds(), text);
     if (text.capacity() <= keptRoom)
         renderingRoom = std::move(text);

@@ -109,7 +109,22 @@ void appendNumber(std::string& out, T number, int base = 10) {
     out.append(room, end);
 }
 
-void appendArgument(std::string& out, const Argument& argument, char conversion) {
+// How arguments appear in what is made of them.
+struct Style {
+    bool showPrivate;
+    bool escape;
+};
+
+void appendTextual(std::string& out, std::string_view text, const Style& style) {
+    if (style.escape) {
+        appendEscaped(out, text);
+    } else {
+        out += text;
+    }
+}
+
+void appendArgument(std::string& out, const Argument& argument, char conversion,
+                    const Style& style) {
     switch (argument.kind()) {
     case Argument::Kind::signedNumber:
     case Argument::Kind::unsignedNumber:
@@ -126,10 +141,10 @@ void appendArgument(std::string& out, const Argument& argument, char conversion)
         appendNumber(out, argument.number(), 16);
         return;
     case Argument::Kind::text:
-        appendEscaped(out, argument.text());
+        appendTextual(out, argument.text(), style);
         return;
     case Argument::Kind::thing:
-        appendEscaped(out, argument.description());
+        appendTextual(out, argument.description(), style);
         return;
     }
 }
@@ -141,32 +156,30 @@ void appendErrno(std::string& out, const Argument& argument) {
     out += std::generic_category().message(number);
 }
 
-void appendUuid(std::string& out, const Argument& argument) {
+void appendUuid(std::string& out, const Argument& argument, const Style& style) {
     const auto uuid = Uuid::fromBytes(std::as_bytes(std::span(argument.text())));
     if (argument.kind() == Argument::Kind::text && uuid) {
         out += uuid->text();
     } else {
-        appendArgument(out, argument, '@');
+        appendArgument(out, argument, '@', style);
     }
 }
 
 void appendDirective(std::string& out, const Directive& directive, const Argument& argument,
-                     bool showPrivate) {
-    if (!showPrivate && !directive.isPublic()) {
+                     const Style& style) {
+    if (!style.showPrivate && !directive.isPublic()) {
         out += privateText;
     } else if (directive.conversion == 'P') {
-        appendUuid(out, argument);
+        appendUuid(out, argument, style);
     } else if (directive.marker == "errno") {
         appendErrno(out, argument);
     } else {
-        appendArgument(out, argument, directive.conversion);
+        appendArgument(out, argument, directive.conversion, style);
     }
 }
 
-} // namespace
-
 void renderTo(std::string& out, const char* format, std::span<const Argument> args,
-              bool showPrivate) {
+              const Style& style) {
     std::string_view rest = format;
     std::size_t next = 0;
     for (;;) {
@@ -182,7 +195,7 @@ void renderTo(std::string& out, const char* format, std::span<const Argument> ar
         }
         const Directive directive = parseDirective(rest);
         if (directive.known() && next < args.size()) {
-            appendDirective(out, directive, args[next++], showPrivate);
+            appendDirective(out, directive, args[next++], style);
         } else {
             out.append(directive.text);
         }
@@ -190,9 +203,22 @@ void renderTo(std::string& out, const char* format, std::span<const Argument> ar
     }
 }
 
-std::string render(const char* format, std::span<const Argument> args, bool showPrivate) {
+} // namespace
+
+void renderLineTo(std::string& out, const char* format, std::span<const Argument> args,
+                  bool showPrivate) {
+    renderTo(out, format, args, {.showPrivate = showPrivate, .escape = true});
+}
+
+std::string renderLine(const char* format, std::span<const Argument> args, bool showPrivate) {
     std::string out;
-    renderTo(out, format, args, showPrivate);
+    renderLineTo(out, format, args, showPrivate);
+    return out;
+}
+
+std::string renderTextOf(const char* format, std::span<const Argument> args) {
+    std::string out;
+    renderTo(out, format, args, {.showPrivate = true, .escape = false});
     return out;
 }
 

@@ -27,7 +27,7 @@ namespace {
 template <class... A>
 std::string shown(bool showPrivate, const char* format, const A&... args) {
     const std::array<Argument, sizeof...(A)> list{Argument(args)...};
-    return render(format, list, showPrivate);
+    return renderLine(format, list, showPrivate);
 }
 
 struct Counted {
