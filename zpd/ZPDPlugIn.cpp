@@ -50,7 +50,8 @@ ZPDPlugIn::Ptr ZPDPlugIn::create(const ARZephrinProxy::Ptr& proxy,
     if (!made->setupWithProxy(proxy))
         return nullptr;
     if (const auto fault = made->diagnose()) {
-        ZPDLogAr().info("ignoring mis-configured plug-in at %@: %{public}@", made->path(), *fault);
+        ZPDLogAr().info("ignoring mis-configured plug-in at %@: %{public}@", made->path(),
+                        fault->description.value_or(""));
         return nullptr;
     }
     return made;

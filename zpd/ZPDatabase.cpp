@@ -70,7 +70,7 @@ ZPDPlugIn::Ptr ZPDatabase::createPlugInForProxy(const ARZephrinProxy::Ptr& proxy
     auto plugIn = ZPDPlugIn::create(proxy, context_);
     if (!plugIn)
         return nullptr;
-    if (plugIn->valueForEntitlement(Entitlement::autoElect))
+    if (plugIn->hasEntitlement(Entitlement::autoElect))
         autoElect(*plugIn);
     purgeCachesToLimit(cacheLimit_);
     cache_[plugIn->uuid()] = plugIn;
