@@ -34,8 +34,7 @@ PATH=$build/bin:$PATH
 export ZEPHRIN_HOME="$home/home"
 export PATH
 socket=$ZEPHRIN_HOME/run/com.tovana.zephrin.zpd
-# The samples' language comes from the home, not from whoever runs this.
-unset LANG LC_ALL LC_CTYPE NO_COLOR ZEPHRIN_LOG ZEPHRIN_LOG_PRIVATE XDG_DATA_HOME 2>/dev/null || true
+unset ZEPHRIN_LOG ZEPHRIN_LOG_PRIVATE
 
 fail() {
     printf '\nFAILED: %s\n' "$1" >&2

@@ -22,5 +22,5 @@ int main(int argc, char** argv) {
         std::cout << plugIn->identifier() << ' ' << plugIn->exportedVersion() << "  "
                   << plugIn->localizedName().value_or(plugIn->identifier()) << "  "
                   << plugIn->path() << '\n';
-    std::cout << plugIns->size() << " plug-ins\n";
+    std::cout << plugIns->size() << (plugIns->size() == 1 ? " plug-in\n" : " plug-ins\n");
 }
