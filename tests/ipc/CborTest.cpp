@@ -1,0 +1,248 @@
+#include "platform/ipc/Cbor.h"
+
+#include <cmath>
+#include <cstdint>
+#include <limits>
+#include <string>
+
+#include <gtest/gtest.h>
+
+namespace {
+
+using namespace platform;
+using namespace platform::ipc;
+
+std::string bytes(std::string_view hex) {
+    std::string out;
+    std::string digits;
+    for (const char c : hex) {
+        if (c == ' ')
+            continue;
+        digits += c;
+        if (digits.size() < 2)
+            continue;
+        out += static_cast<char>(std::stoi(digits, nullptr, 16));
+        digits.clear();
+    }
+    return out;
+}
+
+Value data(std::string_view content) {
+    return Data{SharedBytes(content)};
+}
+
+Value url(std::string_view text) {
+    return Url{SharedBytes(text)};
+}
+
+const Uuid someUuid = *Uuid::parse("00112233-4455-6677-8899-AABBCCDDEEFF");
+
+struct Example {
+    const char* hex;
+    Value value;
+};
+
+// Appendix A of RFC 8949, as far as the wire has the kinds, and the tags of the wire.
+const std::vector<Example>& written() {
+    static const std::vector<Example> examples = {
+        {"00", 0},
+        {"01", 1},
+        {"0a", 10},
+        {"17", 23},
+        {"18 18", 24},
+        {"18 19", 25},
+        {"18 64", 100},
+        {"19 03e8", 1000},
+        {"1a 000f4240", 1000000},
+        {"1b 000000e8d4a51000", 1000000000000},
+        {"1b ffffffffffffffff", std::numeric_limits<std::uint64_t>::max()},
+        {"3b 7fffffffffffffff", std::numeric_limits<std::int64_t>::min()},
+        {"20", -1},
+        {"29", -10},
+        {"38 63", -100},
+        {"39 03e7", -1000},
+        {"fb 3ff199999999999a", 1.1},
+        {"fb 7e37e43c8800759c", 1.0e+300},
+        {"fb c010666666666666", -4.1},
+        {"fb 7ff0000000000000", std::numeric_limits<double>::infinity()},
+        {"f4", false},
+        {"f5", true},
+        {"f6", nullptr},
+        {"40", data("")},
+        {"44 01020304", data("\x01\x02\x03\x04")},
+        {"60", ""},
+        {"61 61", "a"},
+        {"64 49455446", "IETF"},
+        {"62 225c", "\"\\"},
+        {"62 c3bc", "\u00fc"},
+        {"63 e6b0b4", "\u6c34"},
+        {"64 f0908591", "\U00010151"},
+        {"80", Array{}},
+        {"83 010203", Array{1, 2, 3}},
+        {"83 01 820203 820405", Array{1, Array{2, 3}, Array{4, 5}}},
+        {"a0", Dictionary{}},
+        {"a2 6161 01 6162 820203", Dictionary{{"a", 1}, {"b", Array{2, 3}}}},
+        {"82 6161 a1 6162 6163", Array{"a", Dictionary{{"b", "c"}}}},
+        {"c1 fb 41d452d9ec200000", Date{1363896240.5}},
+        {"d8 20 76 687474703a2f2f7777772e6578616d706c652e636f6d", url("http://www.example.com")},
+        {"d8 25 50 00112233445566778899aabbccddeeff", someUuid},
+    };
+    return examples;
+}
+
+TEST(CborTest, WritesAndReadsTheExamplesOfTheStandard) {
+    for (const auto& [hex, value] : written()) {
+        EXPECT_EQ(encode(value), bytes(hex)) << hex;
+        const auto read = decode(bytes(hex));
+        ASSERT_TRUE(read) << hex;
+        EXPECT_EQ(*read, value) << hex;
+        EXPECT_EQ(read->kind(), value.kind()) << hex;
+    }
+}
+
+TEST(CborTest, ReadsOtherWidthsThanItWrites) {
+    const Example examples[] = {
+        {"18 05", 5}, // longer than need be
+        {"1b 0000000000000005", 5},
+        {"f9 0000", 0.0},
+        {"f9 3c00", 1.0},
+        {"f9 7bff", 65504.0},
+        {"f9 0001", 5.960464477539063e-8},
+        {"f9 0400", 0.00006103515625},
+        {"f9 c400", -4.0},
+        {"f9 7c00", std::numeric_limits<double>::infinity()},
+        {"fa 47c35000", 100000.0},
+        {"fa 7f7fffff", 3.4028234663852886e+38},
+        {"c1 1a 514b67b0", Date{1363896240}},
+        {"c1 20", Date{-1}},
+        {"c1 f9 3c00", Date{1}},
+        {"a2 6162 01 6161 02", Dictionary{{"a", 2}, {"b", 1}}}, // keys in any order
+    };
+    for (const auto& [hex, value] : examples) {
+        const auto read = decode(bytes(hex));
+        ASSERT_TRUE(read) << hex;
+        EXPECT_EQ(*read, value) << hex;
+    }
+    EXPECT_TRUE(std::isnan(*decode(bytes("f9 7e00"))->real()));
+}
+
+TEST(CborTest, RefusesWhatIsMalformed) {
+    const char* const examples[] = {
+        "",
+        "00 00",               // two items
+        "1c",                  // reserved argument
+        "18",                  // argument missing
+        "3b 8000000000000000", // below 64 bits
+        "5f 41 00 ff",         // indefinite byte string
+        "7f 61 61 ff",         // indefinite text
+        "9f ff",               // indefinite array
+        "bf ff",               // indefinite map
+        "ff",                  // a break alone
+        "61",                  // text missing
+        "62 c3 28",            // not UTF-8
+        "61 ff",
+        "62 c0 80",       // longer than need be
+        "63 ed a0 80",    // surrogate
+        "64 f4 90 80 80", // past U+10FFFF
+        "a1 01 02",       // key that is not text
+        "a1 41 61 02",
+        "a1 61 ff 02",        // key that is not UTF-8
+        "a2 6161 01 6161 02", // repeated key
+        "a3 6161 01 6162 02 6161 03",
+        "a1 6161",             // value missing
+        "82 01",               // element missing
+        "9b ffffffffffffffff", // a count that nothing backs
+        "bb 7fffffffffffffff",
+        "5b ffffffffffffffff",
+        "f7",    // undefined
+        "f8 20", // other simple values
+        "e0",
+        "f9 3c",    // half a half
+        "c0 61 61", // unknown tags
+        "c2 41 01",
+        "d9 d9f7 00",
+        "c1 61 61", // a date that is no number
+        "c1 f5",
+        "c1 c1 00",
+        "d8 20 41 61",                             // a URL that is no text
+        "d8 25 4f 00112233445566778899aabbccddee", // a UUID too short
+        "d8 25 61 61",
+        "d8 18 41 00", // a record where none may be
+    };
+    for (const char* hex : examples) {
+        const auto read = decode(bytes(hex));
+        ASSERT_FALSE(read) << hex;
+        EXPECT_EQ(read.error().domain, &formatErrorDomain) << hex;
+    }
+}
+
+TEST(CborTest, TruncationAtEveryLengthIsRefused) {
+    Dictionary body;
+    for (const auto& [hex, value] : written())
+        body.set(hex, value);
+    const std::string whole = encode(body);
+    EXPECT_EQ(*decode(whole), Value(body));
+    for (std::size_t length = 0; length < whole.size(); ++length)
+        EXPECT_FALSE(decode(std::string_view(whole).substr(0, length))) << length;
+}
+
+std::string nested(unsigned depth) {
+    return std::string(depth - 1, '\x81') + std::string(1, '\x80');
+}
+
+TEST(CborTest, NestingEndsAtSixtyFour) {
+    EXPECT_TRUE(decode(nested(64)));
+    EXPECT_FALSE(decode(nested(65)));
+    EXPECT_FALSE(decode(nested(100'000)));
+    // Tags do not count.
+    EXPECT_TRUE(decode(std::string(63, '\x81') + bytes("81 c1 00")));
+    // What a record holds starts afresh.
+    const std::string inner = bytes("d8 18 58 40") + nested(64);
+    const auto outer = decode(std::string(64, '\x81') + inner, {.allowEncoded = true});
+    ASSERT_TRUE(outer);
+    EXPECT_TRUE(decodeRecord(inner));
+    EXPECT_FALSE(decodeRecord(bytes("d8 18 58 41") + nested(65)));
+}
+
+TEST(CborTest, ValuesAreCountedWithoutKeys) {
+    const std::string text = encode(Dictionary{{"a", Array{1, 2}}, {"b", "c"}});
+    EXPECT_EQ(decodeCounted(text)->values, 5U);
+    EXPECT_TRUE(decode(text, {.maxValues = 5}));
+    EXPECT_FALSE(decode(text, {.maxValues = 4}));
+}
+
+TEST(CborTest, WritesValidTextWhateverTheValueHolds) {
+    EXPECT_EQ(encode("a\xff"), bytes("64 61 efbfbd"));
+    EXPECT_EQ(encode(Dictionary{{"\xc3", 1}}), bytes("a1 63 efbfbd 01"));
+    Value deep = 1;
+    for (int i = 0; i < 200; ++i)
+        deep = Array{deep};
+    EXPECT_TRUE(decode(encode(deep)));
+}
+
+TEST(CborRecordTest, SharesWhatIsEncodedAlready) {
+    const Dictionary form{{"path", "/a/b.appex"}, {"lastmodified", Date{12.5}}};
+    const SharedBytes item = encodeShared(form);
+    const Encoded records = encodeRecordArray({item, item, item});
+    int shared = 0;
+    for (const SharedBytes& piece : *records.pieces)
+        shared += piece.sameAllocation(item) ? 1 : 0;
+    EXPECT_EQ(shared, 3);
+
+    const auto reply = decode(encode(Dictionary{{"matches", records}}), {.allowEncoded = true});
+    ASSERT_TRUE(reply);
+    const Encoded* received = reply->dictionary()->find("matches")->encoded();
+    ASSERT_TRUE(received);
+    EXPECT_EQ(*decodeRecord(*received), Value(Array{form, form, form}));
+    EXPECT_EQ(*decodeRecord(records), Value(Array{form, form, form}));
+}
+
+TEST(CborRecordTest, AllWaysOfMakingOneAgree) {
+    const Dictionary form{{"a", 1}};
+    EXPECT_EQ(encode(encodeRecord(Value(form))), encode(encodeRecord(encodeShared(form))));
+    EXPECT_EQ(encode(encodeRecord(Value(Array{form, form}))),
+              encode(encodeRecordArray({encodeShared(form), encodeShared(form)})));
+    EXPECT_EQ(*decodeRecord(encodeRecordArray({})), Value(Array{}));
+}
+
+} // namespace
