@@ -47,16 +47,18 @@ public:
         : loop_(loop),
           descriptor_(descriptor.get()),
           state_(std::make_shared<WatchState>(loop.impl().context, std::move(handler))) {
-        const auto begin = [state = state_, fd = descriptor.release()] {
+        auto begin = [state = state_, own = std::move(descriptor)]() mutable {
             asio::error_code error;
-            state->descriptor.assign(fd, error);
-            if (!error)
-                state->wait();
+            state->descriptor.assign(own.get(), error);
+            if (error)
+                return;
+            (void)own.release();
+            state->wait();
         };
         if (loop.isCurrent())
             begin();
         else
-            loop.post(begin);
+            loop.post(std::move(begin));
     }
 
     ~DescriptorWatch() override {
@@ -114,8 +116,6 @@ Loop::Loop(std::string name) : impl_(std::make_unique<Impl>(std::move(name))) {}
 
 Loop::~Loop() {
     stop();
-    if (impl_->thread.joinable())
-        impl_->thread.join();
 }
 
 const std::string& Loop::name() const noexcept {
@@ -137,6 +137,8 @@ void Loop::run() {
 
 void Loop::stop() {
     impl_->context.stop();
+    if (impl_->thread.joinable() && !isCurrent())
+        impl_->thread.join();
 }
 
 void Loop::post(Block block) {

@@ -45,7 +45,7 @@ public:
 
     void start(); // at most once; not with `run`
     void run();   // returns after `stop`
-    void stop();
+    void stop();  // from elsewhere, waits until the loop's own thread has ended
 
     // Runs `block` on the loop, after what was posted before.
     void post(Block block);

@@ -10,6 +10,7 @@
 #include <asio/executor_work_guard.hpp>
 #include <asio/io_context.hpp>
 #include <asio/signal_set.hpp>
+#include <asio/steady_timer.hpp>
 
 #include "platform/ipc/Loop.h"
 
@@ -36,6 +37,8 @@ struct Loop::Impl {
     const std::string name;
     asio::io_context context{ASIO_CONCURRENCY_HINT_UNSAFE_IO};
     asio::executor_work_guard<asio::io_context::executor_type> busy{context.get_executor()};
+    // Makes the reactor right away, not when descriptors may have run out.
+    asio::steady_timer first{context};
     std::vector<std::unique_ptr<Signal>> signals;
     std::atomic<std::thread::id> runner;
     std::thread thread;

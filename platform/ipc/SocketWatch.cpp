@@ -13,8 +13,10 @@ using Descriptor = asio::posix::stream_descriptor;
 // Shared with the waits under way, which may end after the watch is gone.
 struct SocketWatch::State : std::enable_shared_from_this<State> {
     State(asio::io_context& context, UniqueFd socket) : descriptor(context) {
-        asio::error_code ignored;
-        descriptor.assign(socket.release(), ignored);
+        asio::error_code error;
+        descriptor.assign(socket.get(), error);
+        if (!error)
+            (void)socket.release();
     }
 
     // Once a descriptor was watched for writing, Asio's reactor goes on to be woken whenever the

@@ -29,6 +29,7 @@ public:
     SocketWatch& operator=(const SocketWatch&) = delete;
     ~SocketWatch();
 
+    // -1 once closed, and when the system could not watch it.
     [[nodiscard]] int descriptor() const noexcept;
 
     // Nothing happens when the wait is under way already.
