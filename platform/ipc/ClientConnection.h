@@ -20,8 +20,8 @@ namespace platform::ipc {
 // Connects with the first send, and again with the next send after the daemon went away. Answers
 // the daemon's greeting by itself. Replies and events are delivered on the target queue, in the
 // order in which they came; the socket is served by one loop thread that all connections of the
-// process share. Owned by whoever made it; may be used from any thread. Letting it go (not from
-// within `send`) answers what is pending with the invalid error.
+// process share. Owned by whoever made it; may be used from any thread. Letting it go answers what
+// is pending with the invalid error; so handlers may still be called then, on the queue.
 class ClientConnection {
 public:
     // The reply's body, or why there is none. Called exactly once.

@@ -54,7 +54,8 @@ bool ClientSession::send(const Dictionary& message, ReplyHandler& handler) {
     }
     const FrameText frame(kind, id, message);
     if (!frame.fits(largestRequestBody)) {
-        ipcLog().error("a request is past the limits of the wire: %lu bytes", frame.bodySize());
+        ipcLog().error("a request is past the limits of the wire: %{public}lu bytes",
+                       frame.bodySize());
         ReplyHandler refused;
         if (kind == FrameKind::request && takeBack(id, refused))
             answer(*target_, std::move(refused), std::unexpected(ConnectionError::invalid));

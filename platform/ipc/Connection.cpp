@@ -35,13 +35,13 @@ Connection::Impl::Impl(Loop& itsLoop, UniqueFd itsSocket, Peer itsPeer,
       account(std::move(itsAccount)),
       limits(itsLimits),
       number(nextNumber()) {
-    outbox.open(itsSocket.get());
     socket = std::make_unique<SocketWatch>(loop, std::move(itsSocket));
+    outbox.open(socket->descriptor());
 }
 
 Connection::Impl::~Impl() {
     outbox.close();
-    account->release(unfinishedCost + chargedPartial);
+    account->release(unfinishedCost + reserved);
     account->close();
     if ((socket || process || timer) && !loop.isCurrent())
         loop.post([s = std::move(socket), p = std::move(process), t = std::move(timer)] {});

@@ -33,12 +33,12 @@ void Connection::Impl::end(Replies replies, std::string_view complaint) {
         invalidDue = true;
     }
     if (!complaint.empty()) {
-        ipcLog().error("the connection of process %d (user %u) ended: %{public}s", peer.pid,
-                       peer.uid, complaint);
+        ipcLog().error("the connection of process %{public}d (user %{public}u) ended: %{public}s",
+                       peer.pid, peer.uid, complaint);
     }
     alive = false;
     process.reset();
-    chargePartial(0);
+    releaseReserved();
     dropWaiting();
     deliverInvalid();
     if (replies == Replies::drop)

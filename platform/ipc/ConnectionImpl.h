@@ -44,11 +44,12 @@ struct Connection::Impl final : SocketWatch::Target {
     [[nodiscard]] Complaint take(const Frame& frame);
     [[nodiscard]] Complaint takeRequest(const Frame& frame);
     [[nodiscard]] Complaint takeAnswer(const Frame& frame);
-    void chargePartial(std::size_t pending);
+    [[nodiscard]] bool admitBegun();
+    void releaseReserved();
     [[nodiscard]] bool hasRoom() const;
     [[nodiscard]] bool mayTake();
-    [[nodiscard]] bool pauseUnlessRoom();
-    void pause();
+    [[nodiscard]] bool pauseUnless(bool admitted);
+    void pause(bool admitted);
     void userHasRoom();
     void goOn();
     void hungUp() override;
@@ -68,7 +69,6 @@ struct Connection::Impl final : SocketWatch::Target {
     void writable() override;
     void watchProgress();
     void checkProgress();
-    [[nodiscard]] bool isStalled();
 
     // The end. On the loop.
     enum class Replies : std::uint8_t { flush, drop };
@@ -94,12 +94,11 @@ struct Connection::Impl final : SocketWatch::Target {
     SharedBytes challenge;
     bool answered = false;
     bool awaitsUser = false;
-    std::size_t chargedPartial = 0;
+    std::size_t reserved = 0;       // in the user's account, for the request that was begun
     std::unique_ptr<Watch> process; // while reading is paused
     std::unique_ptr<Timer> timer;
     bool timing = false;
     std::uint64_t progressSeen = 0;
-    std::uint64_t framesTaken = 0;
     Clock::time_point progressAt;
 
     struct Waiting {

@@ -13,7 +13,7 @@ namespace {
 
 constexpr std::size_t scratchSize = 64UL << 10;
 
-// What a started frame may take before it counts as waiting.
+// A frame of at most this size is read whatever else waits.
 constexpr std::size_t freePartial = scratchSize;
 
 // Memory that all reading of a thread goes through.
@@ -72,14 +72,13 @@ void Connection::Impl::takeFrames() {
             return end(Replies::drop, frame.error());
         if (!*frame)
             break;
-        ++framesTaken;
         if (const auto complaint = take(**frame))
             return end(Replies::drop, *complaint);
     }
     reader.keep();
-    chargePartial(reader.pending() > freePartial ? reader.pending() : 0);
-    if (pauseUnlessRoom())
-        pause();
+    const bool admitted = admitBegun();
+    if (pauseUnless(admitted))
+        pause(admitted);
     else
         socket->waitReadable(target());
 }
@@ -103,6 +102,7 @@ Connection::Impl::Complaint Connection::Impl::takeRequest(const Frame& frame) {
     message.fromPeer = frame.fromPeer;
     message.greeted = greeted;
     decoded->value = Value();
+    releaseReserved();
     enqueue(std::move(message), frameHeaderSize + frame.body.size() + decoded->values * valueCost);
     return std::nullopt;
 }
@@ -120,19 +120,27 @@ Connection::Impl::Complaint Connection::Impl::takeAnswer(const Frame& frame) {
     return std::nullopt;
 }
 
-// A large request counts from its first bytes on.
-void Connection::Impl::chargePartial(std::size_t pending) {
-    const std::size_t before = std::exchange(chargedPartial, pending);
-    if (pending > before)
-        account->add(pending - before);
-    else if (pending < before)
-        account->release(before - pending);
+// A large request is read on only when there is room for all of it: what was begun can always be
+// completed, so that large requests never wait for each other.
+bool Connection::Impl::admitBegun() {
+    const std::size_t begun = reader.begunFrame();
+    if (begun <= freePartial || reserved != 0)
+        return true;
+    if (!account->reserve(begun))
+        return false;
+    reserved = begun;
+    return true;
+}
+
+void Connection::Impl::releaseReserved() {
+    if (reserved != 0)
+        account->release(std::exchange(reserved, 0));
 }
 
 // REQUIRES: mutex held.
 bool Connection::Impl::hasRoom() const {
     return unfinished < limits.waitingRequests && unfinishedCost < limits.waitingBytes &&
-           (!account->full() || (unfinished == 0 && chargedPartial == 0));
+           (unfinished == 0 || !account->full());
 }
 
 bool Connection::Impl::mayTake() {
@@ -140,15 +148,15 @@ bool Connection::Impl::mayTake() {
     return hasRoom();
 }
 
-bool Connection::Impl::pauseUnlessRoom() {
+bool Connection::Impl::pauseUnless(bool admitted) {
     const std::lock_guard lock(mutex);
-    paused = !hasRoom();
+    paused = !admitted || !hasRoom();
     return paused;
 }
 
 // While nothing is read, only the socket's hang-up and the end of the process tell that the client
 // is gone.
-void Connection::Impl::pause() {
+void Connection::Impl::pause(bool admitted) {
     socket->waitHangUp(target());
     if (peer.process && !process) {
         UniqueFd copy(::fcntl(peer.process.get(), F_DUPFD_CLOEXEC, 0));
@@ -159,10 +167,10 @@ void Connection::Impl::pause() {
             });
         }
     }
-    watchProgress();
-    if (!account->full() || std::exchange(awaitsUser, true))
+    if ((admitted && !account->full()) || std::exchange(awaitsUser, true))
         return;
-    account->whenRoom([connection = owner->weak_from_this()] {
+    const std::size_t awaited = admitted ? 1 : reader.begunFrame();
+    account->whenFits(awaited, [connection = owner->weak_from_this()] {
         if (const auto there = connection.lock())
             there->impl().post(&Impl::userHasRoom);
     });

@@ -27,8 +27,9 @@ void Connection::Impl::greet() {
 void Connection::Impl::write(FrameKind kind, std::uint64_t id, const Dictionary& body) {
     FrameText text(kind, id, body);
     if (!text.fits(largestReplyBody)) {
-        ipcLog().error("a reply to process %d is past the limits of the wire: %lu bytes", peer.pid,
-                       text.bodySize());
+        ipcLog().error(
+            "a reply to process %{public}d is past the limits of the wire: %{public}lu bytes",
+            peer.pid, text.bodySize());
         return write(kind, id, oversizedReply());
     }
     if (outbox.send(text.text(), text.encoder()) == Outbox::Outcome::waiting)
@@ -55,34 +56,28 @@ void Connection::Impl::writable() {
     }
 }
 
-// A client that lets replies lie, or a request that finds no room among its user's, must not hold
-// on for ever.
-bool Connection::Impl::isStalled() {
-    const std::lock_guard lock(mutex);
-    return !outbox.empty() || (paused && unfinished == 0);
-}
-
+// A client that lets its replies lie must not hold on for ever.
 void Connection::Impl::watchProgress() {
-    if (timing || !isStalled())
+    if (timing)
         return;
     timing = true;
-    progressSeen = outbox.written() + framesTaken;
+    progressSeen = outbox.written();
     progressAt = Clock::now();
     checkProgress();
 }
 
 void Connection::Impl::checkProgress() {
-    const std::uint64_t progress = outbox.written() + framesTaken;
+    const std::uint64_t progress = outbox.written();
     const auto now = Clock::now();
     if (progress != progressSeen)
         progressAt = now;
     progressSeen = progress;
-    timing = socket && isStalled();
+    timing = socket && !outbox.empty();
     if (!timing)
         return;
     if (now - progressAt >= limits.stalled) {
         timing = false;
-        end(Replies::drop, "no progress for too long");
+        end(Replies::drop, "it does not read its replies");
         return close();
     }
     if (!timer)

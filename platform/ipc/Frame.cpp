@@ -88,8 +88,14 @@ std::size_t FrameReader::missingOfHeld() const {
     const std::string_view held(held_.get() + heldBegin_, heldSize());
     if (held.size() < frameHeaderSize)
         return frameHeaderSize - held.size();
-    const std::size_t whole = frameHeaderSize + littleEndian<std::uint32_t>(held.data());
+    const std::size_t whole = begunFrame();
     return whole > held.size() ? whole - held.size() : 0;
+}
+
+std::size_t FrameReader::begunFrame() const noexcept {
+    if (heldSize() < frameHeaderSize)
+        return 0;
+    return frameHeaderSize + littleEndian<std::uint32_t>(held_.get() + heldBegin_);
 }
 
 // Makes room for some of `more` bytes behind the held ones: at most as much again as is there.

@@ -67,8 +67,8 @@ public:
     [[nodiscard]] std::expected<std::optional<Frame>, const char*> next();
     void keep();
 
-    // Bytes of frames that are not taken yet.
-    [[nodiscard]] std::size_t pending() const noexcept { return heldSize() + fresh_.size(); }
+    // The whole size of the frame that was begun, once its head is there; else 0. After `keep`.
+    [[nodiscard]] std::size_t begunFrame() const noexcept;
 
 private:
     struct Free {

@@ -117,8 +117,9 @@ void Listener::Impl::admit(UniqueFd accepted) {
         return;
     const auto account = accounts.of(peer->uid);
     if (!account->open(mostUserConnections)) {
-        ipcLog().error("user %u has too many connections; one of process %d is closed", peer->uid,
-                       peer->pid);
+        ipcLog().error(
+            "user %{public}u has too many connections; one of process %{public}d is closed",
+            peer->uid, peer->pid);
         return;
     }
     const auto connection = std::make_shared<Connection>(std::make_unique<Connection::Impl>(

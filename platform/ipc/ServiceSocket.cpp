@@ -42,6 +42,17 @@ std::string folderOf(const std::string& path) {
     return slash == std::string::npos ? "." : path.substr(0, slash == 0 ? 1 : slash);
 }
 
+// Makes the folder for everybody to pass through, whatever the umask; leaves one that is there.
+std::optional<Error> makeFolder(const std::string& folder) {
+    if (::access(folder.c_str(), F_OK) == 0)
+        return std::nullopt;
+    if (auto error = makeFolders(folder, folderMode))
+        return error;
+    if (::chmod(folder.c_str(), folderMode) != 0)
+        return posixError(errno, "chmod " + folder);
+    return std::nullopt;
+}
+
 std::expected<UniqueFd, Error> lockBeside(const std::string& path) {
     const std::string lockPath = path + ".lock";
     UniqueFd lock(::open(lockPath.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, lockMode));
@@ -74,7 +85,7 @@ std::expected<ServiceSocket, Error> ServiceSocket::bind(const std::string& path)
     const auto address = addressOf(path);
     if (!address)
         return std::unexpected(address.error());
-    if (auto error = makeFolders(folderOf(path), folderMode))
+    if (auto error = makeFolder(folderOf(path)))
         return std::unexpected(std::move(*error));
     auto lock = lockBeside(path);
     if (!lock)

@@ -2,12 +2,12 @@
 
 #include <atomic>
 #include <cstddef>
+#include <deque>
 #include <functional>
 #include <map>
 #include <memory>
 #include <mutex>
 #include <sys/types.h>
-#include <vector>
 
 namespace platform::ipc {
 
@@ -26,20 +26,29 @@ public:
 
     void add(std::size_t bytes) noexcept { waiting_.fetch_add(bytes); }
 
+    // Adds only what fits. REQUIRES: on the loop.
+    [[nodiscard]] bool reserve(std::size_t bytes) noexcept;
     void release(std::size_t bytes);
 
-    [[nodiscard]] bool full() const noexcept { return waiting_.load() >= mostWaiting_; }
+    // Whether so much more may wait; something always may when nothing does.
+    [[nodiscard]] bool fits(std::size_t bytes) const noexcept;
 
-    // Calls `retry` (on any thread) when the account is full no more; at once when it is not.
-    void whenRoom(std::move_only_function<void()> retry);
+    [[nodiscard]] bool full() const noexcept { return !fits(1); }
+
+    // Calls `retry` (on any thread) when something was released and `bytes` may fit; it asks again.
+    void whenFits(std::size_t bytes, std::move_only_function<void()> retry);
 
 private:
+    using Retries = std::deque<std::move_only_function<void()>>;
+
+    void wake(std::size_t most);
+
     const std::size_t mostWaiting_;
     std::atomic<std::size_t> connections_ = 0;
     std::atomic<std::size_t> waiting_ = 0;
-    std::mutex mutex_;
-    std::vector<std::move_only_function<void()>> retries_;
     std::atomic<bool> awaited_ = false;
+    std::mutex mutex_;
+    Retries retries_; // guarded
 };
 
 // The accounts of all users that are connected. Owned by the listener; used on its loop.
