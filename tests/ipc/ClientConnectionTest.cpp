@@ -10,42 +10,46 @@ using namespace platform;
 using namespace platform::ipc;
 using namespace tests;
 
-// A client whose replies and events are counted and kept.
+using Result = std::expected<Dictionary, ConnectionError>;
+
+// What a client's handlers saw. They share it, since they may be called when the test is over.
+struct Seen {
+    Counter replies;
+    Counter events;
+    std::vector<Result> results; // read after `replies` counted them
+    std::vector<ConnectionError> errors;
+};
+
 class ClientConnectionTest : public testing::Test {
 protected:
-    using Result = std::expected<Dictionary, ConnectionError>;
-
     void connect() {
         client_ = std::make_unique<ClientConnection>(path_, queue_);
-        client_->setEventHandler([this](ClientConnection::Event event) {
+        client_->setEventHandler([seen = seen_](ClientConnection::Event event) {
             if (const auto* error = std::get_if<ConnectionError>(&event))
-                errors_.push_back(*error);
-            events_.add();
+                seen->errors.push_back(*error);
+            seen->events.add();
         });
         client_->resume();
     }
 
     void ask(const Dictionary& body) {
-        client_->sendWithReply(body, [this](Result result) {
-            results_.push_back(std::move(result));
-            replies_.add();
+        client_->sendWithReply(body, [seen = seen_](Result result) {
+            seen->results.push_back(std::move(result));
+            seen->replies.add();
         });
     }
 
     Result askAndWait(const Dictionary& body) {
-        const int before = replies_.value();
+        const int before = seen_->replies.value();
         ask(body);
-        EXPECT_TRUE(replies_.reaches(before + 1));
-        return results_.back();
+        EXPECT_TRUE(seen_->replies.reaches(before + 1));
+        return seen_->results.back();
     }
 
     TemporaryFolder folder_;
     const std::string path_ = folder_.path() + "/run/service";
     std::shared_ptr<SerialQueue> queue_ = std::make_shared<SerialQueue>("client");
-    Counter replies_;
-    Counter events_;
-    std::vector<Result> results_; // on the queue, or after `replies_` counted them
-    std::vector<ConnectionError> errors_;
+    std::shared_ptr<Seen> seen_ = std::make_shared<Seen>();
     std::unique_ptr<ClientConnection> client_;
 };
 
@@ -54,9 +58,9 @@ TEST_F(ClientConnectionTest, RepliesComeInOrderOnTheTargetQueue) {
     connect();
     for (int i = 0; i < 1000; ++i)
         ask({{"number", i}});
-    ASSERT_TRUE(replies_.reaches(1000));
+    ASSERT_TRUE(seen_->replies.reaches(1000));
     for (int i = 0; i < 1000; ++i) {
-        const auto& result = results_[static_cast<std::size_t>(i)];
+        const auto& result = seen_->results[static_cast<std::size_t>(i)];
         ASSERT_TRUE(result);
         EXPECT_EQ(*result->find("number"), Value(i));
     }
@@ -80,10 +84,10 @@ TEST_F(ClientConnectionTest, PendingRequestsOfALostDaemonAreInterruptedOnce) {
         ask({{"a", i}});
     ASSERT_TRUE(server->requests.reaches(10));
     server.reset();
-    ASSERT_TRUE(replies_.reaches(10));
-    ASSERT_TRUE(events_.reaches(1));
-    EXPECT_EQ(replies_.value(), 10);
-    for (const auto& result : results_)
+    ASSERT_TRUE(seen_->replies.reaches(10));
+    ASSERT_TRUE(seen_->events.reaches(1));
+    EXPECT_EQ(seen_->replies.value(), 10);
+    for (const auto& result : seen_->results)
         EXPECT_EQ(result, Result(std::unexpected(ConnectionError::interrupted)));
     EXPECT_EQ(askAndWait({{"a", 1}}), Result(std::unexpected(ConnectionError::invalid)));
 }
@@ -99,7 +103,7 @@ TEST_F(ClientConnectionTest, FirstOfSeveralRepliesCounts) {
     connect();
     for (int i = 0; i < 3; ++i)
         EXPECT_EQ(*askAndWait({{"a", i}})->find("text"), Value("first"));
-    EXPECT_EQ(replies_.value(), 3);
+    EXPECT_EQ(seen_->replies.value(), 3);
 }
 
 TEST_F(ClientConnectionTest, AnswersTheGreetingBeforeItsFirstRequest) {
@@ -121,8 +125,8 @@ TEST_F(ClientConnectionTest, CancelAnswersPendingWithInvalid) {
     ask({{"a", 1}});
     ASSERT_TRUE(server.requests.reaches(1));
     client_->cancel();
-    ASSERT_TRUE(replies_.reaches(1));
-    EXPECT_EQ(results_[0], Result(std::unexpected(ConnectionError::invalid)));
+    ASSERT_TRUE(seen_->replies.reaches(1));
+    EXPECT_EQ(seen_->results[0], Result(std::unexpected(ConnectionError::invalid)));
     EXPECT_EQ(askAndWait({}), Result(std::unexpected(ConnectionError::invalid)));
     EXPECT_TRUE(server.gone.reaches(1));
 }
