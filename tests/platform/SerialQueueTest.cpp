@@ -155,11 +155,14 @@ TEST(SerialQueue, DropsABlocksBelongingsWhileItHoldsTheQueue) {
 
 TEST(SerialQueue, MayBeEnteredUpwardInRank) {
     SerialQueue service("service", QueueRank::service);
+    SerialQueue registry("registry", QueueRank::registry);
     SerialQueue leaf("leaf", QueueRank::leaf);
-    const bool both = service.sync(
-        [&] { return leaf.sync([&] { return service.isCurrent() && leaf.isCurrent(); }); });
-    EXPECT_TRUE(both);
-    EXPECT_FALSE(leaf.sync([&] { return service.tryRun([] {}); })) << "downward: refused";
+    const auto holdsAll = [&] {
+        return service.isCurrent() && registry.isCurrent() && leaf.isCurrent();
+    };
+    EXPECT_TRUE(service.sync([&] { return registry.sync([&] { return leaf.sync(holdsAll); }); }));
+    EXPECT_FALSE(leaf.sync([&] { return registry.tryRun([] {}); })) << "downward: refused";
+    EXPECT_FALSE(registry.sync([&] { return service.tryRun([] {}); }));
 }
 
 #ifndef NDEBUG

@@ -179,10 +179,9 @@ TEST(Array, CopiesOnlyWhenSharedAndChanged) {
 
 TEST(SharedBytes, ShareOneAllocation) {
     const SharedBytes original(std::string_view("abc\0d", 5));
-    const SharedBytes copy = original;
-    EXPECT_TRUE(copy.sameAllocation(original));
-    EXPECT_EQ(copy.size(), 5U);
     SharedBytes moved = original;
+    EXPECT_TRUE(moved.sameAllocation(original));
+    EXPECT_EQ(moved.size(), 5U);
     moved = SharedBytes(std::move(moved));
     EXPECT_EQ(moved, original);
     EXPECT_EQ(SharedBytes(), SharedBytes(std::string_view()));
