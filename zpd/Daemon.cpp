@@ -1,0 +1,144 @@
+#include "zpd/Daemon.h"
+
+#include <csignal>
+#include <cstdlib>
+#include <fcntl.h>
+#include <unistd.h>
+#include <utility>
+
+#include "AppRegistry/ARRegistry.h"
+#include "Zephrin/ZPDLog.h"
+#include "platform/container/FolderContainers.h"
+#include "platform/file/File.h"
+#include "platform/ipc/Loop.h"
+#include "platform/locale/SystemLocale.h"
+#include "platform/notify/FileNotifications.h"
+#include "platform/paths/Places.h"
+#include "platform/preferences/FilePreferences.h"
+#include "platform/process/ProcProcesses.h"
+#include "platform/sandbox/HmacSandbox.h"
+#include "platform/signing/UnsignedPrograms.h"
+#include "platform/types/DeclaredTypes.h"
+#include "zpd/Platform.h"
+#include "zpd/ZPDServer.h"
+
+using platform::UniqueFd;
+
+namespace {
+
+// So that no file or socket ever gets a number that somebody writes to as standard error.
+void openStandardDescriptors() {
+    int fd = -1;
+    do {
+        fd = ::open("/dev/null", O_RDWR);
+    } while (fd >= 0 && fd <= STDERR_FILENO);
+    if (fd >= 0)
+        ::close(fd);
+}
+
+} // namespace
+
+// In the order in which they are made; what comes later uses what came before.
+struct Daemon::Parts {
+    explicit Parts(platform::Places where);
+    void watchLocale();
+    [[nodiscard]] bool openRegistry();
+    [[nodiscard]] bool makeServer(const ZPDOptions& options);
+    [[noreturn]] void terminate();
+
+    const platform::Places places;
+    platform::ipc::Loop mainLoop{"main"};
+    platform::ProcProcesses processes;
+    platform::UnsignedPrograms signing;
+    platform::HmacSandbox sandbox;
+    platform::DeclaredTypes types;
+    platform::FilePreferences preferences;
+    platform::FileNotifications notifications;
+    platform::FolderContainers containers;
+    platform::SystemLocale locale;
+    std::unique_ptr<platform::ipc::Watch> localeWatch;
+    std::unique_ptr<ARRegistry> registry;
+    std::unique_ptr<ZPDServer> server;
+};
+
+Daemon::Parts::Parts(platform::Places where)
+    : places(std::move(where)),
+      types(places.types),
+      preferences(places.preferences),
+      notifications(places.notify),
+      containers(places.containers),
+      locale(places.locale) {}
+
+void Daemon::Parts::watchLocale() {
+    UniqueFd descriptor(::fcntl(locale.watchDescriptor(), F_DUPFD_CLOEXEC, 0));
+    if (descriptor) {
+        localeWatch =
+            mainLoop.watchDescriptor(std::move(descriptor), [this] { locale.handleEvents(); });
+    }
+}
+
+bool Daemon::Parts::openRegistry() {
+    auto opened = ARRegistry::open(places, locale, containers, types, signing);
+    if (!opened) {
+        ZPDLogOps().error("cannot open the registry: %{public}@", opened.error());
+        return false;
+    }
+    registry = std::move(*opened);
+    return true;
+}
+
+bool Daemon::Parts::makeServer(const ZPDOptions& options) {
+    const Platform platform{.processes = processes,
+                            .signing = signing,
+                            .sandbox = sandbox,
+                            .types = types,
+                            .preferences = preferences,
+                            .notifications = notifications,
+                            .containers = containers,
+                            .locale = locale,
+                            .workspace = *registry};
+    auto made = ZPDServer::create(platform, {.socketPath = places.socketPath(options.serviceName),
+                                             .databasePath = options.databasePath});
+    if (!made) {
+        ZPDLogOps().error("cannot serve %{public}@: %{public}@", options.serviceName, made.error());
+        return false;
+    }
+    server = std::move(*made);
+    return true;
+}
+
+void Daemon::Parts::terminate() {
+    server->stop();
+    platform::log::flush();
+    ::_exit(EXIT_SUCCESS); // as other threads may be at work
+}
+
+void Daemon::prepareProcess() {
+    openStandardDescriptors();
+    platform::log::configureFromEnvironment();
+    platform::ipc::raiseDescriptorLimit();
+    std::signal(SIGPIPE, SIG_IGN);
+}
+
+std::unique_ptr<Daemon> Daemon::create(const ZPDOptions& options) {
+    if (::geteuid() != 0)
+        ZPDLogOps().standard("not running as root: only this user's programs can be recognized");
+    auto parts = std::make_unique<Parts>(platform::Places::forThisProcess());
+    parts->watchLocale();
+    if (!parts->openRegistry() || !parts->makeServer(options))
+        return nullptr;
+    parts->server->setVerbose(options.verbose);
+    parts->server->setCacheLimit(options.cacheLimit);
+    return std::unique_ptr<Daemon>(new Daemon(std::move(parts)));
+}
+
+Daemon::Daemon(std::unique_ptr<Parts> parts) : parts_(std::move(parts)) {}
+
+Daemon::~Daemon() = default;
+
+void Daemon::run() {
+    parts_->mainLoop.onSignal(SIGTERM, [parts = parts_.get()] { parts->terminate(); });
+    parts_->server->resume();
+    parts_->mainLoop.run();
+    parts_->terminate();
+}
