@@ -118,7 +118,7 @@ public:
     // ---- Derived from the dictionaries; specs are strings in a sound plug-in
 
     [[nodiscard]] std::optional<platform::Dictionary> attributes() const;
-    [[nodiscard]] std::optional<std::string> version() const;
+    [[nodiscard]] virtual std::optional<std::string> version() const;
     // The version as a form carries it: "<none>" when there is none.
     [[nodiscard]] std::string exportedVersion() const;
     [[nodiscard]] std::optional<platform::Value> protocolSpec() const;
@@ -133,7 +133,7 @@ public:
     [[nodiscard]] bool isMultiplexed() const { return false; }
 
     [[nodiscard]] bool isHybrid() const;
-    [[nodiscard]] bool isDedicated() const;
+    [[nodiscard]] virtual bool isDedicated() const;
     [[nodiscard]] bool isData() const;
     // True for the older configuration style.
     // REQUIRES: the information dictionary has one of the two styles

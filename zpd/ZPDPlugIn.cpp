@@ -5,6 +5,8 @@
 #include "Zephrin/ZPDError.h"
 #include "Zephrin/ZPDLog.h"
 #include "zpd/Entitlements.h"
+#include "zpd/ZPDKeyPool.h"
+#include "zpd/ZPDPlugInInfo.h"
 
 using platform::Dictionary;
 using platform::Error;
@@ -35,9 +37,18 @@ std::int64_t wholeSeconds(platform::Date date) {
     return Value(date.secondsSinceEpoch).integerValue().value_or(0);
 }
 
-std::optional<Value> entry(const Dictionary* dictionary, std::string_view key) {
-    const Value* const found = dictionary ? dictionary->find(key) : nullptr;
-    return found ? std::optional(*found) : std::nullopt;
+// The plug-in dictionary, as the very object within the information dictionary where they are
+// equal: there are many records, and none should hold it twice.
+std::optional<Dictionary> sharedWith(const std::optional<Dictionary>& info,
+                                     std::optional<Dictionary> plugIn) {
+    const Value* const within = info ? info->find(InfoKey::extension) : nullptr;
+    if (plugIn && within && within->dictionary() && *within->dictionary() == *plugIn)
+        return *within->dictionary();
+    return plugIn;
+}
+
+std::optional<Value> copied(const Value* value) {
+    return value ? std::optional(*value) : std::nullopt;
 }
 
 } // namespace
@@ -60,7 +71,10 @@ ZPDPlugIn::Ptr ZPDPlugIn::create(const ARZephrinProxy::Ptr& proxy,
 bool ZPDPlugIn::setupWithProxy(const ARZephrinProxy::Ptr& proxy) {
     if (!setup(proxy->plugInIdentifier(), proxy->bundlePath(), std::nullopt, proxy->plugInUUID()))
         return false;
-    const auto plugInInfo = proxy->plugInDictionary();
+    setInfo(proxy->infoDictionary());
+    known_ = proxy;
+    const auto info = infoPlist();
+    const auto plugInInfo = sharedWith(info, proxy->plugInDictionary());
     setPlugInDictionary(plugInInfo);
     setLastModified(wholeSeconds(proxy->registrationDate()));
     setOnSystemVolume(proxy->isOnSystemPartition());
@@ -73,9 +87,7 @@ bool ZPDPlugIn::setupWithProxy(const ARZephrinProxy::Ptr& proxy) {
     setOriginalIdentifier(proxy->originalIdentifier());
     setEntitlements(proxy->entitlements());
     dataContainerPath_ = proxy->dataContainerPath();
-    infoPlist_ = proxy->infoDictionary();
-    known_ = proxy;
-    setHubProtocolVersion(hubProtocolVersionOf(plugInInfo, infoPlist_));
+    setHubProtocolVersion(hubProtocolVersionOf(plugInInfo, info));
     setContainingPath(containing ? std::optional(containing->bundlePath()) : std::nullopt);
     return true;
 }
@@ -98,15 +110,15 @@ std::optional<Uuid> ZPDPlugIn::arKnowledgeUUID() const {
 
 std::optional<Dictionary> ZPDPlugIn::infoPlist() const {
     const auto lock = locked();
-    return infoPlist_;
+    return info_ ? std::optional(info_->dictionary()) : std::nullopt;
 }
 
-std::optional<Dictionary> ZPDPlugIn::bundleInfoDictionary() const {
+std::shared_ptr<const ZPDPlugInInfo> ZPDPlugIn::currentInfo() const {
     const auto knowledge = context_.workspace.knowledge().uuid;
     const auto lock = locked();
     if (!knowledge || knowledge != arKnowledgeUUID_)
         refresh(knowledge);
-    return infoPlist_;
+    return info_;
 }
 
 void ZPDPlugIn::refresh(const std::optional<Uuid>& knowledge) const {
@@ -115,8 +127,7 @@ void ZPDPlugIn::refresh(const std::optional<Uuid>& knowledge) const {
     } else {
         ZPDLogAr().error("could not obtain fresh proxy for %@", uuid());
         known_.reset();
-        infoPlist_.reset();
-        forgetForm();
+        setInfo(std::nullopt);
     }
     arKnowledgeUUID_ = knowledge;
 }
@@ -124,24 +135,49 @@ void ZPDPlugIn::refresh(const std::optional<Uuid>& knowledge) const {
 // Most moves of the registry concern other plug-ins: then the very same entry, or an equal
 // dictionary, comes back, and nothing that was derived from it is thrown away.
 void ZPDPlugIn::takeInfo(const ARZephrinProxy::Ptr& proxy) const {
-    if (infoPlist_ && known_.lock() == proxy)
+    if (info_ && known_.lock() == proxy)
         return;
-    auto fresh = proxy->infoDictionary();
+    const auto fresh = proxy->infoDictionary();
     known_ = proxy;
-    if (infoPlist_ == fresh)
-        return;
-    infoPlist_ = std::move(fresh);
+    if (!info_ || !fresh || info_->dictionary() != *fresh)
+        setInfo(fresh);
+}
+
+void ZPDPlugIn::setInfo(const std::optional<Dictionary>& info) const {
+    info_.reset();
+    if (info)
+        info_ = std::make_shared<const ZPDPlugInInfo>(context_.keys.withSharedKeys(*info));
     forgetForm();
 }
 
+std::optional<Dictionary> ZPDPlugIn::bundleInfoDictionary() const {
+    const auto info = currentInfo();
+    return info ? std::optional(info->dictionary()) : std::nullopt;
+}
+
 std::optional<Value> ZPDPlugIn::infoKey(std::string_view key) const {
-    const auto info = bundleInfoDictionary();
-    return entry(info ? &*info : nullptr, key);
+    const auto info = currentInfo();
+    return info ? copied(info->infoKey(key)) : std::nullopt;
 }
 
 std::optional<Value> ZPDPlugIn::pluginKey(std::string_view key) const {
-    const auto extension = infoKey(InfoKey::extension);
-    return entry(extension ? extension->dictionary() : nullptr, key);
+    const auto info = currentInfo();
+    return info ? copied(info->pluginKey(key)) : std::nullopt;
+}
+
+std::optional<Value> ZPDPlugIn::attribute(std::string_view key) const {
+    const auto info = currentInfo();
+    return info ? copied(info->attribute(key)) : std::nullopt;
+}
+
+std::optional<std::string> ZPDPlugIn::version() const {
+    const auto info = currentInfo();
+    return info ? info->version() : std::nullopt;
+}
+
+bool ZPDPlugIn::isDedicated() const {
+    const auto info = currentInfo();
+    return info && info->isDedicated();
 }
 
 Dictionary ZPDPlugIn::prunedInfoDictionaryFor(const std::optional<Dictionary>& info) {
@@ -157,7 +193,7 @@ Dictionary ZPDPlugIn::prunedInfoDictionaryFor(const std::optional<Dictionary>& i
 
 std::optional<Value> ZPDPlugIn::valueForEntitlement(std::string_view key) const {
     const auto& held = entitlements();
-    return entry(held ? &*held : nullptr, key);
+    return held ? copied(held->find(key)) : std::nullopt;
 }
 
 bool ZPDPlugIn::hasEntitlement(std::string_view key) const {

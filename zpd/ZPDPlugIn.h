@@ -12,6 +12,7 @@
 #include "zpd/ZPDPlugInContext.h"
 
 class ZPDEntitlementHolder;
+class ZPDPlugInInfo;
 
 // The daemon's record of one plug-in: the shared record and what only the registry knows of it,
 // with an information dictionary that follows the registry. One that exists has a bundle path and
@@ -57,6 +58,9 @@ public:
     [[nodiscard]] std::optional<platform::Dictionary> bundleInfoDictionary() const override;
     [[nodiscard]] std::optional<platform::Value> infoKey(std::string_view key) const override;
     [[nodiscard]] std::optional<platform::Value> pluginKey(std::string_view key) const override;
+    [[nodiscard]] std::optional<platform::Value> attribute(std::string_view key) const override;
+    [[nodiscard]] std::optional<std::string> version() const override;
+    [[nodiscard]] bool isDedicated() const override;
     // Every entry but those with keys that begin with "DT".
     [[nodiscard]] static platform::Dictionary
     prunedInfoDictionaryFor(const std::optional<platform::Dictionary>& info);
@@ -121,10 +125,13 @@ private:
     explicit ZPDPlugIn(const ZPDPlugInContext& context) : context_(context) {}
 
     [[nodiscard]] bool setupWithProxy(const ARZephrinProxy::Ptr& proxy);
+    // The information as the registry has it now; empty when it has gone.
+    [[nodiscard]] std::shared_ptr<const ZPDPlugInInfo> currentInfo() const;
 
     // REQUIRES: the record's lock is held
     void refresh(const std::optional<platform::Uuid>& knowledge) const;
     void takeInfo(const ARZephrinProxy::Ptr& proxy) const;
+    void setInfo(const std::optional<platform::Dictionary>& info) const;
     void forgetForm() const;
 
     [[nodiscard]] std::optional<platform::Value> sharedResources() const;
@@ -145,6 +152,6 @@ private:
     // Guarded by the record's lock; refreshed behind const readers.
     mutable std::weak_ptr<const ARZephrinProxy> known_; // whose data this is
     mutable std::optional<platform::Uuid> arKnowledgeUUID_;
-    mutable std::optional<platform::Dictionary> infoPlist_;
+    mutable std::shared_ptr<const ZPDPlugInInfo> info_;
     mutable std::optional<KeptForm> keptForm_;
 };

@@ -2,11 +2,11 @@
 // what the host's own entitlement leaves it (rules for plug-ins), and the entitlement that the
 // plug-in asks of every host.
 
-#include "Zephrin/InfoKeys.h"
 #include "platform/log/Render.h"
 #include "zpd/Entitlements.h"
 #include "zpd/ZPDEntitlementHolder.h"
 #include "zpd/ZPDPlugIn.h"
+#include "zpd/ZPDPlugInInfo.h"
 
 using platform::Value;
 
@@ -25,7 +25,8 @@ std::optional<std::string> ZPDPlugIn::allowForClient(ZPDEntitlementHolder& clien
         if (!match(*allowed->dictionary()))
             return "the host's plug-in entitlement does not allow this plug-in";
     }
-    if (const auto required = pluginKey(InfoKey::hostEntitlement)) {
+    const auto info = currentInfo();
+    if (const Value* const required = info ? info->hostEntitlement() : nullptr) {
         const auto name = required->string();
         if (!name || !client.hasEntitlement(*name))
             return lacksEntitlement(*required);

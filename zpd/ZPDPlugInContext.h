@@ -10,6 +10,7 @@ class Types;
 } // namespace platform
 
 class ARApplicationWorkspace;
+class ZPDKeyPool;
 class ZPDPlugIn;
 
 // Where a record's stored annotation is looked up: the database.
@@ -27,4 +28,5 @@ struct ZPDPlugInContext {
     platform::Sandbox& sandbox;
     platform::Types& types;
     ZPDAnnotationSource& annotations;
+    ZPDKeyPool& keys;
 };

@@ -66,7 +66,7 @@ std::expected<Dictionary, Error> ZPDPlugIn::replyForm(const Dictionary& annotati
 // A form that lacks a grant is not kept: the next request asks for the grant again.
 std::expected<SharedBytes, Error> ZPDPlugIn::encodedReplyForm(const Dictionary& annotation) const {
     const auto lock = locked();
-    auto form = bundleInfoDictionary(); // forgets the kept form when the registry's entry moved
+    const auto info = currentInfo(); // forgets the kept form when the registry's entry moved
     if (keptForm_ && keptForm_->annotation.sameObject(annotation))
         return keptForm_->encoded;
     auto exported = exportForm();

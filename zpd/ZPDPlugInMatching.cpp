@@ -13,6 +13,7 @@
 #include "platform/value/NumericOrder.h"
 #include "zpd/AnnotationKeys.h"
 #include "zpd/ZPDPlugIn.h"
+#include "zpd/ZPDPlugInInfo.h"
 
 using platform::Array;
 using platform::Dictionary;
@@ -105,8 +106,9 @@ std::optional<Value> ZPDPlugIn::ruleValue(std::string_view key) const {
         return electionText();
     if (key == containingAppRule)
         return containingPath().transform([](const std::string& path) { return Value(path); });
-    auto value = attribute(key);
-    return value ? value : infoKey(key);
+    const auto info = currentInfo();
+    const Value* const property = info ? info->property(key) : nullptr;
+    return property ? std::optional(*property) : std::nullopt;
 }
 
 std::string ZPDPlugIn::electionText() const {

@@ -39,7 +39,7 @@ bool debugging(const platform::log::Category& category) {
 
 ZPDatabase::ZPDatabase(const Platform& platform, const std::optional<std::string>& databasePath)
     : platform_(platform),
-      context_{platform.workspace, platform.sandbox, platform.types, *this},
+      context_{platform.workspace, platform.sandbox, platform.types, *this, keys_},
       annotations_(databasePath, platform.containers),
       sync_("ZPDatabase", platform::QueueRank::leaf) {
     platform_.workspace.setObserver(this);

@@ -16,6 +16,7 @@
 #include "platform/value/Value.h"
 #include "zpd/Platform.h"
 #include "zpd/ZPDAnnotationStore.h"
+#include "zpd/ZPDKeyPool.h"
 #include "zpd/ZPDPlugIn.h"
 #include "zpd/ZPDPlugInContext.h"
 
@@ -109,6 +110,7 @@ private:
     [[nodiscard]] std::size_t cacheSize();
 
     const Platform platform_;
+    ZPDKeyPool keys_;
     const ZPDPlugInContext context_;
     std::atomic<ZPDatabaseDelegate*> delegate_ = nullptr;
     std::atomic<std::uint32_t> cacheLimit_ = defaultCacheLimit;

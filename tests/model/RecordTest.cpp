@@ -126,6 +126,16 @@ TEST(Record, PrunesDevelopmentKeys) {
     EXPECT_EQ(ZPDPlugIn::prunedInfoDictionaryFor(std::nullopt), Dictionary());
 }
 
+TEST(Record, SharesItsKeysWithOthers) {
+    RecordWorld world;
+    const auto one = world.record()->infoPlist().value();
+    const auto other = world.record()->infoPlist().value();
+    EXPECT_EQ(one, infoWith(extensionWith()));
+    ASSERT_EQ(one, other);
+    for (std::size_t i = 0; i < one.size(); ++i)
+        EXPECT_TRUE(one.begin()[i].key.sameAllocation(other.begin()[i].key));
+}
+
 // ---- Following the registry
 
 TEST(Refresh, AsksTheRegistryOnlyWhenItMoved) {

@@ -6,6 +6,7 @@
 #include <string>
 
 #include "tests/support/FakePlatform.h"
+#include "zpd/ZPDKeyPool.h"
 #include "zpd/ZPDPlugIn.h"
 
 // Plug-ins for the tests of the model: sound ones, to be spoilt by the test.
@@ -54,7 +55,9 @@ struct FakeAnnotations final : ZPDAnnotationSource {
 struct RecordWorld {
     FakePlatform platform;
     FakeAnnotations annotations;
-    ZPDPlugInContext context{platform.workspace, platform.sandbox, platform.types, annotations};
+    ZPDKeyPool keys;
+    ZPDPlugInContext context{platform.workspace, platform.sandbox, platform.types, annotations,
+                             keys};
 
     // The record of a plug-in that the registry knows.
     [[nodiscard]] ZPDPlugIn::Ptr record(const std::shared_ptr<FakePlugIn>& plugIn) {
