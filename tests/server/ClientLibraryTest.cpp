@@ -1,8 +1,6 @@
 // What ZPDaemonClient puts on the wire, and what it makes of replies.
 
-#include <chrono>
 #include <functional>
-#include <future>
 #include <memory>
 #include <optional>
 #include <stdexcept>
@@ -19,6 +17,7 @@
 #include "platform/ipc/Listener.h"
 #include "platform/ipc/Loop.h"
 #include "platform/paths/Places.h"
+#include "tests/server/Awaited.h"
 #include "tests/server/TemporaryHome.h"
 
 namespace {
@@ -77,9 +76,9 @@ protected:
     // The reply to what `call` sends.
     template <class Call>
     Reply replyTo(Call&& call) {
-        std::promise<Reply> arrived;
-        call(client_, [&](const Reply& reply) { arrived.set_value(reply); });
-        return arrived.get_future().get();
+        const Awaited<Reply> arrived;
+        call(client_, [arrived](const Reply& reply) { arrived.bring(reply); });
+        return arrived.get();
     }
 
     // What `call` sends, as it arrives.
@@ -113,6 +112,7 @@ TEST_F(ClientLibrary, SendsTheKeysOfEachRequest) {
         return keys;
     };
     using Block = ZPDaemonClient::ReplyBlock;
+
     const struct {
         std::function<void(ZPDaemonClient&, Block)> call;
         Dictionary sent;
@@ -146,30 +146,31 @@ TEST_F(ClientLibrary, SendsTheKeysOfEachRequest) {
         {[&](auto& c, Block b) { c.releaseHold(one_, std::move(b)); },
          envelope("lock", {{"uuids", Array{one_}}})},
     };
+
     for (const auto& test : cases)
         EXPECT_EQ(describe(sentBy(test.call)), describe(test.sent));
 }
 
 TEST_F(ClientLibrary, RepliesComeInOrderOnItsQueue) {
-    std::promise<std::string> all;
-    std::string seen;
+    const Awaited<int> last;
+    int seen = 0;
     constexpr int count = 50;
     for (int i = 0; i < count; ++i) {
-        client_.bulkPlugins(static_cast<std::uint64_t>(i), [&, i](const Reply& reply) {
+        client_.bulkPlugins(static_cast<std::uint64_t>(i), [&seen, last, i](const Reply& reply) {
             EXPECT_EQ(reply->find("echo")->dictionary()->find("flags")->integerValue(), i);
-            seen += 'x';
-            if (seen.size() == count)
-                all.set_value(seen);
+            EXPECT_EQ(seen, i);
+            if (++seen == count)
+                last.bring(seen);
         });
     }
-    EXPECT_EQ(all.get_future().get().size(), std::size_t{count});
+    EXPECT_EQ(last.get(), count);
 }
 
 TEST_F(ClientLibrary, AnAbsentDaemonIsAnErrorInTheReply) {
     ZPDaemonClient nobody("com.tovana.test.nobody");
-    std::promise<Reply> arrived;
-    nobody.bulkPlugins(0, [&](const Reply& reply) { arrived.set_value(reply); });
-    const auto error = ZPDaemonClient::errorInReply(arrived.get_future().get());
+    const Awaited<Reply> arrived;
+    nobody.bulkPlugins(0, [arrived](const Reply& reply) { arrived.bring(reply); });
+    const auto error = ZPDaemonClient::errorInReply(arrived.get());
     ASSERT_TRUE(error);
     EXPECT_EQ(error->domain, &ZPDErrorDomain);
     EXPECT_EQ(error->code, 4);
@@ -190,6 +191,7 @@ TEST(ErrorInReply, IsReadFromCodeAndText) {
         {{{"errorcode", 7}, {"error", 1}}, 7, "unknown error returned by Zephrin subsystem"},
         {{{"errorcode", "7"}}, 0, ""},
     };
+
     for (const auto& test : cases) {
         const auto error = ZPDaemonClient::errorInReply(test.reply);
         EXPECT_EQ(error ? error->code : 0, test.code) << describe(test.reply);

@@ -1,0 +1,122 @@
+#include <filesystem>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "Zephrin/ZPDError.h"
+#include "tests/server/ClientFixture.h"
+
+namespace {
+
+using platform::Array;
+using platform::Dictionary;
+using platform::Error;
+using platform::Value;
+using Seen = std::vector<std::pair<std::string, bool>>;
+
+class Transactions : public ClientFixture {
+protected:
+    static std::string failureIn(Transaction& transaction) {
+        const Value* const code = transaction.reply().find("errorcode");
+        return code ? describe(*code) + " " + textIn(transaction.reply(), "error") : "";
+    }
+
+    std::string failureAfterDispatch(const Dictionary& request) {
+        const auto t = transaction(request);
+        onServiceQueue([&] { t->dispatch(); });
+        return failureIn(*t);
+    }
+};
+
+TEST_F(Transactions, WalkTheirPaths) {
+    std::filesystem::create_directories(folder_ / "a");
+    std::filesystem::create_directories(folder_ / "b");
+    std::filesystem::create_directory_symlink(folder_ / "b", folder_ / "link");
+    const std::string b = folder_ / "b";
+    const std::string absent = folder_ / "absent/../b";
+    const std::string withNul = b + std::string("\0x", 2);
+    const std::string format = "4 invalid request format";
+
+    const struct {
+        Value paths;
+        Seen seen;
+        std::string failure;
+    } cases[] = {
+        {Array(), {}, ""},
+        {Array{folder_ / "a/../b", folder_ / "link/."}, {{b, true}, {b, true}}, ""},
+        {Array{absent}, {{absent, false}}, ""},
+        {Array{withNul}, {{withNul, false}}, ""},
+        {Array{b, "relative/x", b}, {{b, true}}, "9 absolute path required: relative/x"},
+        {Array{""}, {}, "9 absolute path required: "},
+        {Array{b, 5, b}, {{b, true}}, format},
+        {Value(b), {}, format},
+        {Value(nullptr), {}, format},
+    };
+
+    for (const auto& test : cases) {
+        const auto t = transaction({{"paths", test.paths}});
+        Seen seen;
+        const bool complete = t->marshalPaths([&](const std::string& path, bool resolved) {
+            seen.emplace_back(path, resolved);
+            return true;
+        });
+        EXPECT_EQ(seen, test.seen) << describe(test.paths);
+        EXPECT_EQ(failureIn(*t), test.failure) << describe(test.paths);
+        EXPECT_EQ(complete, test.failure.empty());
+    }
+    EXPECT_FALSE(transaction({})->marshalPaths([](const auto&, bool) { return true; }));
+}
+
+TEST_F(Transactions, StopAtThePathThatTheBlockRefuses) {
+    const auto t = transaction({{"paths", Array{"/", "/"}}});
+    int calls = 0;
+    EXPECT_FALSE(t->processPaths([&](const auto&, bool) {
+        ++calls;
+        t->fail(9, "invalid path");
+        return false;
+    }));
+    EXPECT_EQ(calls, 1);
+    EXPECT_EQ(failureIn(*t), "9 invalid path");
+}
+
+TEST_F(Transactions, ForwardTheirOwnErrorsAndMapOthers) {
+    const platform::ErrorDomain sameName{"Zephrin"};
+
+    const struct {
+        Error error;
+        std::string failure;
+    } cases[] = {
+        {ZPDErrorMake(12, "not acceptable"), "12 not acceptable"},
+        {{&sameName, 12, "foreign"}, "2 foreign"},
+        {{&platform::posixErrorDomain, 5, "disk"}, "2 disk"},
+    };
+
+    for (const auto& test : cases) {
+        const auto t = transaction({});
+        t->fail(2, test.error);
+        EXPECT_EQ(failureIn(*t), test.failure);
+    }
+}
+
+TEST_F(Transactions, OfADeadClientAreNotCarriedOut) {
+    const Dictionary find{{"version", 3}, {"request", "find"}};
+    EXPECT_EQ(failureAfterDispatch(find), "15 Cannot locate PlugIn");
+    disconnect();
+    EXPECT_EQ(failureAfterDispatch(find), "");
+    EXPECT_EQ(failureAfterDispatch({{"version", 3}}), "");
+    EXPECT_EQ(failureAfterDispatch({{"version", 9}}),
+              "7 unsupported protocol version 9 (current 3)")
+        << "the version is checked first";
+}
+
+TEST_F(Transactions, AreBriefWhenTheyFailAtOnceOrLookUpARecord) {
+    const auto isBrief = [&](Dictionary keys) { return transaction(std::move(keys))->isBrief(); };
+    EXPECT_TRUE(isBrief({{"version", 9}, {"request", "match"}}));
+    EXPECT_TRUE(isBrief({{"version", 3}}));
+    EXPECT_TRUE(isBrief({{"version", 3}, {"request", "nonsense"}}));
+    EXPECT_TRUE(isBrief({{"version", 3}, {"request", "find"}}));
+    EXPECT_FALSE(isBrief({{"version", 3}, {"request", "find"}, {"paths", "file:///"}}));
+    EXPECT_FALSE(isBrief({{"version", 3}, {"request", "match"}}));
+}
+
+} // namespace
