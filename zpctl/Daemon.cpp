@@ -6,7 +6,9 @@
 #include <utility>
 
 #include "Zephrin/FileURL.h"
+#include "platform/ipc/Listener.h"
 #include "platform/ipc/Message.h"
+#include "platform/paths/Places.h"
 
 namespace zpctl {
 
@@ -26,11 +28,17 @@ Failure noAnswer(std::chrono::milliseconds timeout) {
     return {Status::noDaemon, "the daemon did not answer within " + secondsText(timeout), {}};
 }
 
-Failure disconnected(ConnectionError error) {
-    const char* what = error == ConnectionError::interrupted
-                           ? "the daemon went away while it was asked"
-                           : "no daemon to talk to";
-    return {Status::noDaemon, what + (" (" + platform::ipc::describe(error) + ")"), {}};
+Failure disconnected(ConnectionError error, const std::string& socketPath) {
+    if (error == ConnectionError::interrupted)
+        return {Status::noDaemon, "the daemon went away while it was asked", {}};
+    const bool tooLong = socketPath.size() > platform::ipc::longestSocketPath;
+    const char* why = tooLong ? " (the path is too long for a socket)" : "";
+    return {Status::noDaemon, "no daemon at " + socketPath + why, {}};
+}
+
+std::string socketPathOf(const std::optional<std::string>& serviceName) {
+    const std::string usual(ZPDaemonClient::defaultServiceName);
+    return platform::Places::forThisProcess().socketPath(serviceName.value_or(usual));
 }
 
 Failure refused(const platform::Error& error) {
@@ -43,6 +51,9 @@ Failure unreadable(const char* what) {
 
 } // namespace
 
+Daemon::Daemon(const std::optional<std::string>& serviceName, std::chrono::milliseconds timeout)
+    : client_(serviceName), socketPath_(socketPathOf(serviceName)), timeout_(timeout) {}
+
 std::expected<Dictionary, Failure> Daemon::ask(const Request& request) {
     // Shared, because the reply may still come when nobody waits for it any more.
     const auto promise = std::make_shared<std::promise<ZPDaemonClient::Reply>>();
@@ -52,7 +63,7 @@ std::expected<Dictionary, Failure> Daemon::ask(const Request& request) {
         return std::unexpected(noAnswer(timeout_));
     ZPDaemonClient::Reply reply = arrival.get();
     if (!reply)
-        return std::unexpected(disconnected(reply.error()));
+        return std::unexpected(disconnected(reply.error(), socketPath_));
     if (const auto error = ZPDaemonClient::errorInReply(reply))
         return std::unexpected(refused(*error));
     return *std::move(reply);

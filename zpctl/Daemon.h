@@ -27,8 +27,7 @@ struct Failure {
 class Daemon {
 public:
     // No name is the usual service.
-    Daemon(std::optional<std::string> serviceName, std::chrono::milliseconds timeout)
-        : client_(std::move(serviceName)), timeout_(timeout) {}
+    Daemon(const std::optional<std::string>& serviceName, std::chrono::milliseconds timeout);
 
     // Forms of plug-ins; `flags` are the ZPDiscover bits.
     [[nodiscard]] std::expected<std::vector<platform::Dictionary>, Failure>
@@ -47,6 +46,7 @@ private:
     [[nodiscard]] std::expected<platform::Dictionary, Failure> askForForm(const Request& request);
 
     ZPDaemonClient client_;
+    const std::string socketPath_; // for messages
     const std::chrono::milliseconds timeout_;
 };
 

@@ -84,7 +84,8 @@ TEST_F(CommandLine, TellsWhenThereIsNoDaemon) {
         {"tree"}, {"match", "--flags", "0x5", "a=b"}, {"--service", "other", "find", "/x.appex"}};
     for (const auto& arguments : cases) {
         EXPECT_EQ(run(arguments), Status::noDaemon);
-        EXPECT_THAT(err_.str(), testing::StartsWith("zpctl: no daemon"));
+        EXPECT_THAT(err_.str(),
+                    testing::StartsWith("zpctl: no daemon at " + home_.string() + "/run/"));
     }
     EXPECT_EQ(run({"--json", "tree"}), Status::noDaemon);
     EXPECT_TRUE(nlohmann::json::parse(err_.str())["error"]["message"].is_string());
