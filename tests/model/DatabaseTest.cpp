@@ -219,7 +219,8 @@ TEST_F(DatabaseTest, ElectsEntitledPlugInsThatHaveNoElection) {
         {"no choice", 0, true, 1},
         {"refused", -1, true, -1},
         {"chosen", 3, true, 3},
-        {"any entitlement counts", std::nullopt, false, 1},
+        {"any that is held counts", std::nullopt, "no", 1},
+        {"false is not held", std::nullopt, false, std::nullopt},
     };
 
     for (const auto& c : cases) {
