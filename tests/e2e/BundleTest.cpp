@@ -57,10 +57,11 @@ std::string laughs() {
 }
 
 std::string deepInfo(int levels) {
-    Item deep = Item::array({});
+    std::string arrays;
     for (int i = 0; i < levels; ++i)
-        deep = Item::array({deep});
-    return xmlPlist(PlugIn{.info = Item::map({{"Deep", deep}})}.infoDictionary());
+        arrays = "<array>" + arrays + "</array>";
+    std::string info = xmlPlist(PlugIn{.info = Item::map({{"Deep", true}})}.infoDictionary());
+    return info.replace(info.find("<true/>"), std::string_view("<true/>").size(), arrays);
 }
 
 const std::vector<Case> spoilings = {

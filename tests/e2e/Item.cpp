@@ -103,6 +103,17 @@ Item Item::embedded() const {
     return decode(items_[0].text_);
 }
 
+bool operator==(const Item& a, const Item& b) {
+    if (a.kind_ != b.kind_ || a.items_.size() != b.items_.size())
+        return false;
+    if (a.kind_ != Item::Kind::map) {
+        return a.number_ == b.number_ && a.real_ == b.real_ && a.text_ == b.text_ &&
+               a.items_ == b.items_;
+    }
+    return std::all_of(a.keys_.begin(), a.keys_.end(),
+                       [&](const std::string& key) { return b.has(key) && a[key] == b[key]; });
+}
+
 std::string head(unsigned major, std::uint64_t argument) {
     const auto initial = [&](unsigned low) { return std::string(1, char(major << 5 | low)); };
     if (argument < 24)

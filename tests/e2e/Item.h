@@ -72,7 +72,8 @@ public:
     // The item inside tag 24; throws when this is not a tag 24 of one whole item.
     [[nodiscard]] Item embedded() const;
 
-    friend bool operator==(const Item&, const Item&) = default;
+    // Maps are equal in any order of their keys.
+    friend bool operator==(const Item& a, const Item& b);
     friend std::ostream& operator<<(std::ostream& out, const Item& item);
 
 private:
