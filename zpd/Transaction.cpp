@@ -58,25 +58,31 @@ bool Transaction::supportsVersion(std::uint64_t version) {
     return (version & ~std::uint64_t{1}) == 2;
 }
 
+const Transaction::RequestType* Transaction::known(std::string_view type) {
+    const auto found = std::ranges::find(requestTypes, type, &RequestType::type);
+    return found == std::end(requestTypes) ? nullptr : found;
+}
+
 void Transaction::route(const std::optional<std::string_view>& type) {
     if (!type)
         return fail(ZPDErrorCode::invalidRequest, "invalid request format (missing type)");
-    const auto known = std::ranges::find(requestTypes, *type, &RequestType::type);
-    if (known == std::end(requestTypes))
+    const RequestType* const row = known(*type);
+    if (!row)
         return fail(ZPDErrorCode::invalidRequest, "unrecognized request");
-    (this->*known->handler)();
+    (this->*row->handler)();
 }
 
-// A look-up of a record by UUID, or a request that fails in its envelope. Everything else may have
-// to read many records, or files.
+// A request that fails in its envelope, or asks for a record that was made already. Everything
+// else may have to make records, or to read files.
 bool Transaction::isBrief() const {
-    if (!supportsVersion(unsignedFor("version")))
-        return true;
     const auto type = stringFor("request");
-    if (!type ||
-        std::ranges::find(requestTypes, *type, &RequestType::type) == std::end(requestTypes))
+    if (!supportsVersion(unsignedFor("version")) || !type || !known(*type))
         return true;
-    return *type == "find" && !request().contains("paths");
+    if (*type != "find" || request().contains("paths"))
+        return false;
+    const Value* const value = request().find("uuids");
+    const auto uuid = value ? value->uuid() : std::nullopt;
+    return !uuid || server().hasAtHand(*uuid);
 }
 
 std::optional<std::string_view> Transaction::stringFor(std::string_view key) const {

@@ -81,6 +81,8 @@ private:
     [[nodiscard]] static bool supportsVersion(std::uint64_t version);
     [[nodiscard]] std::optional<std::string_view> stringFor(std::string_view key) const;
     [[nodiscard]] std::uint64_t unsignedFor(std::string_view key) const;
+    // The row of a type; nothing for an unknown one.
+    [[nodiscard]] static const RequestType* known(std::string_view type);
     void route(const std::optional<std::string_view>& type);
     [[nodiscard]] bool marshalPath(const platform::Value& entry, const PathBlock& block);
 

@@ -117,6 +117,11 @@ ZPDPlugIn::Ptr ZPDatabase::findPlugIn(const Uuid& uuid) {
     });
 }
 
+bool ZPDatabase::hasAtHand(const Uuid& uuid) {
+    bool cached = false;
+    return sync_.tryRun([&] { cached = cache_.contains(uuid); }) && cached;
+}
+
 ZPDPlugIn::Ptr ZPDatabase::findPlugInAtPath(std::string_view canonicalPath) {
     const auto proxy = platform_.workspace.zephrinProxyForPath(canonicalPath);
     if (proxy)

@@ -67,6 +67,9 @@ public:
     [[nodiscard]] std::optional<PlugIns>
     findPlugIns(const std::optional<platform::Dictionary>& query);
     [[nodiscard]] ZPDPlugIn::Ptr findPlugIn(const platform::Uuid& uuid);
+    // True when `findPlugIn` would find a record made already, and nobody uses the cache just now.
+    // Never waits; a hint only.
+    [[nodiscard]] bool hasAtHand(const platform::Uuid& uuid);
     [[nodiscard]] ZPDPlugIn::Ptr findPlugInAtPath(std::string_view canonicalPath);
     // Nothing when the application is unknown or has no plug-ins.
     [[nodiscard]] std::optional<PlugIns> plugInsWithinApplication(std::string_view canonicalPath);

@@ -109,14 +109,27 @@ TEST_F(Transactions, OfADeadClientAreNotCarriedOut) {
         << "the version is checked first";
 }
 
-TEST_F(Transactions, AreBriefWhenTheyFailAtOnceOrLookUpARecord) {
-    const auto isBrief = [&](Dictionary keys) { return transaction(std::move(keys))->isBrief(); };
-    EXPECT_TRUE(isBrief({{"version", 9}, {"request", "match"}}));
-    EXPECT_TRUE(isBrief({{"version", 3}}));
-    EXPECT_TRUE(isBrief({{"version", 3}, {"request", "nonsense"}}));
-    EXPECT_TRUE(isBrief({{"version", 3}, {"request", "find"}}));
-    EXPECT_FALSE(isBrief({{"version", 3}, {"request", "find"}, {"paths", "file:///"}}));
-    EXPECT_FALSE(isBrief({{"version", 3}, {"request", "match"}}));
+TEST_F(Transactions, AreBriefWhenTheyFailAtOnceOrFindARecordThatIsThere) {
+    const auto known = addPlugIn("a")->uuid;
+    const auto unknown = addPlugIn("b")->uuid;
+    ASSERT_TRUE(server().findPlugIn(known));
+
+    const struct {
+        Dictionary request;
+        bool brief;
+    } cases[] = {
+        {{{"version", 9}, {"request", "match"}}, true},
+        {{{"version", 3}}, true},
+        {{{"version", 3}, {"request", "nonsense"}}, true},
+        {{{"version", 3}, {"request", "find"}}, true},
+        {{{"version", 3}, {"request", "find"}, {"uuids", known}}, true},
+        {{{"version", 3}, {"request", "find"}, {"uuids", unknown}}, false},
+        {{{"version", 3}, {"request", "find"}, {"paths", "file:///"}}, false},
+        {{{"version", 3}, {"request", "match"}}, false},
+    };
+
+    for (const auto& test : cases)
+        EXPECT_EQ(transaction(test.request)->isBrief(), test.brief) << describe(test.request);
 }
 
 } // namespace
