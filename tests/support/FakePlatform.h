@@ -2,6 +2,7 @@
 
 #include <functional>
 #include <map>
+#include <mutex>
 #include <string>
 #include <vector>
 
@@ -122,9 +123,15 @@ struct FakePreferences final : platform::Preferences {
 };
 
 struct FakeNotifications final : platform::Notifications {
-    std::vector<std::string> posted;
+    std::vector<std::string> posted; // read when nobody posts
 
-    void post(std::string_view name) override { posted.emplace_back(name); }
+    void post(std::string_view name) override {
+        const std::lock_guard lock(mutex_);
+        posted.emplace_back(name);
+    }
+
+private:
+    std::mutex mutex_;
 };
 
 struct FakeContainers final : platform::Containers {
