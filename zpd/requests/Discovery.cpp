@@ -8,6 +8,7 @@
 #include "Zephrin/ZPDLog.h"
 #include "Zephrin/ZPDaemonClient.h"
 #include "platform/sandbox/Sandbox.h"
+#include "zpd/Entitlements.h"
 #include "zpd/Transaction.h"
 #include "zpd/ZPDIpcClient.h"
 #include "zpd/ZPDServer.h"
@@ -18,9 +19,6 @@ using platform::SharedBytes;
 using platform::Value;
 
 namespace {
-
-// The privileged clients of the daemon.
-constexpr std::string_view managerEntitlement = "com.tovana.private.zephrin.manager";
 
 std::optional<std::string> plugInsPathOf(const ZPDIpcClient& client) {
     return client.bundle() ? client.bundle()->plugInsPath() : std::nullopt;
@@ -46,7 +44,7 @@ void Transaction::matchPlugIns() {
 
 // Asks for the sandbox only where the entitlement is held.
 bool Transaction::mayDiscoverAll() const {
-    return client().hasEntitlement(managerEntitlement) &&
+    return client().hasEntitlement(Entitlement::manager) &&
            !server().services().sandbox.isSandboxed(client().pid());
 }
 

@@ -1,6 +1,7 @@
 // Discovery, third part: one registration per identifier, replacements, and the reply's forms.
 
 #include "Zephrin/ZPDLog.h"
+#include "zpd/Entitlements.h"
 #include "zpd/Transaction.h"
 #include "zpd/requests/Discovery.h"
 
@@ -9,8 +10,6 @@ using platform::SharedBytes;
 using platform::Value;
 
 namespace {
-
-constexpr std::string_view replacementEntitlement = "com.tovana.developer.replace-plugin";
 
 Deduplication::Registration registrationOf(const ZPDPlugIn& plugIn) {
     return {.identifier = plugIn.identifier(),
@@ -40,7 +39,7 @@ void Discovery::take(const ZPDPlugIn::Ptr& plugIn) {
 // Of several plug-ins that replace one identifier the last one counts, and goes on to count when
 // a better registration displaces it later.
 void Discovery::declareReplacements(const ZPDPlugIn& plugIn, std::size_t match) {
-    const auto declared = plugIn.valueForEntitlement(replacementEntitlement);
+    const auto declared = plugIn.valueForEntitlement(Entitlement::replacePlugIn);
     if (!declared)
         return;
     if (const auto identifier = declared->string())
