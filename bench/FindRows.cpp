@@ -35,8 +35,10 @@ class Flood {
 public:
     Flood(const Run& run, const Rig& rig, const std::string& request, std::size_t reply)
         : pid_(fork()) {
-        if (pid_ != 0)
+        if (pid_ != 0) {
+            std::this_thread::sleep_for(std::chrono::milliseconds(200)); // until it is at work
             return;
+        }
         prctl(PR_SET_PDEATHSIG, SIGKILL);
         run.cores.stepAside();
         const e2e::WireClient client(rig.daemon().socketPath());
