@@ -55,16 +55,22 @@ std::optional<std::string> ZPBundle::executablePath() const {
 }
 
 std::optional<platform::Dictionary> ZPBundle::infoDictionary() const {
-    const auto& info = reader_.infoDictionary();
+    const auto& info = reader_.info();
     if (!info) {
         ZPDLogOps().info("failed to retrieve Info.plist for %@ through %@", path().value_or(""),
                          static_cast<const void*>(&reader_));
+        return std::nullopt;
     }
-    return info;
+    if (!info->dictionary()) {
+        ZPDLogOps().info("failed to convert Info.plist to dictionary: %@ source=%@",
+                         path().value_or(""), *info);
+        return std::nullopt;
+    }
+    return *info->dictionary();
 }
 
 std::optional<std::string> ZPBundle::bundleIdentifier() const {
-    const auto& info = reader_.infoDictionary();
+    const platform::Dictionary* info = reader_.infoDictionary();
     const platform::Value* identifier = info ? info->find(identifierKey) : nullptr;
     const auto text = identifier ? identifier->string() : std::nullopt;
     return text ? std::optional<std::string>(*text) : std::nullopt;

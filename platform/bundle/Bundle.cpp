@@ -26,16 +26,12 @@ std::expected<BundleReader, Error> BundleReader::read(const std::string& path) {
     const auto content = readRegularFile(*canonical + std::string(infoName), largestInfo);
     if (!content)
         return std::unexpected(content.error());
-    const auto info = plist::parse(content->bytes);
+    auto info = plist::parse(content->bytes);
     if (!info)
         return std::unexpected(info.error());
-    if (!info->dictionary()) {
-        return std::unexpected(
-            Error{&formatErrorDomain, formatErrorCorrupt, "property list: not a dictionary"});
-    }
     BundleReader bundle;
     bundle.path_ = *canonical;
-    bundle.info_ = *info->dictionary();
+    bundle.info_ = std::move(*info);
     return bundle;
 }
 
@@ -58,7 +54,8 @@ BundleReader BundleReader::forExecutable(const std::string& path) {
 }
 
 std::optional<std::string> BundleReader::executablePath() const {
-    const Value* value = info_ ? info_->find(executableKey) : nullptr;
+    const Dictionary* info = infoDictionary();
+    const Value* value = info ? info->find(executableKey) : nullptr;
     const auto name = value ? value->string() : std::nullopt;
     if (!name || !isPlainName(*name))
         return std::nullopt;

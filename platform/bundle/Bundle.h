@@ -19,7 +19,7 @@ public:
     // A larger Info.plist is not read.
     static constexpr std::size_t largestInfo = 1024 * 1024;
 
-    // The bundle at a directory path, or why there is none that can be read.
+    // The bundle at a directory path, or why there is none: no property list can be read.
     [[nodiscard]] static std::expected<BundleReader, Error> read(const std::string& path);
     // The same; invalid when there is none.
     [[nodiscard]] static BundleReader atPath(const std::string& path);
@@ -29,13 +29,18 @@ public:
     // The executable path is there only when the bundle names a regular file right in its folder.
     [[nodiscard]] std::optional<std::string> stringProperty(Property property) const;
 
-    [[nodiscard]] const std::optional<Dictionary>& infoDictionary() const { return info_; }
+    // What Info.plist holds; in a sound bundle a dictionary.
+    [[nodiscard]] const std::optional<Value>& info() const { return info_; }
+
+    [[nodiscard]] const Dictionary* infoDictionary() const {
+        return info_ ? info_->dictionary() : nullptr;
+    }
 
 private:
     [[nodiscard]] std::optional<std::string> executablePath() const;
 
     std::optional<std::string> path_; // canonical
-    std::optional<Dictionary> info_;
+    std::optional<Value> info_;
 };
 
 } // namespace platform

@@ -4,6 +4,7 @@
 #include "platform/plist/PropertyList.h"
 #include "tests/platform/TestFolder.h"
 
+using platform::Array;
 using platform::Dictionary;
 
 namespace {
@@ -46,6 +47,14 @@ TEST_F(BundleTest, IsFoundByItsFolderAndByItsExecutable) {
 TEST_F(BundleTest, WithoutExecutableHasItsOwnPathForIt) {
     const auto bundle = ZPBundle::atPath(app + "/PlugIns/Y.appex");
     EXPECT_EQ(bundle.executablePath(), app + "/PlugIns/Y.appex");
+    EXPECT_EQ(bundle.bundleIdentifier(), std::nullopt);
+}
+
+TEST_F(BundleTest, WhoseInfoIsNoDictionaryHasAPathAndNoInfo) {
+    folder.write("List.app/Info.plist", *platform::plist::writeXml(Array{1}));
+    const auto bundle = ZPBundle::atPath(folder / "List.app");
+    EXPECT_EQ(bundle.path(), folder / "List.app");
+    EXPECT_EQ(bundle.infoDictionary(), std::nullopt);
     EXPECT_EQ(bundle.bundleIdentifier(), std::nullopt);
 }
 
