@@ -1,5 +1,6 @@
 #include "zpd/ZPDAnnotationStore.h"
 
+#include <cerrno>
 #include <unistd.h>
 
 #include "Zephrin/FileURL.h"
@@ -22,7 +23,7 @@ constexpr std::int64_t storeVersion = 16;
 constexpr const char* versionKey = "version";
 constexpr const char* dataKey = "data";
 
-constexpr const char* globalFolder = "/var/db";
+constexpr const char* globalStore = "/var/db/Zephrin-Annotations";
 constexpr const char* storeFile = "/Zephrin-Annotations";
 constexpr const char* olderContainer = "com.tovana.zpd";
 constexpr unsigned globalFolderMode = 0755;
@@ -92,7 +93,7 @@ std::string folderOf(const std::string& path) {
 // ---- Places
 
 std::string ZPDAnnotationStore::globalPath() {
-    return std::string(globalFolder) + storeFile;
+    return globalStore;
 }
 
 std::string ZPDAnnotationStore::defaultDatabasePath() {
@@ -107,6 +108,19 @@ std::expected<std::string, Error> ZPDAnnotationStore::containerPath() const {
     ZPDLogOps().error("failed to get storage container: error=%llu", code);
     return std::unexpected(ZPDErrorMakeFormat(container.error().code,
                                               "unable to locate user container: error %llu", code));
+}
+
+std::expected<std::string, Error> ZPDAnnotationStore::confstrPath(int name) {
+    constexpr std::size_t room = 1024; // bytes, the closing NUL included
+    char text[room];
+    errno = 0;
+    const std::size_t size = ::confstr(name, text, room);
+    if (size != 0 && size <= room)
+        return std::string(text, size - 1);
+    const int number = errno;
+    ZPDLogOps().error("failed to obtain user directory: errno=%d", number);
+    return std::unexpected(
+        ZPDErrorMakeFormat(number, "unable to locate user directory: errno %d", number));
 }
 
 // ---- Loading
@@ -150,10 +164,10 @@ std::optional<Error> ZPDAnnotationStore::loadDb(const std::string& path) {
 // Makes the usual folder where it is missing, and says now, rather than at the first change, when
 // nothing can be written.
 void ZPDAnnotationStore::prepareFolder(bool usualPlace) const {
+    const std::string folder = folderOf(path_);
     std::optional<Error> failure;
     if (usualPlace)
-        failure = platform::makeFolders(globalFolder, globalFolderMode);
-    const std::string folder = folderOf(path_);
+        failure = platform::makeFolders(folder, globalFolderMode);
     if (!failure && ::access(folder.c_str(), W_OK | X_OK) != 0)
         failure = platform::posixError(errno, folder);
     if (failure) {

@@ -27,6 +27,8 @@ public:
 
     [[nodiscard]] static std::string defaultDatabasePath();
     [[nodiscard]] static std::string globalPath();
+    // The path that the system names in a configuration string (confstr(3), _CS_ constants).
+    [[nodiscard]] static std::expected<std::string, platform::Error> confstrPath(int name);
 
     [[nodiscard]] const std::string& annotationsPath() const { return path_; }
 

@@ -1,5 +1,7 @@
 #include "zpd/ZPDatabase.h"
 
+#include <type_traits>
+
 #include "Zephrin/Collections.h"
 #include "Zephrin/ZPDError.h"
 #include "Zephrin/ZPDLog.h"
@@ -200,6 +202,8 @@ ZPDPlugIn::Ptr ZPDatabase::plugInForCandidate(const ARZephrinProxy::Ptr& proxy) 
         return nullptr;
     }
     const auto containing = proxy->containingBundle();
+    static_assert(std::is_same_v<decltype(containing), const ARApplicationProxy::Ptr>,
+                  "AR reported containingBundle is not an application");
     if (containing && containing->isPlaceholder()) {
         ZPDLogOps().info("skipping ar proxy %@ because its app is a placeholder", *proxy);
         return nullptr;

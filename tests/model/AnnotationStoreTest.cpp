@@ -1,6 +1,7 @@
 #include <filesystem>
 #include <fstream>
 #include <sstream>
+#include <unistd.h>
 
 #include <gmock/gmock.h>
 
@@ -76,6 +77,8 @@ TEST_F(StoreTest, StartsEmptyWithoutAFile) {
 
 TEST_F(StoreTest, KeepsItsUsualPlace) {
     EXPECT_EQ(ZPDAnnotationStore::defaultDatabasePath(), "/var/db/Zephrin-Annotations");
+    EXPECT_EQ(ZPDAnnotationStore::confstrPath(_CS_PATH), "/bin:/usr/bin");
+    EXPECT_FALSE(ZPDAnnotationStore::confstrPath(-1));
 }
 
 TEST_F(StoreTest, MergesAndSavesWhatIsSet) {

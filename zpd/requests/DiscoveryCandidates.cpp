@@ -2,6 +2,7 @@
 
 #include "Zephrin/ZPDLog.h"
 #include "platform/log/Log.h"
+#include "platform/log/Render.h"
 #include "platform/probe/Probes.h"
 #include "platform/process/Processes.h"
 #include "zpd/Transaction.h"
@@ -21,7 +22,8 @@ constexpr const char* ignoringRival =
 constexpr std::size_t pathRoom = 1024; // bytes, the closing NUL included
 
 std::string candidateLine(const ZPDPlugIn& plugIn) {
-    return plugIn.identifier() + '(' + plugIn.exportedVersion() + ") " + plugIn.uuid().text();
+    return platform::log::renderText("%@(%@) %@", plugIn.identifier(), plugIn.exportedVersion(),
+                                     plugIn.uuid());
 }
 
 bool isWithin(const std::string& path, const std::optional<std::string>& container) {
