@@ -48,6 +48,7 @@ struct SerialQueue::State {
     // One place in line: a block for the worker, or a thread that waits to run its own.
     struct Place {
         Block block;
+        Block afterwards;
         Waiter* waiter = nullptr;
     };
 
@@ -66,6 +67,7 @@ struct SerialQueue::State {
 
     void passOn();
     void work();
+    static void runUnlocked(Block& block, std::unique_lock<std::mutex>& lock);
     void startWorker(const std::shared_ptr<State>& self);
 
     bool workerTurn() const { return !busy && !line.empty() && !line.front().waiter; }
@@ -89,24 +91,35 @@ void SerialQueue::State::passOn() {
     next->turn.notify_one();
 }
 
+// The lock is held again afterwards.
+void SerialQueue::State::runUnlocked(Block& block, std::unique_lock<std::mutex>& lock) {
+    if (!block)
+        return;
+    lock.unlock();
+    block();
+    block = nullptr;
+    lock.lock();
+}
+
 void SerialQueue::State::work() {
     std::unique_lock lock(mutex);
     for (;;) {
         workerWake.wait(lock, [&] { return workerTurn() || (closing && line.empty() && !busy); });
         if (!workerTurn())
             return;
-        Block block = std::move(line.front().block);
+        Place place = std::move(line.front());
         line.pop_front();
         busy = true;
         lock.unlock();
         push(this, rank);
-        block();
-        block = nullptr; // what the block owns goes while the queue is held
+        place.block();
+        place.block = nullptr; // what the block owns goes while the queue is held
         pop(this);
         lock.lock();
         busy = false;
         if (!workerTurn())
             passOn();
+        runUnlocked(place.afterwards, lock);
     }
 }
 
@@ -143,10 +156,10 @@ const std::string& SerialQueue::name() const noexcept {
     return state_->name;
 }
 
-void SerialQueue::async(Block block) {
+void SerialQueue::async(Block block, Block afterwards) {
     const std::lock_guard lock(state_->mutex);
     assert(!state_->closing);
-    state_->line.push_back({std::move(block), nullptr});
+    state_->line.push_back({std::move(block), std::move(afterwards), nullptr});
     state_->startWorker(state_);
     if (state_->workerTurn() && state_->line.size() == 1)
         state_->workerWake.notify_one();
@@ -157,7 +170,7 @@ void SerialQueue::enter() {
     std::unique_lock lock(state_->mutex);
     if (state_->busy || !state_->line.empty()) {
         State::Waiter waiter;
-        state_->line.push_back({{}, &waiter});
+        state_->line.push_back({{}, {}, &waiter});
         waiter.turn.wait(lock, [&] { return waiter.granted; });
     } else {
         state_->busy = true;

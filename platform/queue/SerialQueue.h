@@ -36,7 +36,8 @@ public:
 
     [[nodiscard]] const std::string& name() const noexcept;
 
-    void async(Block block);
+    // `afterwards` runs on the same thread once the queue was let go: it may find it idle.
+    void async(Block block, Block afterwards = {});
 
     // Runs `block` on the calling thread when the queue is idle and nothing is queued, and tells
     // that it did; otherwise does nothing. Never waits.
