@@ -71,6 +71,7 @@ private:
 
     void handle(platform::ipc::Event event);
     void handleRequest(platform::ipc::Message message);
+    // REQUIRES: on the service queue
     void carryOut(Transaction& transaction);
     void dying();
     void dead();

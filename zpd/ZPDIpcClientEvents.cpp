@@ -16,6 +16,18 @@ using platform::ipc::ConnectionError;
 using platform::ipc::Event;
 using platform::ipc::Message;
 
+namespace {
+
+// A client that sends one brief request after the other goes on upon the loop, where all clients
+// take turns, also when one of them had to wait for the queue's own thread.
+void letNextIn(ZPDServer& server, const std::shared_ptr<Transaction>& transaction, bool wasBrief) {
+    if (!wasBrief || server.ipcLoop().isCurrent())
+        return transaction->taken();
+    server.ipcLoop().post([transaction] { transaction->taken(); });
+}
+
+} // namespace
+
 void ZPDIpcClient::handle(Event event) {
     if (auto* const message = std::get_if<Message>(&event))
         return handleRequest(std::move(*message));
@@ -35,13 +47,13 @@ void ZPDIpcClient::handleRequest(Message message) {
     auto transaction = std::make_shared<Transaction>(std::move(message), shared_from_this());
     if (platform::probe::requestInputEnabled())
         platform::probe::requestInput(pid(), platform::describe(transaction->request()).c_str());
-    const auto work = transaction->isBrief() ? ZPDServer::Work::brief : ZPDServer::Work::any;
-    server_.submitWork([client = shared_from_this(),
-                        transaction = std::move(transaction)] { client->carryOut(*transaction); },
-                       work);
+    const bool brief = transaction->isBrief();
+    server_.submitWork(
+        [client = shared_from_this(), transaction] { client->carryOut(*transaction); },
+        brief ? ZPDServer::Work::brief : ZPDServer::Work::any,
+        [&server = server_, transaction, brief] { letNextIn(server, transaction, brief); });
 }
 
-// REQUIRES: on the service queue
 void ZPDIpcClient::carryOut(Transaction& transaction) {
     constexpr std::uint32_t countedEvery = 1000;
     server_.assertOnServiceQueue();
@@ -50,7 +62,6 @@ void ZPDIpcClient::carryOut(Transaction& transaction) {
     vouched_ = transaction.isVouchedFor();
     transaction.dispatch();
     vouched_ = false;
-    transaction.taken();
 }
 
 void ZPDIpcClient::dying() {

@@ -66,8 +66,12 @@ public:
         brief, // may run at once on the calling thread when the queue is idle
     };
 
-    // Runs a block on the service queue, after all that came before. Any thread.
-    void submitWork(platform::SerialQueue::Block block, Work work = Work::any);
+    // Runs a block on the service queue, after all that came before, and then `afterwards` on the
+    // same thread, once the queue was let go. Any thread.
+    void submitWork(platform::SerialQueue::Block block, Work work = Work::any,
+                    platform::SerialQueue::Block afterwards = {});
+
+    [[nodiscard]] platform::ipc::Loop& ipcLoop() { return ipcLoop_; }
 
     void assertOnServiceQueue() const { mainQueue_.assertOnQueue(); }
 
