@@ -4,33 +4,47 @@
 
 namespace bench {
 
+namespace {
+
+void pinTo(int core, int another) {
+    cpu_set_t chosen;
+    CPU_ZERO(&chosen);
+    CPU_SET(core, &chosen);
+    CPU_SET(another, &chosen);
+    sched_setaffinity(0, sizeof chosen, &chosen);
+}
+
+} // namespace
+
 CoreChoice::CoreChoice() {
-    CPU_ZERO(&all_);
-    sched_getaffinity(0, sizeof all_, &all_);
+    cpu_set_t all;
+    CPU_ZERO(&all);
+    sched_getaffinity(0, sizeof all, &all);
     for (int core = 0; core < CPU_SETSIZE; ++core) {
-        if (!CPU_ISSET(core, &all_))
+        if (!CPU_ISSET(core, &all))
             continue;
         other_ = last_;
         last_ = core;
     }
-    if (!CPU_ISSET(other_, &all_))
+    if (!CPU_ISSET(other_, &all))
         other_ = last_;
 }
 
-void CoreChoice::pin(Cores cores) const {
-    cpu_set_t chosen;
-    CPU_ZERO(&chosen);
-    CPU_SET(last_, &chosen);
-    if (cores == Cores::two)
-        CPU_SET(other_, &chosen);
-    sched_setaffinity(0, sizeof chosen, &chosen);
+void CoreChoice::asServer() const {
+    pinTo(last_, last_);
 }
 
-void CoreChoice::stepAside() const {
-    cpu_set_t chosen;
-    CPU_ZERO(&chosen);
-    CPU_SET(other_, &chosen);
-    sched_setaffinity(0, sizeof chosen, &chosen);
+void CoreChoice::asClient(Cores cores) const {
+    const int core = cores == Cores::one ? last_ : other_;
+    pinTo(core, core);
+}
+
+void CoreChoice::asBystander() const {
+    pinTo(other_, other_);
+}
+
+void CoreChoice::asBoth() const {
+    pinTo(last_, other_);
 }
 
 std::chrono::nanoseconds processorTime(pid_t pid) {

@@ -6,7 +6,9 @@
 
 namespace bench {
 
-// Which cores the measured programs run on. What is started afterwards inherits it.
+// How the measured programs lie on the cores: client and server on the same, or each on its own.
+// Left to itself the scheduler chooses between the two by chance, and between the daemon and the
+// floor differently.
 enum class Cores { one, two };
 
 // The cores that this process may use; asked once, before the first pinning.
@@ -14,14 +16,18 @@ class CoreChoice {
 public:
     CoreChoice();
 
-    // Pins this process: to the last of its cores, or to the last two.
-    void pin(Cores cores) const;
-    // Moves the calling process to the core that `Cores::one` leaves free (the same where there is
-    // only one): for programs that make load and are not measured.
-    void stepAside() const;
+    // Pins the calling process to the core of the servers, the last of its cores. What it starts
+    // from then on inherits that.
+    void asServer() const;
+    // Pins it to the core of the client.
+    void asClient(Cores cores) const;
+    // Pins it to another core than the servers' (where there is one): for programs that make load
+    // and are not measured.
+    void asBystander() const;
+    // Lets it, and what it starts, use both: for programs that are measured alone.
+    void asBoth() const;
 
 private:
-    cpu_set_t all_;
     int last_ = 0;
     int other_ = 0;
 };

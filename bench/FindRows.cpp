@@ -29,8 +29,8 @@ void fillUnread(e2e::WireClient& client, const std::string& request) {
     }
 }
 
-// A process that keeps the daemon's queue for its connection full; it runs on the core that is not
-// measured. Ended when this goes.
+// A process that keeps the daemon's queue for its connection full, on another core than the
+// daemon's. Ended when this goes.
 class Flood {
 public:
     Flood(const Run& run, const Rig& rig, const std::string& request, std::size_t reply)
@@ -40,7 +40,7 @@ public:
             return;
         }
         prctl(PR_SET_PDEATHSIG, SIGKILL);
-        run.cores.stepAside();
+        run.cores.asBystander();
         const e2e::WireClient client(rig.daemon().socketPath());
         Exchange exchange(client.fd(), rig.daemon().pid(), request, reply);
         for (;;)
@@ -80,6 +80,7 @@ void findRows(const Run& run, Cores cores) {
     const std::size_t reply = replySize(rig.client(), request);
     Exchange find = rig.exchange(request);
     FloorExchange floor(request, reply);
+    run.cores.asClient(cores);
 
     const Compared alone = compare(find, floor.exchange, run.plan);
     const auto row = [&](const char* name, double measured, double against, double bound) {

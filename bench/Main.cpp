@@ -111,7 +111,7 @@ void measure(const Options& options) {
             if (!asked || (cores == Cores::two && !family.twice && options.one))
                 continue;
             chooseFolder(family);
-            choice.pin(cores);
+            choice.asServer();
             family.measure(run, cores);
         }
     }

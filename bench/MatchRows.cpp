@@ -25,6 +25,7 @@ void matchRows(const Run& run, Cores cores, std::size_t plugIns) {
     const std::size_t reply = replySize(rig.client(), request);
     Exchange match = rig.exchange(request);
     FloorExchange floor(request, reply);
+    run.cores.asClient(cores);
     const Compared result =
         compare(match, floor.exchange, slower(run.plan, plugIns > 1000 ? 100 : 10));
     const std::string name = "match of 10 % of " + std::to_string(count);
@@ -53,6 +54,7 @@ void nothingRows(const Run& run, Cores cores) {
     Rig many(manyHome.path());
     Exchange amongFew = few.exchange(request);
     Exchange amongMany = many.exchange(request);
+    run.cores.asClient(cores);
     const Compared result = compare(amongMany, amongFew, run.plan);
     run.table.add({.name = "match of nothing among " + std::to_string(count) + ", p50",
                    .cores = nameOf(cores),

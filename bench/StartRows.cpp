@@ -75,6 +75,8 @@ void forget(const e2e::Home& home) {
 } // namespace
 
 void startRows(const Run& run, Cores cores) {
+    if (cores == Cores::two)
+        run.cores.asBoth();
     const std::size_t count = run.scaled(10000);
     const e2e::Home home;
     fill(home, {.plugIns = count});
