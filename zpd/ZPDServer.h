@@ -1,5 +1,6 @@
 #pragma once
 
+#include <atomic>
 #include <expected>
 #include <memory>
 #include <optional>
@@ -91,6 +92,8 @@ private:
     void handle(platform::ipc::ListenerEvent event);
 
     void removedPlugIns(const std::vector<ARZephrinProxy::Ptr>& plugIns) override;
+    // REQUIRES: on "serverSync"
+    void removeHold(std::vector<ZPDPlugInHold::Ptr>::const_iterator hold);
     void releaseAllHolds();
     [[nodiscard]] bool releaseOneHoldOf(const ZPDIpcClient& client);
 
@@ -99,6 +102,7 @@ private:
     unsigned verbose_ = 0;
     ZPDUserPrefs userPrefs_;
     std::vector<ZPDPlugInHold::Ptr> holds_; // only on "serverSync"
+    std::atomic<bool> holdsAny_ = false;    // whether there is one; changed there, read anywhere
     platform::SerialQueue syncQueue_;
     platform::ipc::Loop ipcLoop_;
     platform::SerialQueue mainQueue_;

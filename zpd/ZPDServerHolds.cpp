@@ -8,13 +8,18 @@
 #include "zpd/ZPDServer.h"
 
 bool ZPDServer::holdOnPlugIn(const ZPDPlugIn& plugIn) {
+    if (!holdsAny_)
+        return false; // asked for every candidate of every discovery
     return syncQueue_.sync([&] {
         return std::ranges::any_of(holds_, [&](const auto& hold) { return hold->blocks(plugIn); });
     });
 }
 
 void ZPDServer::addHold(ZPDPlugInHold::Ptr hold) {
-    syncQueue_.sync([&] { holds_.push_back(std::move(hold)); });
+    syncQueue_.sync([&] {
+        holds_.push_back(std::move(hold));
+        holdsAny_ = true;
+    });
     notifyAnnotationChange();
 }
 
@@ -24,7 +29,7 @@ void ZPDServer::unholdToken(const platform::Uuid& token) {
         if (found == holds_.end())
             return;
         ZPDLogOps().debug("releasing plug-in hold %{public}@ at client's request", token);
-        holds_.erase(found);
+        removeHold(found);
         notifyAnnotationChange();
     });
 }
@@ -44,8 +49,14 @@ bool ZPDServer::releaseOneHoldOf(const ZPDIpcClient& client) {
         return false;
     ZPDLogOps().debug("releasing plug-in hold %{public}@ for dead client pid %d", (*found)->uuid(),
                       client.pid());
-    holds_.erase(found);
+    removeHold(found);
     return true;
+}
+
+void ZPDServer::removeHold(std::vector<ZPDPlugInHold::Ptr>::const_iterator hold) {
+    syncQueue_.assertOnQueue();
+    holds_.erase(hold);
+    holdsAny_ = !holds_.empty();
 }
 
 void ZPDServer::releaseAllHolds() {
@@ -55,6 +66,7 @@ void ZPDServer::releaseAllHolds() {
                               hold->uuid());
         }
         holds_.clear();
+        holdsAny_ = false;
         notifyAnnotationChange();
     });
 }

@@ -1,6 +1,7 @@
 #include "zpd/requests/Deduplication.h"
 
 #include <cstddef>
+#include <cstdint>
 #include <random>
 #include <string>
 #include <vector>
@@ -11,7 +12,20 @@
 
 namespace {
 
-using Registration = Deduplication::Registration;
+struct Registration {
+    std::string name;
+    std::string version;
+    bool system = false;
+    std::int64_t modified = 0;
+
+    [[nodiscard]] const std::string& identifier() const { return name; }
+
+    [[nodiscard]] const std::string& exportedVersion() const { return version; }
+
+    [[nodiscard]] bool onSystemVolume() const { return system; }
+
+    [[nodiscard]] std::int64_t lastModified() const { return modified; }
+};
 
 struct Mode {
     bool allVersions;
@@ -20,7 +34,7 @@ struct Mode {
 
 // The kept ones of `offered`, by their places in it.
 std::vector<std::size_t> keptByIndex(const std::vector<Registration>& offered, Mode mode) {
-    Deduplication deduplication(mode.allVersions, mode.allDuplicates);
+    Deduplication<Registration> deduplication(mode.allVersions, mode.allDuplicates);
     std::vector<std::size_t> numbered;
     std::vector<bool> gone(offered.size());
     for (std::size_t i = 0; i < offered.size(); ++i) {
@@ -42,19 +56,19 @@ std::vector<std::size_t> keptByScan(const std::vector<Registration>& offered, Mo
         bool discarded = false;
         for (std::size_t at = 0; at < kept.size(); ++at) {
             const Registration& m = offered[kept[at]];
-            if (m.identifier != p.identifier)
+            if (m.name != p.name)
                 continue;
             const auto order = platform::compareNumerically(p.version, m.version);
             if (mode.allVersions && (mode.allDuplicates || order != 0))
                 continue;
             bool wins = order > 0;
             if (order == 0) {
-                if (p.onSystemVolume && !m.onSystemVolume)
+                if (p.system && !m.system)
                     wins = true;
-                else if (!p.onSystemVolume && m.onSystemVolume)
+                else if (!p.system && m.system)
                     wins = false;
                 else
-                    wins = p.lastModified > m.lastModified;
+                    wins = p.modified > m.modified;
             }
             if (wins)
                 kept.erase(kept.begin() + static_cast<std::ptrdiff_t>(at));
@@ -107,10 +121,10 @@ TEST(Deduplication, AgreesWithAScanOfTheKeptList) {
     for (int round = 0; round < 2000; ++round) {
         std::vector<Registration> offered;
         for (int i = any(24); i > 0; --i) {
-            offered.push_back({.identifier = std::string(1, static_cast<char>('a' + any(3))),
+            offered.push_back({.name = std::string(1, static_cast<char>('a' + any(3))),
                                .version = versions[any(8)],
-                               .onSystemVolume = any(2) == 1,
-                               .lastModified = any(3)});
+                               .system = any(2) == 1,
+                               .modified = any(3)});
         }
         for (const Mode mode : {newestOnly, allVersions, everything, Mode{false, true}})
             ASSERT_EQ(keptByIndex(offered, mode), keptByScan(offered, mode)) << "round " << round;

@@ -62,11 +62,14 @@ std::vector<SharedBytes> Discovery::run() {
     fetchCandidates();
     traceCandidates();
     preferOwnPlugIns();
+    deduplication_.reserve(candidates_.size());
+    matches_.reserve(candidates_.size());
     for (const auto& candidate : candidates_) {
         if (passes(*candidate))
-            take(candidate);
+            take(*candidate);
     }
     markReplacements();
     logMatches();
-    return encodedMatches();
+    encodeMarkedForms();
+    return takeEncodedMatches();
 }

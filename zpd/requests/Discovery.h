@@ -29,7 +29,7 @@ public:
 
 private:
     struct Match {
-        ReplyForm form;
+        const ZPDPlugIn* plugIn;
         platform::SharedBytes encoded;
         bool displaced = false; // by a better registration of its identifier
     };
@@ -51,11 +51,14 @@ private:
     [[nodiscard]] bool isAllowed(const ZPDPlugIn& plugIn) const;
 
     // ---- What is kept of them (DiscoveryMatches.cpp)
-    void take(const ZPDPlugIn::Ptr& plugIn);
+    void take(const ZPDPlugIn& plugIn);
+    [[nodiscard]] ReplyForm formOf(const ZPDPlugIn& plugIn) const;
     void declareReplacements(const ZPDPlugIn& plugIn, std::size_t match);
     void markReplacements();
+    [[nodiscard]] ReplyForm& markedForm(std::size_t match);
+    void encodeMarkedForms();
     void logMatches() const;
-    [[nodiscard]] std::vector<platform::SharedBytes> encodedMatches() const;
+    [[nodiscard]] std::vector<platform::SharedBytes> takeEncodedMatches();
 
     [[nodiscard]] bool has(std::uint64_t flag) const { return (flags_ & flag) != 0; }
 
@@ -65,7 +68,8 @@ private:
     const std::optional<std::string> ownPlugInsPath_;
     std::vector<std::optional<platform::Dictionary>> exclusions_;
     std::vector<ZPDPlugIn::Ptr> candidates_;
-    Deduplication deduplication_;
-    std::vector<Match> matches_;                             // displaced ones included
+    Deduplication<ZPDPlugIn> deduplication_;
+    std::vector<Match> matches_; // displaced ones included; of candidates
     std::unordered_map<std::string, std::size_t> overrides_; // identifier to match that replaces it
+    std::unordered_map<std::size_t, ReplyForm> markedForms_; // of matches that take part in that
 };

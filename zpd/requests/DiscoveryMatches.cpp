@@ -9,31 +9,23 @@ using platform::Array;
 using platform::SharedBytes;
 using platform::Value;
 
-namespace {
-
-Deduplication::Registration registrationOf(const ZPDPlugIn& plugIn) {
-    return {.identifier = plugIn.identifier(),
-            .version = plugIn.exportedVersion(),
-            .onSystemVolume = plugIn.onSystemVolume(),
-            .lastModified = plugIn.lastModified()};
+ReplyForm Discovery::formOf(const ZPDPlugIn& plugIn) const {
+    ReplyForm form{.plugIn = plugIn};
+    transaction_.addAnnotationForPlugIn(plugIn, form);
+    return form;
 }
 
-} // namespace
-
-void Discovery::take(const ZPDPlugIn::Ptr& plugIn) {
-    Match match{.form = {.plugIn = plugIn}};
-    transaction_.addAnnotationForPlugIn(*plugIn, match.form);
-    auto encoded = match.form.encode();
+void Discovery::take(const ZPDPlugIn& plugIn) {
+    auto encoded = formOf(plugIn).encode();
     if (!encoded)
         return;
-    match.encoded = std::move(*encoded);
-    const auto verdict = deduplication_.offer(registrationOf(*plugIn));
+    const auto verdict = deduplication_.offer(plugIn);
     if (verdict.displaced)
         matches_[*verdict.displaced].displaced = true;
     if (!verdict.keep)
         return;
-    declareReplacements(*plugIn, matches_.size());
-    matches_.push_back(std::move(match));
+    declareReplacements(plugIn, matches_.size());
+    matches_.push_back({&plugIn, std::move(*encoded)});
 }
 
 // Of several plug-ins that replace one identifier the last one counts, and goes on to count when
@@ -54,16 +46,24 @@ void Discovery::declareReplacements(const ZPDPlugIn& plugIn, std::size_t match) 
 void Discovery::markReplacements() {
     if (overrides_.empty())
         return;
-    for (Match& match : matches_) {
-        const auto found = overrides_.find(match.form.plugIn->identifier());
-        if (match.displaced || found == overrides_.end())
+    for (std::size_t i = 0; i < matches_.size(); ++i) {
+        const ZPDPlugIn& replaced = *matches_[i].plugIn;
+        const auto found = overrides_.find(replaced.identifier());
+        if (matches_[i].displaced || found == overrides_.end())
             continue;
-        ReplyForm& replacing = matches_[found->second].form;
-        match.form.overrider = replacing.plugIn->uuid().text();
-        replacing.overriding = match.form.plugIn->identifier();
-        ZPDLogOps().info("plug-in %{public}@ overrides %{public}@", match.form.plugIn->uuid(),
-                         replacing.plugIn->uuid());
+        const ZPDPlugIn& replacing = *matches_[found->second].plugIn;
+        markedForm(i).overrider = replacing.uuid().text();
+        markedForm(found->second).overriding = replaced.identifier();
+        ZPDLogOps().info("plug-in %{public}@ overrides %{public}@", replaced.uuid(),
+                         replacing.uuid());
     }
+}
+
+ReplyForm& Discovery::markedForm(std::size_t match) {
+    const auto found = markedForms_.find(match);
+    if (found != markedForms_.end())
+        return found->second;
+    return markedForms_.emplace(match, formOf(*matches_[match].plugIn)).first->second;
 }
 
 void Discovery::logMatches() const {
@@ -73,7 +73,7 @@ void Discovery::logMatches() const {
     Array uuids;
     for (const Match& match : matches_) {
         if (!match.displaced)
-            uuids.append(match.form.plugIn->uuid().text());
+            uuids.append(match.plugIn->uuid().text());
     }
     if (uuids.empty())
         return log.info("Resulting plugin count: 0");
@@ -81,17 +81,20 @@ void Discovery::logMatches() const {
              Value(uuids));
 }
 
-std::vector<SharedBytes> Discovery::encodedMatches() const {
+// One whose bundle vanished meanwhile goes out without its mark.
+void Discovery::encodeMarkedForms() {
+    for (const auto& [match, form] : markedForms_) {
+        if (auto encoded = form.encode())
+            matches_[match].encoded = std::move(*encoded);
+    }
+}
+
+std::vector<SharedBytes> Discovery::takeEncodedMatches() {
     std::vector<SharedBytes> forms;
     forms.reserve(matches_.size());
-    for (const Match& match : matches_) {
-        if (match.displaced)
-            continue;
-        const bool isMarked = match.form.overrider || match.form.overriding;
-        if (!isMarked)
-            forms.push_back(match.encoded);
-        else if (auto marked = match.form.encode())
-            forms.push_back(std::move(*marked));
+    for (Match& match : matches_) {
+        if (!match.displaced)
+            forms.push_back(std::move(match.encoded));
     }
     return forms;
 }

@@ -19,7 +19,7 @@ void Transaction::findPlugIn() {
         return fail(ZPDErrorCode::notFound, "Cannot locate PlugIn");
     }
     ZPDLogOps().standard("plugin found %{public}@", *plugIn);
-    ReplyForm form{.plugIn = plugIn};
+    ReplyForm form{.plugIn = *plugIn};
     addAnnotationForPlugIn(*plugIn, form);
     if (const auto encoded = form.encode())
         setMatches(ZPDaemonClient::convertToIPC(*encoded, version()));

@@ -10,7 +10,7 @@ using platform::SharedBytes;
 namespace {
 
 std::expected<SharedBytes, Error> encodeMarked(const ReplyForm& form) {
-    auto marked = form.plugIn->replyForm(form.annotations);
+    auto marked = form.plugIn.replyForm(form.annotations);
     if (!marked)
         return std::unexpected(std::move(marked.error()));
     if (form.overrider)
@@ -24,10 +24,10 @@ std::expected<SharedBytes, Error> encodeMarked(const ReplyForm& form) {
 
 std::optional<SharedBytes> ReplyForm::encode() const {
     const bool isMarked = overrider || overriding;
-    auto encoded = isMarked ? encodeMarked(*this) : plugIn->encodedReplyForm(annotations);
+    auto encoded = isMarked ? encodeMarked(*this) : plugIn.encodedReplyForm(annotations);
     if (encoded)
         return std::move(*encoded);
-    ZPDLogOps().error("failed to export matching plug-in %{public}@: %{public}@", plugIn->uuid(),
+    ZPDLogOps().error("failed to export matching plug-in %{public}@: %{public}@", plugIn.uuid(),
                       encoded.error());
     return std::nullopt;
 }

@@ -8,12 +8,12 @@
 #include "zpd/ZPDPlugIn.h"
 
 // A plug-in's form on its way into a reply: the record's own form and what the request adds to it.
-// Lives for one request; on the service queue.
+// Lives for one request, on the service queue; the record outlives it.
 struct ReplyForm {
-    ZPDPlugIn::Ptr plugIn;
-    platform::Dictionary annotations;
-    std::optional<std::string> overrider;  // UUID text of the plug-in that replaces this one
-    std::optional<std::string> overriding; // identifier of the plug-in that this one replaces
+    const ZPDPlugIn& plugIn;
+    platform::Dictionary annotations{};
+    std::optional<std::string> overrider{};  // UUID text of the plug-in that replaces this one
+    std::optional<std::string> overriding{}; // identifier of the plug-in that this one replaces
 
     // The form in its wire encoding, shared with the record unless a replacement was marked. When
     // it cannot be made, nothing, and a log line.
