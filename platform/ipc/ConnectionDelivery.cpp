@@ -1,13 +1,16 @@
+#include <algorithm>
 #include <utility>
 
 #include "platform/ipc/ConnectionImpl.h"
+#include "platform/ipc/LoopImpl.h"
 
 namespace platform::ipc {
 
 namespace {
 
-// Requests of one connection that the loop hands out before it looks after the others again.
-constexpr int deliveriesPerTurn = 8;
+// Requests of one connection that the loop hands out before it looks after the others again: one
+// while others are served too, and twice as many each time that nobody else was, up to this.
+constexpr unsigned mostPerTurn = 32;
 
 } // namespace
 
@@ -46,11 +49,10 @@ void Ticket::finish() {
 
 void Connection::Impl::enqueue(Message message, std::size_t cost) {
     account->add(cost);
-    std::unique_lock lock(mutex);
+    const std::lock_guard lock(mutex);
     waiting.push_back({std::move(message), cost});
     ++unfinished;
     unfinishedCost += cost;
-    deliver(lock);
 }
 
 bool Connection::Impl::mayDeliver() const {
@@ -63,9 +65,11 @@ void Connection::Impl::deliver(std::unique_lock<std::mutex>& lock) {
         return;
     delivering = true;
     const bool onLoop = loop.isCurrent();
-    for (int turn = 0; mayDeliver(); ++turn) {
-        if (onLoop && turn == deliveriesPerTurn) {
-            post(&Impl::goOnDelivering);
+    while (mayDeliver()) {
+        if (onLoop && leftOfTurn-- == 0) {
+            leftOfTurn = 0;
+            if (!std::exchange(turnDue, true))
+                post(&Impl::takeTurn);
             break;
         }
         Waiting next = std::move(waiting.front());
@@ -81,9 +85,22 @@ void Connection::Impl::deliver(std::unique_lock<std::mutex>& lock) {
         post(&Impl::deliverInvalid);
 }
 
-void Connection::Impl::goOnDelivering() {
-    std::unique_lock lock(mutex);
-    deliver(lock);
+// Replies to several requests that are answered within one turn go out together.
+void Connection::Impl::takeTurn() {
+    const void* const before = std::exchange(loop.impl().lastServed, this);
+    perTurn = before == this ? std::min(perTurn * 2, mostPerTurn) : 1;
+    bool together = false;
+    {
+        std::unique_lock lock(mutex);
+        turnDue = false;
+        leftOfTurn = perTurn;
+        together = perTurn > 1 && waiting.size() > 1;
+        if (together)
+            outbox.gather();
+        deliver(lock);
+    }
+    if (together && outbox.release() == Outbox::Outcome::waiting)
+        writeRest();
 }
 
 void Connection::Impl::requestTaken() {

@@ -60,7 +60,7 @@ struct Connection::Impl final : SocketWatch::Target {
     void requestFinished(std::size_t cost);
     void deliver(std::unique_lock<std::mutex>& lock);
     [[nodiscard]] bool mayDeliver() const;
-    void goOnDelivering();
+    void takeTurn(); // on the loop
 
     // Writing. `write` on any thread, the rest on the loop.
     void greet();
@@ -100,6 +100,7 @@ struct Connection::Impl final : SocketWatch::Target {
     bool timing = false;
     std::uint64_t progressSeen = 0;
     Clock::time_point progressAt;
+    unsigned perTurn = 1;
 
     struct Waiting {
         Message message;
@@ -115,6 +116,8 @@ struct Connection::Impl final : SocketWatch::Target {
     bool resumed = false;
     bool untaken = false; // a delivered request was not taken yet
     bool delivering = false;
+    bool turnDue = false;    // a turn on the loop is posted
+    unsigned leftOfTurn = 0; // requests that the loop may still hand out
     bool invalidDue = false;
     bool paused = false;
     bool ended = false;

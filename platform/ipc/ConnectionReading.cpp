@@ -64,8 +64,10 @@ void Connection::Impl::readable() {
     takeFrames();
 }
 
-// Takes up what has come as far as the limits allow, and then either reads on or pauses.
+// Takes up what has come as far as the limits allow, hands some of it out, and then either reads on
+// or pauses.
 void Connection::Impl::takeFrames() {
+    bool took = false;
     while (mayTake()) {
         const auto frame = reader.next();
         if (!frame)
@@ -74,8 +76,11 @@ void Connection::Impl::takeFrames() {
             break;
         if (const auto complaint = take(**frame))
             return end(Replies::drop, *complaint);
+        took = true;
     }
     reader.keep();
+    if (took)
+        takeTurn();
     const bool admitted = admitBegun();
     if (pauseUnless(admitted))
         pause(admitted);

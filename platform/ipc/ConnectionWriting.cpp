@@ -52,7 +52,7 @@ void Connection::Impl::writable() {
     case Outbox::Outcome::broken:
         return ended ? close() : end(Replies::drop);
     case Outbox::Outcome::done:
-        return ended ? settle() : goOnDelivering();
+        return ended ? settle() : takeTurn();
     }
 }
 

@@ -41,6 +41,7 @@ struct Loop::Impl {
     asio::steady_timer first{context};
     std::vector<std::unique_ptr<Signal>> signals;
     std::atomic<std::thread::id> runner;
+    const void* lastServed = nullptr; // whose requests had the last turn; on the loop
     std::thread thread;
 };
 

@@ -11,6 +11,9 @@ namespace platform::ipc {
 
 namespace {
 
+constexpr std::size_t largestGathered = 16UL << 10; // a frame
+constexpr std::size_t mostGathered = 128UL << 10;   // together
+
 iovec part(const char* data, std::size_t size) {
     return {const_cast<char*>(data), size}; // sendmsg only reads
 }
@@ -43,6 +46,7 @@ void Outbox::close() {
     closed_ = true;
     descriptor_ = -1;
     pieces_.clear();
+    gathered_.clear();
     waiting_.store(false, std::memory_order_release);
 }
 
@@ -67,12 +71,49 @@ Outbox::Outcome Outbox::send(std::string_view text, const CborEncoder& encoder) 
     const std::lock_guard lock(mutex_);
     if (closed_)
         return Outcome::broken;
+    if (mayGather(encoder)) {
+        encoder.forEachPiece(
+            [&](std::size_t from, std::size_t size) { gathered_.append(text, from, size); },
+            [&](const SharedBytes& piece) { gathered_.append(piece.data(), piece.size()); });
+        return gathered_.size() < mostGathered ? Outcome::done : writeGathered();
+    }
+    if (!gathered_.empty() && writeGathered() == Outcome::broken)
+        return Outcome::broken;
     std::size_t count = 0;
     if (descriptor_ >= 0 && pieces_.empty() && !write(partsOf(text, encoder), count))
         return Outcome::broken;
     if (count == encoder.size())
         return Outcome::done;
     queue(text, encoder, count);
+    return settle();
+}
+
+bool Outbox::mayGather(const CborEncoder& encoder) const {
+    return gathering_ && descriptor_ >= 0 && pieces_.empty() && encoder.size() <= largestGathered;
+}
+
+void Outbox::gather() {
+    const std::lock_guard lock(mutex_);
+    gathering_ = true;
+}
+
+Outbox::Outcome Outbox::release() {
+    const std::lock_guard lock(mutex_);
+    gathering_ = false;
+    if (closed_)
+        return Outcome::broken;
+    return gathered_.empty() ? settle() : writeGathered();
+}
+
+// REQUIRES: mutex held, nothing else waits.
+Outbox::Outcome Outbox::writeGathered() {
+    std::size_t count = 0;
+    iovec whole = part(gathered_.data(), gathered_.size());
+    if (!write({&whole, 1}, count))
+        return Outcome::broken;
+    if (count < gathered_.size())
+        pieces_.push_back(Piece{SharedBytes(std::string_view(gathered_).substr(count))});
+    gathered_.clear();
     return settle();
 }
 

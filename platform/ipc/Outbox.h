@@ -6,6 +6,7 @@
 #include <deque>
 #include <mutex>
 #include <span>
+#include <string>
 #include <string_view>
 #include <sys/uio.h>
 #include <vector>
@@ -39,6 +40,11 @@ public:
     // Writes on, once.
     [[nodiscard]] Outcome flush();
 
+    // Between the two, frames that are not large are copied behind each other, to be written by one
+    // call.
+    void gather();
+    [[nodiscard]] Outcome release();
+
     [[nodiscard]] bool empty() const noexcept { return !waiting_.load(std::memory_order_acquire); }
 
     // Bytes that were written ever.
@@ -52,6 +58,8 @@ private:
         std::size_t offset = 0;
     };
 
+    [[nodiscard]] bool mayGather(const CborEncoder& encoder) const;
+    [[nodiscard]] Outcome writeGathered();
     void queue(std::string_view text, const CborEncoder& encoder, std::size_t skip);
     [[nodiscard]] bool write(std::span<iovec> parts, std::size_t& count);
     void drop(std::size_t count);
@@ -60,6 +68,8 @@ private:
     std::mutex mutex_;
     int descriptor_ = -1;
     bool closed_ = false;
+    bool gathering_ = false;
+    std::string gathered_; // empty whenever pieces wait
     std::deque<Piece> pieces_;
     std::atomic<bool> waiting_ = false;
     std::atomic<std::uint64_t> written_ = 0;
