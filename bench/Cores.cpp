@@ -23,11 +23,14 @@ CoreChoice::CoreChoice() {
     for (int core = 0; core < CPU_SETSIZE; ++core) {
         if (!CPU_ISSET(core, &all))
             continue;
+        third_ = other_;
         other_ = last_;
         last_ = core;
     }
     if (!CPU_ISSET(other_, &all))
         other_ = last_;
+    if (!CPU_ISSET(third_, &all))
+        third_ = other_;
 }
 
 void CoreChoice::asServer() const {
@@ -39,8 +42,13 @@ void CoreChoice::asClient(Cores cores) const {
     pinTo(core, core);
 }
 
-void CoreChoice::asBystander() const {
-    pinTo(other_, other_);
+bool CoreChoice::leavesOne(Cores cores) const {
+    return other_ != last_ && (cores == Cores::one || third_ != other_);
+}
+
+void CoreChoice::asBystander(Cores cores) const {
+    const int core = cores == Cores::one ? other_ : third_;
+    pinTo(core, core);
 }
 
 void CoreChoice::asBoth() const {

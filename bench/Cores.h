@@ -21,15 +21,17 @@ public:
     void asServer() const;
     // Pins it to the core of the client.
     void asClient(Cores cores) const;
-    // Pins it to another core than the servers' (where there is one): for programs that make load
-    // and are not measured.
-    void asBystander() const;
+    // Whether a core is left beside those of servers and client.
+    [[nodiscard]] bool leavesOne(Cores cores) const;
+    // Pins it to the core that is left: for programs that make load and are not measured.
+    void asBystander(Cores cores) const;
     // Lets it, and what it starts, use both: for programs that are measured alone.
     void asBoth() const;
 
 private:
     int last_ = 0;
     int other_ = 0;
+    int third_ = 0;
 };
 
 // The processor time that all threads of a process have used so far.

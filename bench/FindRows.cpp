@@ -29,18 +29,19 @@ void fillUnread(e2e::WireClient& client, const std::string& request) {
     }
 }
 
-// A process that keeps the daemon's queue for its connection full, on another core than the
-// daemon's. Ended when this goes.
+// A process that keeps the daemon's queue for its connection full, on a core that is left for it.
+// Ended when this goes.
 class Flood {
 public:
-    Flood(const Run& run, const Rig& rig, const std::string& request, std::size_t reply)
+    Flood(const Run& run, Cores cores, const Rig& rig, const std::string& request,
+          std::size_t reply)
         : pid_(fork()) {
         if (pid_ != 0) {
             std::this_thread::sleep_for(std::chrono::milliseconds(200)); // until it is at work
             return;
         }
         prctl(PR_SET_PDEATHSIG, SIGKILL);
-        run.cores.asBystander();
+        run.cores.asBystander(cores);
         const e2e::WireClient client(rig.daemon().socketPath());
         Exchange exchange(client.fd(), rig.daemon().pid(), request, reply);
         for (;;)
@@ -118,7 +119,9 @@ void findRows(const Run& run, Cores cores) {
         besideRow(run, cores, "find beside a client that never reads, p50", beside.daemon.p50,
                   alone.daemon.p50);
     }
-    const Flood flood(run, rig, request, reply);
+    if (!run.cores.leavesOne(cores))
+        return; // the flood and the client would only take the core from each other
+    const Flood flood(run, cores, rig, request, reply);
     const Compared beside = compare(find, floor.exchange, run.plan);
     besideRow(run, cores, "find beside a client that floods, p50", beside.daemon.p50,
               alone.daemon.p50);
