@@ -74,8 +74,9 @@ EchoServer::EchoServer(std::string path, const Limits& limits, Serve serve)
 
 EchoServer::~EchoServer() {
     listener_->cancel();
+    stopping_ = true;
     loop_.stop();
-    queue_.reset(); // waits for its blocks
+    queue_.sync([] {}); // after this no handler uses the queue
 }
 
 void EchoServer::adopt(const std::shared_ptr<Connection>& connection) {
@@ -84,9 +85,9 @@ void EchoServer::adopt(const std::shared_ptr<Connection>& connection) {
         if (std::holds_alternative<ConnectionError>(event))
             return gone.add();
         auto* message = std::get_if<Message>(&event);
-        if (!message)
+        if (!message || stopping_)
             return;
-        queue_->async([this, weak, request = std::move(*message)]() mutable {
+        queue_.async([this, weak, request = std::move(*message)]() mutable {
             requests.add();
             if (const auto there = weak.lock())
                 serve_(*there, request);

@@ -61,7 +61,7 @@ public:
                         Serve serve = {});
     ~EchoServer();
 
-    [[nodiscard]] platform::SerialQueue& queue() { return *queue_; }
+    [[nodiscard]] platform::SerialQueue& queue() { return queue_; }
 
     [[nodiscard]] platform::ipc::Loop& loop() { return loop_; }
 
@@ -73,8 +73,8 @@ private:
     void adopt(const std::shared_ptr<platform::ipc::Connection>& connection);
 
     platform::ipc::Loop loop_{"ipc"};
-    std::unique_ptr<platform::SerialQueue> queue_ =
-        std::make_unique<platform::SerialQueue>("service");
+    platform::SerialQueue queue_{"service"};
+    std::atomic<bool> stopping_ = false;
     Serve serve_;
     std::unique_ptr<platform::ipc::Listener> listener_;
 };
