@@ -16,8 +16,10 @@ find_package(PkgConfig REQUIRED)
 find_path(ASIO_INCLUDE_DIR asio.hpp REQUIRED)
 add_library(asio INTERFACE)
 target_include_directories(asio SYSTEM INTERFACE ${ASIO_INCLUDE_DIR})
+# Asio's own test for aligned_alloc depends on what was included before it, so that sources could
+# disagree on who frees; without it all use operator new.
 target_compile_definitions(asio INTERFACE
-  ASIO_STANDALONE ASIO_NO_DEPRECATED ASIO_SEPARATE_COMPILATION)
+  ASIO_STANDALONE ASIO_NO_DEPRECATED ASIO_SEPARATE_COMPILATION ASIO_DISABLE_STD_ALIGNED_ALLOC)
 target_link_libraries(asio INTERFACE Threads::Threads)
 
 find_path(SDT_INCLUDE_DIR sys/sdt.h REQUIRED)
