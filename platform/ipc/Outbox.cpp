@@ -102,7 +102,9 @@ Outbox::Outcome Outbox::release() {
     gathering_ = false;
     if (closed_)
         return Outcome::broken;
-    return gathered_.empty() ? settle() : writeGathered();
+    const Outcome outcome = gathered_.empty() ? settle() : writeGathered();
+    gathered_ = std::string(); // a connection at rest keeps no room
+    return outcome;
 }
 
 // REQUIRES: mutex held, nothing else waits.
