@@ -33,6 +33,10 @@ ZPBundle ZPBundle::forExecutablePath(const std::string& path) {
     return atPath(path);
 }
 
+ZPBundle ZPBundle::forTrustedExecutablePath(const std::string& path) {
+    return ZPBundle(BundleReader::forTrustedExecutable(path));
+}
+
 ZPBundle ZPBundle::forExecutableURL(std::string_view fileUrl) {
     return forExecutablePath(pathFromFileURL(fileUrl).value_or(std::string()));
 }

@@ -21,6 +21,9 @@ public:
     [[nodiscard]] static ZPBundle atURL(std::string_view fileUrl);
     // The bundle that an executable belongs to; a bundle's own directory serves as well.
     [[nodiscard]] static ZPBundle forExecutablePath(const std::string& path);
+    // The bundle that another process's executable belongs to; none where strangers could have made
+    // it one.
+    [[nodiscard]] static ZPBundle forTrustedExecutablePath(const std::string& path);
     [[nodiscard]] static ZPBundle forExecutableURL(std::string_view fileUrl);
 
     [[nodiscard]] std::optional<std::string>

@@ -36,12 +36,15 @@ ZPDIpcClient::ZPDIpcClient(const std::shared_ptr<Connection>& connection, ZPDSer
 
 ZPDIpcClient::~ZPDIpcClient() = default;
 
+// The loop must not read what a client laid out for it, in folder after folder: a program that its
+// user could change has no bundle. Nothing is lost, as plug-ins in such an application are never
+// registered.
 void ZPDIpcClient::learnPath() {
     auto path = server_.services().processes.executablePath(pid(), pathRoom);
     if (!path)
         return;
     path_ = std::move(*path);
-    bundle_ = ZPBundle::forExecutablePath(path_);
+    bundle_ = ZPBundle::forTrustedExecutablePath(path_);
 }
 
 void ZPDIpcClient::resume() {

@@ -46,7 +46,8 @@ public:
     // Where the client's program lies; empty when that cannot be told.
     [[nodiscard]] const std::string& path() const { return path_; }
 
-    // The client's own bundle; nothing when its path cannot be told.
+    // The client's own bundle; nothing when its path cannot be told, an invalid one when others
+    // could have written it.
     [[nodiscard]] const std::optional<ZPBundle>& bundle() const { return bundle_; }
 
     // Whether its requests are still carried out: until the connection is dead.

@@ -3,6 +3,7 @@
 #include <sys/stat.h>
 
 #include "platform/file/File.h"
+#include "platform/file/OwnershipTest.h"
 #include "platform/plist/PropertyList.h"
 
 namespace platform {
@@ -39,18 +40,40 @@ BundleReader BundleReader::atPath(const std::string& path) {
     return read(path).value_or(BundleReader());
 }
 
-BundleReader BundleReader::forExecutable(const std::string& path) {
-    const auto executable = canonicalPath(path);
-    if (!executable)
-        return {};
-    for (auto slash = executable->rfind('/'); slash != 0 && slash != std::string::npos;
-         slash = executable->rfind('/', slash - 1)) {
-        BundleReader bundle = atPath(executable->substr(0, slash));
+// `executable` is canonical; `mayRead` gets the path of each Info.plist before it is read.
+template <class MayRead>
+BundleReader BundleReader::nearestNaming(const std::string& executable, MayRead&& mayRead) {
+    for (auto slash = executable.rfind('/'); slash != 0 && slash != std::string::npos;
+         slash = executable.rfind('/', slash - 1)) {
+        const std::string folder = executable.substr(0, slash);
+        if (!mayRead(folder + std::string(infoName)))
+            continue;
+        BundleReader bundle = atPath(folder);
         const auto named = bundle.executablePath();
         if (named && canonicalPath(*named) == executable)
             return bundle;
     }
     return {};
+}
+
+BundleReader BundleReader::forExecutable(const std::string& path) {
+    const auto executable = canonicalPath(path);
+    return executable ? nearestNaming(*executable, [](const std::string&) { return true; })
+                      : BundleReader();
+}
+
+// Asks for the owner first: a stranger's program costs one look at it, however deep it lies.
+BundleReader BundleReader::forTrustedExecutable(const std::string& path) {
+    OwnershipTest ownership;
+    if (ownership.refusal(path))
+        return {};
+    const auto executable = canonicalPath(path);
+    if (!executable || (*executable != path && ownership.refusal(*executable)))
+        return {};
+    return nearestNaming(*executable, [&](const std::string& info) {
+        const auto file = canonicalPath(info);
+        return file && !ownership.refusal(*file);
+    });
 }
 
 std::optional<std::string> BundleReader::executablePath() const {

@@ -25,6 +25,9 @@ public:
     [[nodiscard]] static BundleReader atPath(const std::string& path);
     // The nearest enclosing folder whose Info.plist names this very file as its executable.
     [[nodiscard]] static BundleReader forExecutable(const std::string& path);
+    // The same for a program that someone else runs: nothing is read that others than root and
+    // this process's user could have put there (OwnershipTest.h), be it program or Info.plist.
+    [[nodiscard]] static BundleReader forTrustedExecutable(const std::string& path);
 
     // The executable path is there only when the bundle names a regular file right in its folder.
     [[nodiscard]] std::optional<std::string> stringProperty(Property property) const;
@@ -37,6 +40,9 @@ public:
     }
 
 private:
+    template <class MayRead>
+    [[nodiscard]] static BundleReader nearestNaming(const std::string& executable,
+                                                    MayRead&& mayRead);
     [[nodiscard]] std::optional<std::string> executablePath() const;
 
     std::optional<std::string> path_; // canonical

@@ -100,3 +100,33 @@ TEST(BundleReader, FindsTheBundleThatNamesAnExecutable) {
             << c.executable;
     }
 }
+
+TEST(BundleReader, ReadsNothingThatStrangersCouldHaveWritten) {
+    const TestFolder folder;
+    folder.write("A.app/Info.plist", infoNaming("Main"));
+    folder.write("A.app/Main", "");
+    fs::create_directory_symlink("A.app", folder / "link");
+
+    const struct {
+        const char* changed;
+        ::mode_t mode;
+        const char* executable;
+        bool found;
+    } cases[] = {
+        {"A.app", 0755, "A.app/Main", true},
+        {"A.app", 01777, "A.app/Main", true},
+        {"A.app", 0777, "A.app/Main", false},
+        {"A.app/Main", 0666, "A.app/Main", false},
+        {"A.app/Info.plist", 0666, "A.app/Main", false},
+        {"A.app", 0755, "link/Main", false}, // a link is not how the kernel names a running file
+    };
+
+    for (const auto& c : cases) {
+        const ::mode_t before = fs::is_directory(folder / c.changed) ? 0755 : 0644;
+        ASSERT_EQ(::chmod((folder / c.changed).c_str(), c.mode), 0);
+        const auto bundle = BundleReader::forTrustedExecutable(folder / c.executable);
+        EXPECT_EQ(bundle.stringProperty(Property::bundlePath).has_value(), c.found)
+            << c.changed << " " << std::oct << c.mode << " " << c.executable;
+        ASSERT_EQ(::chmod((folder / c.changed).c_str(), before), 0);
+    }
+}
