@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <iterator>
 #include <limits>
 
 namespace platform {
@@ -12,6 +13,21 @@ const Value nullValue;
 
 bool keyBefore(const DictionaryEntry& entry, std::string_view key) {
     return entry.key.view() < key;
+}
+
+// Stable. Most dictionaries are a handful of entries, for which the library would take memory.
+void sortByKey(std::vector<DictionaryEntry>& entries) {
+    constexpr std::size_t handful = 16;
+    const auto keyOf = [](const DictionaryEntry& entry) { return entry.key.view(); };
+    if (entries.size() > handful) {
+        std::ranges::stable_sort(entries, {}, keyOf);
+        return;
+    }
+    for (auto next = entries.begin(); next != entries.end(); ++next) {
+        const auto place = std::ranges::upper_bound(entries.begin(), next, keyOf(*next), {}, keyOf);
+        if (place != next)
+            std::rotate(place, next, std::next(next));
+    }
 }
 
 } // namespace
@@ -67,7 +83,7 @@ Dictionary::Dictionary(std::initializer_list<std::pair<std::string_view, Value>>
 Dictionary::Dictionary(std::vector<DictionaryEntry> entries) {
     if (entries.empty())
         return;
-    std::ranges::stable_sort(entries, {}, [](const DictionaryEntry& e) { return e.key.view(); });
+    sortByKey(entries);
     // Of equal keys the last one stays: walk from the back, where it comes first.
     const auto repeated = std::unique(
         entries.rbegin(), entries.rend(),
