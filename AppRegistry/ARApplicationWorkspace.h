@@ -57,6 +57,13 @@ public:
 
     [[nodiscard]] virtual ARKnowledge knowledge() = 0;
 
+    // The sequence number of it, 0 while nothing is known: the same one again means that nothing
+    // changed. For those who ask often.
+    [[nodiscard]] virtual std::uint64_t knowledgeSequence() {
+        const ARKnowledge known = knowledge();
+        return known.uuid ? known.sequence : 0;
+    }
+
     // Adds a bundle by path, or takes one away; nothing on success.
     [[nodiscard]] virtual std::optional<platform::Error> registerPlugin(std::string_view path) = 0;
     [[nodiscard]] virtual std::optional<platform::Error>

@@ -23,6 +23,9 @@ public:
     [[nodiscard]] const platform::Uuid& plugInUUID() const override { return row_->uuid; }
 
     [[nodiscard]] std::optional<std::string> bundlePath() const override;
+
+    [[nodiscard]] bool hasBundlePath() const override { return true; }
+
     [[nodiscard]] std::optional<std::string> plugInIdentifier() const override;
     [[nodiscard]] std::optional<std::string> originalIdentifier() const override;
     [[nodiscard]] std::optional<platform::Dictionary> infoDictionary() const override;

@@ -83,6 +83,7 @@ void ARRegistry::applyLive(ARBatch&& batch) {
 void ARRegistry::publish(std::shared_ptr<ARSnapshot> snapshot) {
     snapshot->setKnowledge(knowledge_);
     context_->published.set(std::move(snapshot));
+    publishedSequence_ = knowledge_.uuid ? knowledge_.sequence : 0;
 }
 
 void ARRegistry::declareTypes() {

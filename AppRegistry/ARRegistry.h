@@ -46,6 +46,9 @@ public:
     [[nodiscard]] std::optional<ARExtensionPoint>
     extensionPointForIdentifier(std::string_view identifier) override;
     [[nodiscard]] ARKnowledge knowledge() override;
+
+    [[nodiscard]] std::uint64_t knowledgeSequence() override { return publishedSequence_; }
+
     [[nodiscard]] std::optional<platform::Error> registerPlugin(std::string_view path) override;
     [[nodiscard]] std::optional<platform::Error> unregisterPlugin(std::string_view path) override;
     void clearSchemaCaches() override;
@@ -69,6 +72,7 @@ private:
     const std::shared_ptr<ARProxyContext> context_;
     platform::Types& types_;
     std::atomic<ARWorkspaceObserver*> observer_ = nullptr;
+    std::atomic<std::uint64_t> publishedSequence_ = 0; // of the snapshot that is published
 
     // On the queue.
     ARModel model_;

@@ -18,6 +18,9 @@ public:
     virtual ~ARZephrinProxy() = default;
     [[nodiscard]] virtual const platform::Uuid& plugInUUID() const = 0;
     [[nodiscard]] virtual std::optional<std::string> bundlePath() const = 0; // canonical
+
+    [[nodiscard]] virtual bool hasBundlePath() const { return bundlePath().has_value(); }
+
     [[nodiscard]] virtual std::optional<std::string> plugInIdentifier() const = 0;
     // The identifier under which this path was first registered.
     [[nodiscard]] virtual std::optional<std::string> originalIdentifier() const = 0;
