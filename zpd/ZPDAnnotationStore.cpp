@@ -210,7 +210,7 @@ std::optional<Dictionary> ZPDAnnotationStore::annotationForPlugIn(const ZPDPlugI
 
 void ZPDAnnotationStore::setAnnotation(const std::optional<Dictionary>& annotation,
                                        const ZPDPlugIn& plugIn) {
-    const std::string key = plugIn.annotationKey();
+    const std::string_view key = plugIn.annotationKey();
     if (annotation) {
         add(key, *annotation);
     } else if (annotations_.contains(key)) {
@@ -226,7 +226,7 @@ void ZPDAnnotationStore::setAnnotation(const std::optional<Dictionary>& annotati
 }
 
 // An annotation that does not change stays the same object, so that forms made with it stand.
-void ZPDAnnotationStore::add(const std::string& key, const Dictionary& changes) {
+void ZPDAnnotationStore::add(std::string_view key, const Dictionary& changes) {
     const auto stored = annotationForIdentifier(key);
     Dictionary merged = stored.value_or(Dictionary());
     for (const DictionaryEntry& change : changes)

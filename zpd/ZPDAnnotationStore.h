@@ -50,7 +50,7 @@ private:
     [[nodiscard]] std::expected<std::string, platform::Error> containerPath() const;
     void migrate();
     void prepareFolder(bool usualPlace) const;
-    void add(const std::string& key, const platform::Dictionary& changes);
+    void add(std::string_view key, const platform::Dictionary& changes);
 
     platform::Containers& containers_;
     std::string path_;

@@ -114,10 +114,14 @@ std::optional<Dictionary> ZPDPlugIn::infoPlist() const {
 }
 
 std::shared_ptr<const ZPDPlugInInfo> ZPDPlugIn::currentInfo() const {
-    const auto knowledge = context_.workspace.knowledge().uuid;
+    const std::uint64_t sequence = context_.workspace.knowledgeSequence();
     const auto lock = locked();
+    if (sequence != 0 && sequence == knowledgeSequence_)
+        return info_;
+    const auto knowledge = context_.workspace.knowledge().uuid;
     if (!knowledge || knowledge != arKnowledgeUUID_)
         refresh(knowledge);
+    knowledgeSequence_ = sequence;
     return info_;
 }
 
@@ -201,10 +205,11 @@ bool ZPDPlugIn::hasEntitlement(std::string_view key) const {
     return value && !value->equalsFalse();
 }
 
-std::string ZPDPlugIn::annotationKey() const {
-    const auto replaced = valueForEntitlement(Entitlement::replacePlugIn);
+std::string_view ZPDPlugIn::annotationKey() const {
+    const auto& held = entitlements();
+    const Value* const replaced = held ? held->find(Entitlement::replacePlugIn) : nullptr;
     const auto text = replaced ? replaced->string() : std::nullopt;
-    return text ? std::string(*text) : identifier();
+    return text.value_or(identifier());
 }
 
 // ---- Check

@@ -71,7 +71,7 @@ public:
     // True when there is a value and it does not equal false.
     [[nodiscard]] bool hasEntitlement(std::string_view key) const;
     // The key of the plug-in's annotation: what it replaces, else its identifier.
-    [[nodiscard]] std::string annotationKey() const;
+    [[nodiscard]] std::string_view annotationKey() const;
 
     [[nodiscard]] std::optional<platform::Error> diagnose() const override;
 
@@ -152,6 +152,7 @@ private:
     // Guarded by the record's lock; refreshed behind const readers.
     mutable std::weak_ptr<const ARZephrinProxy> known_; // whose data this is
     mutable std::optional<platform::Uuid> arKnowledgeUUID_;
+    mutable std::uint64_t knowledgeSequence_ = 0; // of that, as far as it was looked at
     mutable std::shared_ptr<const ZPDPlugInInfo> info_;
     mutable std::optional<KeptForm> keptForm_;
 };

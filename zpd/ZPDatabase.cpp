@@ -197,7 +197,7 @@ bool ZPDatabase::hasElection(const ZPDElectionFilter& elections, std::string_vie
 }
 
 ZPDPlugIn::Ptr ZPDatabase::plugInForCandidate(const ARZephrinProxy::Ptr& proxy) {
-    if (!proxy->bundlePath()) {
+    if (!proxy->hasBundlePath()) {
         ZPDLogOps().info("skipping ar proxy %@ with nil bundleURL", *proxy);
         return nullptr;
     }
