@@ -2,6 +2,7 @@
 
 #include "Zephrin/ZPDError.h"
 #include "platform/file/File.h"
+#include "platform/log/Render.h"
 #include "zpd/Transaction.h"
 
 using platform::Value;
