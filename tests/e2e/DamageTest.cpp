@@ -1,6 +1,5 @@
 #include <csignal>
 #include <filesystem>
-#include <thread>
 
 #include <gtest/gtest.h>
 
@@ -24,8 +23,8 @@ std::size_t filesSetAside(const Home& home) {
     return count;
 }
 
-std::string overwritten(std::string content, std::size_t from, std::size_t to) {
-    for (std::size_t i = from; i < std::min(to, content.size()); ++i)
+std::string overwritten(std::string content, std::size_t from) {
+    for (std::size_t i = from; i < content.size(); ++i)
         content[i] = static_cast<char>(i * 37 + 11);
     return content;
 }
@@ -38,23 +37,21 @@ TEST(Damage, ARegistryDatabaseIsSetAsideAndRebuilt) {
 
     const std::vector<Case> cases = {
         {"no database at all", [](const std::string&) { return std::string(10000, 'x'); }},
-        {"header overwritten", [](const std::string& good) { return overwritten(good, 0, 100); }},
-        {"body overwritten",
-         [](const std::string& good) { return overwritten(good, 100, good.size()); }},
-        {"cut within the header", [](const std::string& good) { return good.substr(0, 50); }},
-        {"cut within the body",
+        {"body overwritten", [](const std::string& good) { return overwritten(good, 100); }},
+        {"cut short",
          [](const std::string& good) { return good.substr(0, good.size() / 2 + 100); }}};
     for (const Case& each : cases) {
         SCOPED_TRACE(each.what);
         const Home home;
         addAppWith(home, "A", {.identifier = "a"});
         addAppWith(home, "B", {.identifier = "b"});
+        const std::string database = home / "lib/AppRegistry.db";
         {
+            // What the first pass wrote is brought from the log into the database after it.
             Daemon first(home.path());
+            ASSERT_TRUE(eventually([&] { return fs::file_size(database) > 3 * 4096u; }));
             ASSERT_EQ(first.terminate(), 0);
         }
-        const std::string database = home / "lib/AppRegistry.db";
-        ASSERT_TRUE(fs::exists(database));
         fs::remove(database + "-wal");
         fs::remove(database + "-shm");
         writeFile(database, each.damage(readFile(database)), 0600);
@@ -87,36 +84,6 @@ TEST(Damage, AKilledDaemonStartsAgainWithWhatItKnew) {
     EXPECT_EQ(match(client, Item::map({})).size(), 50u);
     EXPECT_EQ(match(client, Item::map({{"HXExtensionIdentifier", "id7"}})).at(0)["uuid"], uuid);
     EXPECT_EQ(daemon.linesWith(" error: "), 0u);
-}
-
-TEST(Damage, ADaemonKilledWithinItsFirstPassStartsAgain) {
-    const Home home;
-    for (int i = 0; i < 200; ++i)
-        addAppWith(home, "App" + std::to_string(i), {.identifier = "id" + std::to_string(i)});
-    for (int wait = 0; wait < 5; ++wait) {
-        Daemon first(home.path(), {.waitUntilReady = false});
-        std::this_thread::sleep_for(wait * 10ms);
-        first.program().signal(SIGKILL);
-        first.program().exitStatus();
-    }
-    const Daemon daemon(home.path());
-    WireClient client = daemon.connect();
-    EXPECT_EQ(match(client, Item::map({})).size(), 200u);
-}
-
-TEST(Damage, PreferencesThatCannotBeReadExcludeNothing) {
-    const Home home;
-    addAppWith(home, "A", {.identifier = "a"});
-    const std::string file = home / "etc/Preferences/com.tovana.zephrin.userprefs.plist";
-    const Daemon daemon(home.path());
-    WireClient client = daemon.connect();
-    for (const char* content : {"", "junk", "<plist><array/></plist>"}) {
-        writeFile(file, content);
-        EXPECT_EQ(matched(client, Item::map({})), "a") << content;
-    }
-    fs::remove(file);
-    fs::create_directory(file);
-    EXPECT_EQ(matched(client, Item::map({})), "a");
 }
 
 } // namespace

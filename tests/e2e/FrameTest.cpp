@@ -165,33 +165,6 @@ TEST(Frames, AtTheLimitsAreServed) {
                   value("nearly 16 MiB", encode(Item::bytes(std::string((16 << 20) - 100, 'x'))))});
 }
 
-TEST(Frames, MayComeByteByByteOrManyAtOnce) {
-    const Home home;
-    const Daemon daemon(home.path());
-    WireClient dribbling = daemon.connect();
-    WireClient healthy = daemon.connect();
-    const std::string frame = Frame{.id = 1, .body = encode(envelope("match"))}.bytes();
-    for (const char byte : frame) {
-        dribbling.send(std::string_view(&byte, 1));
-        EXPECT_EQ(errorOf(healthy.request(envelope("match"))), "");
-    }
-    const std::optional<Frame> reply = dribbling.receive();
-    ASSERT_TRUE(reply);
-    EXPECT_EQ(reply->id, 1u);
-
-    std::string many;
-    for (std::uint64_t id = 0; id < 100; ++id)
-        many += Frame{.id = ~id, .body = encode(envelope("match"))}.bytes();
-    // Cut at places that no frame ends at.
-    for (std::size_t at = 0; at < many.size(); at += 1001)
-        dribbling.send(std::string_view(many).substr(at, 1001));
-    for (std::uint64_t id = 0; id < 100; ++id) {
-        const std::optional<Frame> each = dribbling.receive();
-        ASSERT_TRUE(each);
-        EXPECT_EQ(each->id, ~id);
-    }
-}
-
 TEST(Frames, AfterABrokenOneAreNotServed) {
     const Home home;
     const Daemon daemon(home.path());

@@ -18,10 +18,6 @@ namespace {
 // Bundles that others can write are not trusted, whatever mask the tests are run with.
 [[maybe_unused]] const auto maskOfThisProcess = umask(022);
 
-std::string nameOf(const std::string& path) {
-    return fs::path(path).stem().string();
-}
-
 } // namespace
 
 Home::Home() {
@@ -59,12 +55,10 @@ Item PlugIn::infoDictionary() const {
         .merged(info);
 }
 
-std::string addPlugIn(const std::string& app, const std::string& name, const PlugIn& plugIn,
-                      Format format) {
+std::string addPlugIn(const std::string& app, const std::string& name, const PlugIn& plugIn) {
     std::string path = app + "/PlugIns/" + name + ".appex";
-    const Item info = plugIn.infoDictionary();
-    writeFile(path + "/Info.plist", format == Format::xml ? xmlPlist(info) : binaryPlist(info));
-    writeFile(path + "/plugin", "#!/bin/sh\n# " + nameOf(path) + "\n", 0755);
+    writeFile(path + "/Info.plist", xmlPlist(plugIn.infoDictionary()));
+    writeFile(path + "/plugin", "#!/bin/sh\n# " + name + "\n", 0755);
     return path;
 }
 

@@ -41,11 +41,8 @@ struct PlugIn {
     [[nodiscard]] Item infoDictionary() const;
 };
 
-enum class Format { xml, binary };
-
 // Puts a plug-in into an application; answers its path.
-std::string addPlugIn(const std::string& app, const std::string& name, const PlugIn& plugIn,
-                      Format format = Format::xml);
+std::string addPlugIn(const std::string& app, const std::string& name, const PlugIn& plugIn);
 // An application "NAME.app" with one plug-in "NAME.appex"; answers the plug-in's path.
 std::string addAppWith(const Home& home, const std::string& name, const PlugIn& plugIn,
                        const std::string& folder = "Applications");

@@ -150,25 +150,6 @@ TEST(Pressure, ClientsThatNeverReadHarmNobodyAndAreGivenUp) {
     EXPECT_EQ(findAt(healthy, path)["path"], Item(path));
 }
 
-TEST(Pressure, HalfClosedClientsGetTheirReplies) {
-    const Home home;
-    const std::string path = addLargePlugIn(home);
-    const Daemon daemon(home.path(), {.logLevel = "error"});
-    WireClient client = daemon.connect();
-    for (std::uint64_t id = 0; id < 20; ++id)
-        client.send(findFrame(path, id));
-    // The first reply shows that all of it is taken up or will be.
-    std::optional<Frame> reply = client.receive();
-    client.halfClose();
-    std::size_t replies = 0;
-    for (; reply; reply = client.receive())
-        ++replies;
-    EXPECT_GE(replies, 1u);
-    EXPECT_LE(replies, 20u);
-    WireClient healthy = daemon.connect();
-    EXPECT_EQ(findAt(healthy, path)["path"], Item(path));
-}
-
 TEST(Pressure, AFloodBesideAHealthyClientDoesNotStarveIt) {
     const Home home;
     const std::string path = addLargePlugIn(home);

@@ -169,10 +169,6 @@ bool WireClient::ended(std::chrono::milliseconds patience) {
     return false;
 }
 
-void WireClient::halfClose() const {
-    shutdown(fd_, SHUT_WR);
-}
-
 Item envelope(const char* type, const Item& more) {
     return Item::map({{"request", type}, {"version", 3}}).merged(more);
 }

@@ -67,8 +67,6 @@ public:
 
     // Reads and drops frames until the daemon ends the connection; false when it does not.
     bool ended(std::chrono::milliseconds patience = 10s);
-    // Sends no more, and still reads.
-    void halfClose() const;
 
 private:
     bool readable(std::chrono::steady_clock::time_point until) const;
