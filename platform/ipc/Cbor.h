@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "platform/value/Error.h"
+#include "platform/value/TextPool.h"
 #include "platform/value/Value.h"
 
 namespace platform::ipc {
@@ -23,6 +24,7 @@ struct DecodeLimits {
     std::size_t maxValues = std::numeric_limits<std::size_t>::max(); // keys are not counted
     unsigned maxDepth = deepestNesting;
     bool allowEncoded = false; // tag 24 is read as a value of kind `encoded`, else refused
+    TextPool* keys = nullptr;  // where given, equal keys share their text
 };
 
 struct Decoded {

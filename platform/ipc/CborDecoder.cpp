@@ -164,6 +164,10 @@ bool CborDecoder::key(std::string_view& out) {
     return text(h.argument, out);
 }
 
+SharedBytes CborDecoder::sharedKey(std::string_view name) {
+    return limits_.keys ? limits_.keys->shared(name) : SharedBytes(name);
+}
+
 bool CborDecoder::map(Value& out, std::uint64_t count, unsigned depth) {
     if (!mayHold(count, 2, depth))
         return false;
@@ -173,7 +177,7 @@ bool CborDecoder::map(Value& out, std::uint64_t count, unsigned depth) {
         std::string_view name;
         if (!key(name))
             return false;
-        DictionaryEntry& entry = entries.emplace_back(SharedBytes(name), Value());
+        DictionaryEntry& entry = entries.emplace_back(sharedKey(name), Value());
         if (!item(entry.value, depth + 1))
             return false;
     }

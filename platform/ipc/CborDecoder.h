@@ -49,6 +49,7 @@ private:
     [[nodiscard]] bool array(Value& out, std::uint64_t count, unsigned depth);
     [[nodiscard]] bool map(Value& out, std::uint64_t count, unsigned depth);
     [[nodiscard]] bool key(std::string_view& out);
+    [[nodiscard]] SharedBytes sharedKey(std::string_view name);
     [[nodiscard]] bool mayHold(std::uint64_t count, std::size_t bytesEach, unsigned depth);
     [[nodiscard]] bool tagged(Value& out, std::uint64_t tag, const char* start);
     [[nodiscard]] bool date(Value& out);
