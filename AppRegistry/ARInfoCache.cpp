@@ -31,9 +31,10 @@ std::optional<Dictionary> ARInfoCache::recall(std::int64_t id) {
     return std::nullopt;
 }
 
-std::optional<Dictionary> ARInfoCache::fetch(const ARBundleRow& row) const {
+std::optional<Dictionary> ARInfoCache::fetch(const ARBundleRow& row) {
     if (const auto stored = store_->info(row.id)) {
-        const auto decoded = platform::ipc::decode(*stored);
+        const std::lock_guard lock(keysLock_);
+        const auto decoded = platform::ipc::decode(*stored, {.keys = &keys_});
         if (decoded && decoded->dictionary())
             return *decoded->dictionary();
     }

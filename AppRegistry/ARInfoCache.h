@@ -7,6 +7,7 @@
 #include <optional>
 
 #include "AppRegistry/ARModel.h"
+#include "platform/value/TextPool.h"
 #include "platform/value/Value.h"
 
 class ARStore;
@@ -30,10 +31,12 @@ private:
     };
 
     [[nodiscard]] std::optional<platform::Dictionary> recall(std::int64_t id);
-    [[nodiscard]] std::optional<platform::Dictionary> fetch(const ARBundleRow& row) const;
+    [[nodiscard]] std::optional<platform::Dictionary> fetch(const ARBundleRow& row);
 
     std::shared_ptr<const ARStore> store_;
-    std::mutex lock_; // held for a look or a change, never while decoding
+    std::mutex keysLock_;     // held while decoding
+    platform::TextPool keys_; // the keys of all dictionaries, which are much alike
+    std::mutex lock_;         // held for a look or a change
     std::array<Slot, remembered> slots_;
     std::size_t next_ = 0;
 };
