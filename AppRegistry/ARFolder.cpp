@@ -2,38 +2,35 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
 #include <dirent.h>
 #include <fcntl.h>
-#include <memory>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
 namespace {
 
+constexpr std::size_t listingRoom = 16384;
 constexpr int folderFlags = O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK;
 
-struct CloseListing {
-    void operator()(DIR* listing) const { ::closedir(listing); }
+// What the kernel writes for each name in a folder (getdents64). Read without a stream, which
+// would take a second descriptor and a large buffer for each of many small folders.
+struct RawEntry {
+    std::uint64_t inode;
+    std::int64_t next;
+    unsigned short size;
+    unsigned char type;
+    char name[1];
 };
 
-using Listing = std::unique_ptr<DIR, CloseListing>;
-
-Listing listingOf(int descriptor) {
-    const int own = ::openat(descriptor, ".", folderFlags);
-    if (own < 0)
-        return nullptr;
-    Listing listing(::fdopendir(own));
-    if (!listing)
-        ::close(own);
-    return listing;
-}
-
 // Some file systems do not tell the type with the name.
-ARFolder::EntryType typeOf(int folder, const ::dirent& entry) {
-    unsigned char type = entry.d_type;
+ARFolder::EntryType typeOf(int folder, const char* name, unsigned char type) {
     if (type == DT_UNKNOWN) {
         struct ::stat status = {};
-        if (::fstatat(folder, entry.d_name, &status, AT_SYMLINK_NOFOLLOW) != 0)
+        if (::fstatat(folder, name, &status, AT_SYMLINK_NOFOLLOW) != 0)
             return ARFolder::EntryType::other;
         type = IFTODT(status.st_mode);
     }
@@ -78,19 +75,24 @@ std::string ARFolder::pathOf(std::string_view name) const {
 }
 
 std::expected<std::vector<ARFolder::Entry>, int> ARFolder::entries(std::string_view suffix) const {
-    const Listing listing = listingOf(descriptor());
-    if (!listing)
-        return std::unexpected(errno);
+    alignas(std::uint64_t) char buffer[listingRoom];
     std::vector<Entry> found;
-    for (;;) {
-        errno = 0;
-        const ::dirent* entry = ::readdir(listing.get());
-        if (!entry)
-            break;
-        if (ARIsNamed(entry->d_name, suffix))
-            found.push_back({entry->d_name, typeOf(descriptor(), *entry)});
+    long filled = 0;
+    if (::lseek(descriptor(), 0, SEEK_SET) < 0)
+        return std::unexpected(errno);
+    while ((filled = ::syscall(SYS_getdents64, descriptor(), buffer, sizeof buffer)) > 0) {
+        for (long at = 0; at < filled;) {
+            const char* const raw = buffer + at;
+            std::uint16_t size = 0;
+            std::memcpy(&size, raw + offsetof(RawEntry, size), sizeof size);
+            const char* const name = raw + offsetof(RawEntry, name);
+            const auto type = static_cast<unsigned char>(raw[offsetof(RawEntry, type)]);
+            if (ARIsNamed(name, suffix))
+                found.push_back({name, typeOf(descriptor(), name, type)});
+            at += size;
+        }
     }
-    if (errno != 0)
+    if (filled < 0)
         return std::unexpected(errno);
     std::ranges::sort(found, {}, &Entry::name);
     return found;
