@@ -1,7 +1,9 @@
 #include "platform/file/File.h"
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
+#include <climits>
 #include <cstdlib>
 #include <ctime>
 #include <fcntl.h>
@@ -50,6 +52,25 @@ std::optional<Error> readUpTo(int fd, std::size_t largest, const std::string& pa
     }
     out.resize(filled);
     return std::nullopt;
+}
+
+// The kernel walks a path once and then knows its canonical form: realpath(3) walks it once for
+// each of its parts, which takes long for the thousand parts that a path may have.
+std::optional<std::string> pathOfOpen(int fd) {
+    std::array<char, PATH_MAX> room;
+    const std::string link = "/proc/self/fd/" + std::to_string(fd);
+    const ssize_t length = ::readlink(link.c_str(), room.data(), room.size());
+    if (length <= 0 || static_cast<std::size_t>(length) == room.size() || room[0] != '/')
+        return std::nullopt;
+    return std::string(room.data(), static_cast<std::size_t>(length));
+}
+
+std::expected<std::string, int> realPath(const std::string& path) {
+    const std::unique_ptr<char, decltype(&std::free)> found(::realpath(path.c_str(), nullptr),
+                                                            &std::free);
+    if (!found)
+        return std::unexpected(errno);
+    return std::string(found.get());
 }
 
 } // namespace
@@ -114,11 +135,14 @@ std::expected<FileContent, Error> readRegularFile(const std::string& path, std::
 std::expected<std::string, int> canonicalPath(std::string_view path) {
     if (hasNul(path))
         return std::unexpected(ENOENT);
-    const std::unique_ptr<char, decltype(&std::free)> found(
-        ::realpath(std::string(path).c_str(), nullptr), &std::free);
-    if (!found)
+    if (path.size() >= PATH_MAX)
+        return std::unexpected(ENAMETOOLONG);
+    const std::string text(path);
+    const UniqueFd found(::open(text.c_str(), O_PATH | O_CLOEXEC));
+    if (!found && errno != EMFILE && errno != ENFILE)
         return std::unexpected(errno);
-    return std::string(found.get());
+    auto canonical = found ? pathOfOpen(found.get()) : std::nullopt;
+    return canonical ? std::expected<std::string, int>(std::move(*canonical)) : realPath(text);
 }
 
 bool isPlainName(std::string_view name) {

@@ -81,7 +81,7 @@ struct FileContent {
 writeFileAtomically(const std::string& path, std::string_view bytes, unsigned mode = 0644);
 
 // The canonical absolute path of an existing file or folder. A text with NUL in it never
-// resolves. On failure the errno value.
+// resolves, nor does one that is longer than a path can be. On failure the errno value.
 [[nodiscard]] std::expected<std::string, int> canonicalPath(std::string_view path);
 
 // True for the name of one file: 1 to 255 bytes without "/", NUL or control characters, and neither

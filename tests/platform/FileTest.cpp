@@ -1,6 +1,7 @@
 #include "platform/file/File.h"
 
 #include <cerrno>
+#include <climits>
 #include <fcntl.h>
 #include <filesystem>
 #include <sys/stat.h>
@@ -96,6 +97,10 @@ TEST(CanonicalPath, ResolvesOnlyWhatIsThere) {
     EXPECT_EQ(canonicalPath(folder / "loop").error(), ELOOP);
     EXPECT_EQ(canonicalPath(file + std::string("\0x", 2)).error(), ENOENT);
     EXPECT_EQ(canonicalPath("").error(), ENOENT);
+    std::string winding = folder.path();
+    while (winding.size() < PATH_MAX)
+        winding += "/../" + fs::path(folder.path()).filename().string();
+    EXPECT_EQ(canonicalPath(winding).error(), ENAMETOOLONG);
 }
 
 TEST(MakeFolders, MakesWhatIsMissing) {
