@@ -36,6 +36,8 @@ TEST(RulePatterns, CountsEachOneAndEachAlternative) {
         {"in two rules", {{"k", alternatives(mostRulePatterns)}, {"l", "x"}}, true},
         {"nested", {{"k", Array{alternatives(mostRulePatterns), "x"}}}, true},
         {"an offer", {{"k", keys(mostRulePatterns + 1)}}, true},
+        {"text", {{"k", std::string(mostRuleText, '0')}}, false},
+        {"more text", {{"k", Array{std::string(mostRuleText, '0'), "0"}}}, true},
         {"empty ones count too", {{"k", alternatives(mostRulePatterns)}, {"l", Array()}}, true},
     };
 

@@ -1,30 +1,36 @@
 #include "zpd/requests/RulePatterns.h"
 
-#include <algorithm>
-
 using platform::Array;
 using platform::Dictionary;
 using platform::Value;
 
 namespace {
 
-std::size_t patternsIn(const Value& pattern) {
-    std::size_t count = 0;
+struct Load {
+    std::size_t patterns = 0;
+    std::size_t text = 0;
+};
+
+void add(Load& load, const Value& pattern) {
+    const std::size_t before = load.patterns;
     if (const Array* const alternatives = pattern.array()) {
         for (const Value& alternative : *alternatives)
-            count += patternsIn(alternative);
+            add(load, alternative);
     } else if (const Dictionary* const offer = pattern.dictionary()) {
         for (const auto& entry : *offer)
-            count += patternsIn(entry.value);
+            add(load, entry.value);
+    } else if (const auto text = pattern.string()) {
+        load.text += text->size();
     }
-    return std::max<std::size_t>(count, 1);
+    if (load.patterns == before)
+        ++load.patterns;
 }
 
 } // namespace
 
 bool hasTooManyPatterns(const Dictionary& rules) {
-    std::size_t count = 0;
+    Load load;
     for (const auto& rule : rules)
-        count += patternsIn(rule.value);
-    return count > mostRulePatterns;
+        add(load, rule.value);
+    return load.patterns > mostRulePatterns || load.text > mostRuleText;
 }
