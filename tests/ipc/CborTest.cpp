@@ -204,13 +204,6 @@ TEST(CborTest, NestingEndsAtSixtyFour) {
     EXPECT_FALSE(decodeRecord(bytes("d8 18 58 41") + nested(65)));
 }
 
-TEST(CborTest, ValuesAreCountedWithoutKeys) {
-    const std::string text = encode(Dictionary{{"a", Array{1, 2}}, {"b", "c"}});
-    EXPECT_EQ(decodeCounted(text)->values, 5U);
-    EXPECT_TRUE(decode(text, {.maxValues = 5}));
-    EXPECT_FALSE(decode(text, {.maxValues = 4}));
-}
-
 TEST(CborTest, WritesValidTextWhateverTheValueHolds) {
     EXPECT_EQ(encode("a\xff"), bytes("64 61 efbfbd"));
     EXPECT_EQ(encode(Dictionary{{"\xc3", 1}}), bytes("a1 63 efbfbd 01"));

@@ -46,8 +46,8 @@ protected:
         return seen_->results.back();
     }
 
-    TemporaryFolder folder_;
-    const std::string path_ = folder_.path() + "/run/service";
+    TestFolder folder_;
+    const std::string path_ = folder_ / "run/service";
     std::shared_ptr<SerialQueue> queue_ = std::make_shared<SerialQueue>("client");
     std::shared_ptr<Seen> seen_ = std::make_shared<Seen>();
     std::unique_ptr<ClientConnection> client_;

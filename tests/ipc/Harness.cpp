@@ -1,8 +1,6 @@
 #include "tests/ipc/Harness.h"
 
 #include <chrono>
-#include <cstdlib>
-#include <filesystem>
 #include <stdexcept>
 #include <sys/socket.h>
 #include <sys/un.h>
@@ -20,18 +18,6 @@ namespace {
 constexpr std::chrono::seconds patience{20};
 
 } // namespace
-
-TemporaryFolder::TemporaryFolder() {
-    std::string name = std::filesystem::temp_directory_path() / "ipc-test-XXXXXX";
-    if (!::mkdtemp(name.data()))
-        throw std::runtime_error("mkdtemp");
-    path_ = name;
-}
-
-TemporaryFolder::~TemporaryFolder() {
-    std::error_code ignored;
-    std::filesystem::remove_all(path_, ignored);
-}
 
 void Counter::add(int count) {
     const std::lock_guard lock(mutex_);

@@ -20,22 +20,9 @@
 #include "platform/ipc/Message.h"
 #include "platform/queue/SerialQueue.h"
 #include "platform/value/Value.h"
+#include "tests/platform/TestFolder.h"
 
 namespace tests {
-
-// A folder that goes with the test.
-class TemporaryFolder {
-public:
-    TemporaryFolder();
-    TemporaryFolder(const TemporaryFolder&) = delete;
-    TemporaryFolder& operator=(const TemporaryFolder&) = delete;
-    ~TemporaryFolder();
-
-    [[nodiscard]] const std::string& path() const { return path_; }
-
-private:
-    std::string path_;
-};
 
 // A number that tests wait for.
 class Counter {

@@ -1,22 +1,18 @@
 // What ZPDaemonClient puts on the wire, and what it makes of replies.
 
 #include <functional>
-#include <memory>
 #include <optional>
 #include <stdexcept>
 #include <string>
 #include <utility>
-#include <variant>
 
 #include <gtest/gtest.h>
 
 #include "Zephrin/ZPDError.h"
 #include "Zephrin/ZPDaemonClient.h"
 #include "platform/ipc/Cbor.h"
-#include "platform/ipc/Connection.h"
-#include "platform/ipc/Listener.h"
-#include "platform/ipc/Loop.h"
 #include "platform/paths/Places.h"
+#include "tests/ipc/Harness.h"
 #include "tests/server/Awaited.h"
 #include "tests/server/TemporaryHome.h"
 
@@ -26,50 +22,8 @@ using platform::Array;
 using platform::Dictionary;
 using platform::Uuid;
 using platform::Value;
-using platform::ipc::Connection;
 using platform::ipc::ConnectionError;
 using Reply = ZPDaemonClient::Reply;
-
-// A daemon that answers each request with {"echo": the request}.
-class EchoService {
-public:
-    explicit EchoService(const std::string& name) : loop_("echo") {
-        auto listener = platform::ipc::Listener::create(
-            loop_, platform::Places::forThisProcess().socketPath(name),
-            [](platform::ipc::ListenerEvent event) {
-                if (auto* const peer = std::get_if<std::shared_ptr<Connection>>(&event))
-                    serve(*peer);
-            });
-        if (!listener)
-            throw std::runtime_error(platform::describe(listener.error()));
-        listener_ = std::move(*listener);
-        loop_.start();
-        listener_->resume();
-    }
-
-    ~EchoService() {
-        listener_.reset();
-        loop_.stop();
-    }
-
-private:
-    static void serve(const std::shared_ptr<Connection>& peer) {
-        peer->setEventHandler([weak = std::weak_ptr(peer)](platform::ipc::Event event) {
-            auto* const request = std::get_if<platform::ipc::Message>(&event);
-            const auto there = weak.lock();
-            if (!request || !there)
-                return;
-            auto reply = platform::ipc::createReply(*request);
-            reply.body.set("echo", request->body);
-            there->send(reply);
-            request->ticket.taken();
-        });
-        peer->resume();
-    }
-
-    platform::ipc::Loop loop_;
-    std::unique_ptr<platform::ipc::Listener> listener_;
-};
 
 class ClientLibrary : public testing::Test {
 protected:
@@ -81,16 +35,9 @@ protected:
         return arrived.get();
     }
 
-    // What `call` sends, as it arrives.
-    template <class Call>
-    Dictionary sentBy(Call&& call) {
-        const Reply reply = replyTo(std::forward<Call>(call));
-        const Value* const echo = reply ? reply->find("echo") : nullptr;
-        return echo && echo->dictionary() ? *echo->dictionary() : Dictionary();
-    }
-
     TemporaryHome home_;
-    EchoService service_{"com.tovana.test.echo"};
+    tests::EchoServer service_{
+        platform::Places::forThisProcess().socketPath("com.tovana.test.echo")};
     ZPDaemonClient client_{"com.tovana.test.echo"};
     const Uuid one_ = *Uuid::parse("00112233-4455-6677-8899-AABBCCDDEEFF");
     const Uuid two_ = *Uuid::parse("FFEEDDCC-BBAA-9988-7766-554433221100");
@@ -148,22 +95,7 @@ TEST_F(ClientLibrary, SendsTheKeysOfEachRequest) {
     };
 
     for (const auto& test : cases)
-        EXPECT_EQ(describe(sentBy(test.call)), describe(test.sent));
-}
-
-TEST_F(ClientLibrary, RepliesComeInOrderOnItsQueue) {
-    const Awaited<int> last;
-    int seen = 0;
-    constexpr int count = 50;
-    for (int i = 0; i < count; ++i) {
-        client_.bulkPlugins(static_cast<std::uint64_t>(i), [&seen, last, i](const Reply& reply) {
-            EXPECT_EQ(reply->find("echo")->dictionary()->find("flags")->integerValue(), i);
-            EXPECT_EQ(seen, i);
-            if (++seen == count)
-                last.bring(seen);
-        });
-    }
-    EXPECT_EQ(last.get(), count);
+        EXPECT_EQ(describe(replyTo(test.call).value()), describe(test.sent));
 }
 
 TEST_F(ClientLibrary, AnAbsentDaemonIsAnErrorInTheReply) {

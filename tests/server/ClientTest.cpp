@@ -34,13 +34,6 @@ TEST_F(Client, IsServedWithoutPathAndBundle) {
     EXPECT_TRUE(askThroughClient({{"version", 3}, {"request", "match"}})->contains("matches"));
 }
 
-TEST_F(Client, CountsItsRequests) {
-    (void)client(); // connected by a first one
-    for (int i = 0; i < 3; ++i)
-        (void)askThroughClient({{"version", 3}, {"request", "nonsense"}});
-    onServiceQueue([&] { EXPECT_EQ(client()->requestCount(), 4U); });
-}
-
 TEST_F(Client, IsGoneWithItsConnection) {
     (void)client();
     disconnect();

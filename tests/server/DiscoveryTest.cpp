@@ -43,14 +43,6 @@ TEST_F(Discovery, FollowsTheRegistrysOrder) {
     EXPECT_EQ(names(match()), (Names{"c 1", "a 1", "b 1"}));
 }
 
-TEST_F(Discovery, NarrowsByRules) {
-    addPlugIn("a", "2.9");
-    addPlugIn("b", "2.10");
-    const Dictionary rules{{"HXExtensionVersion", ">=2.10"}};
-    EXPECT_EQ(names(match(0, {{"rules", rules}})), Names{"b 2.10"});
-    EXPECT_EQ(match(0, {{"rules", Dictionary()}}).size(), 2U);
-}
-
 TEST_F(Discovery, FiltersByPlaceUnlessPrivileged) {
     addPlugIn("in-application");
     const auto alone = addPlugIn("system");
@@ -65,12 +57,6 @@ TEST_F(Discovery, FiltersByPlaceUnlessPrivileged) {
     EXPECT_EQ(names(match(systemOnly)), Names{"system 1"});
     EXPECT_EQ(match(everything).size(), 3U);
     EXPECT_EQ(match(everything | systemOnly).size(), 3U) << "counts only without the other";
-}
-
-TEST_F(Discovery, OfEverythingNeedsEntitlementAndNoSandbox) {
-    const std::string denied = "11 unauthorized discovery flag (ZPDiscoverAll)";
-    const Dictionary request{{"version", 3}, {"request", "match"}, {"flags", everything}};
-    EXPECT_EQ(failureOf(request), denied);
 }
 
 TEST_F(Discovery, OfEverythingIsRefusedToAConfinedManager) {
@@ -98,11 +84,6 @@ TEST_F(Discovery, ShowsDedicatedPlugInsToTheirOwnApplicationOnly) {
     makeClientManager();
     EXPECT_EQ(names(match()), (Names{"mine 1", "not-dedicated 1"}));
     EXPECT_EQ(match(everything).size(), 3U);
-}
-
-TEST_F(Discovery, HidesDedicatedPlugInsFromAClientWithoutBundle) {
-    setKey(*addPlugIn("dedicated"), "Dedicated", true);
-    EXPECT_TRUE(match().empty());
 }
 
 TEST_F(Discovery, LeavesOutWhatIsOnHold) {

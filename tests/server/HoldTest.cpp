@@ -1,4 +1,3 @@
-#include "platform/process/ProcessActivity.h"
 #include "tests/server/ServerFixture.h"
 #include "zpd/ZPDIpcClient.h"
 
@@ -25,15 +24,6 @@ TEST_F(Hold, BlocksUntilItIsReleasedByToken) {
     server().unholdToken(hold->uuid());
     EXPECT_FALSE(server().holdOnPlugIn(*plugIn));
     EXPECT_EQ(platform_.notifications.posted, Posts(2, change));
-}
-
-TEST_F(Hold, KeepsTheProcessBusy) {
-    const std::size_t before = platform::ProcessActivity::openCount();
-    {
-        const ZPDPlugInHold hold({}, {});
-        EXPECT_EQ(platform::ProcessActivity::openCount(), before + 1);
-    }
-    EXPECT_EQ(platform::ProcessActivity::openCount(), before);
 }
 
 TEST_F(Hold, AllGoWithOnePostWhenTheServerStops) {

@@ -1,5 +1,3 @@
-#include <filesystem>
-
 #include "tests/server/ServerFixture.h"
 
 namespace {
@@ -53,30 +51,6 @@ TEST_F(Lookup, TakesOneUUIDOrOneURLAndThePathDecides) {
 
     for (const auto& test : cases)
         EXPECT_EQ(find(test.keys), test.found) << describe(test.keys);
-}
-
-TEST_F(Lookup, ResolvesThePathOfTheURL) {
-    std::filesystem::create_directories(folder_ / "A B.app/PlugIns/x.appex");
-    std::filesystem::create_directory_symlink(folder_ / "A B.app", folder_ / "link");
-    addPlugIn("x")->path = folder_ / "A B.app/PlugIns/x.appex";
-    EXPECT_EQ(find({{"paths", "file://" + (folder_ / "A%20B.app/PlugIns/../PlugIns/x.appex")}}),
-              "x");
-    EXPECT_EQ(find({{"paths", "file://" + (folder_ / "link/PlugIns/x.appex/")}}), "x");
-}
-
-TEST_F(Lookup, RepliesWithTheWholeForm) {
-    const auto plugIn = addPlugIn("com.example.a", "1.5");
-    plugIn->name = "Sample";
-    const auto form = matchesIn(ask("find", {{"uuids", plugIn->uuid}}));
-    ASSERT_TRUE(form && form->dictionary());
-    const Dictionary& keys = *form->dictionary();
-    EXPECT_EQ(textIn(keys, "uuid"), plugIn->uuid.text());
-    EXPECT_EQ(textIn(keys, "version"), "1.5");
-    EXPECT_EQ(textIn(keys, "localizedDisplayName"), "Sample");
-    EXPECT_EQ(*keys.find("annotations"), Value(Dictionary()));
-    EXPECT_TRUE(keys.contains("extensions"));
-    EXPECT_EQ(textIn(keys, "service-extension"), "token for com.example.a");
-    EXPECT_FALSE(keys.contains("overrider"));
 }
 
 TEST_F(Lookup, AttachesWhatWasStored) {

@@ -18,15 +18,6 @@ std::optional<ZPDOptions> parse(std::vector<std::string> arguments) {
     return ZPDOptions::parse(static_cast<int>(arguments.size()), argv.data());
 }
 
-TEST(Options, HaveDefaults) {
-    const auto options = parse({});
-    ASSERT_TRUE(options);
-    EXPECT_EQ(options->cacheLimit, 1'000'000U);
-    EXPECT_FALSE(options->databasePath);
-    EXPECT_EQ(options->serviceName, "com.tovana.zephrin.zpd");
-    EXPECT_EQ(options->verbose, 0U);
-}
-
 TEST(Options, TakeTheLastOfRepeatedOnesAndCountVerbose) {
     const auto options = parse({"-c", "7", "-vS", "first", "-S", "second", "-d/a", "-v", "-c9"});
     ASSERT_TRUE(options);
