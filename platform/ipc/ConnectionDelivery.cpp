@@ -39,6 +39,11 @@ void Ticket::taken() {
         connection_->impl().requestTaken();
 }
 
+void Ticket::takenOnLoop() {
+    if (connection_ && !std::exchange(taken_, true))
+        connection_->impl().requestTakenOnLoop();
+}
+
 void Ticket::finish() {
     if (!connection_)
         return;
@@ -107,6 +112,13 @@ void Connection::Impl::requestTaken() {
     std::unique_lock lock(mutex);
     untaken = false;
     deliver(lock);
+}
+
+void Connection::Impl::requestTakenOnLoop() {
+    if (loop.isCurrent())
+        requestTaken();
+    else
+        post(&Impl::requestTaken);
 }
 
 void Connection::Impl::requestFinished(std::size_t cost) {

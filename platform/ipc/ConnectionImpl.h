@@ -57,6 +57,7 @@ struct Connection::Impl final : SocketWatch::Target {
     // Delivery. Any thread.
     void enqueue(Message message, std::size_t cost);
     void requestTaken();
+    void requestTakenOnLoop();
     void requestFinished(std::size_t cost);
     void deliver(std::unique_lock<std::mutex>& lock);
     [[nodiscard]] bool mayDeliver() const;

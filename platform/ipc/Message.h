@@ -39,6 +39,8 @@ public:
     // The request is off the queue: the connection may hand out its next one, and does so right
     // here, on the calling thread. Called when the request's handler has returned.
     void taken();
+    // The same, but the next one is handed out on the connection's loop.
+    void takenOnLoop();
 
 private:
     void finish();
