@@ -55,6 +55,9 @@ public:
     // The handler has returned: the connection may hand out its next request.
     void taken() { request_.ticket.taken(); }
 
+    // The same, but the next one comes in on the loop.
+    void takenOnLoop() { request_.ticket.takenOnLoop(); }
+
     // Gets each path with whether it could be resolved (then it is canonical, else as received),
     // and tells whether to go on; when not, it has failed the transaction.
     using PathBlock = std::function<bool(const std::string& path, bool resolved)>;

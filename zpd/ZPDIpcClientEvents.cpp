@@ -20,10 +20,11 @@ namespace {
 
 // A client that sends one brief request after the other goes on upon the loop, where all clients
 // take turns, also when one of them had to wait for the queue's own thread.
-void letNextIn(ZPDServer& server, const std::shared_ptr<Transaction>& transaction, bool wasBrief) {
-    if (!wasBrief || server.ipcLoop().isCurrent())
-        return transaction->taken();
-    server.ipcLoop().post([transaction] { transaction->taken(); });
+void letNextIn(Transaction& transaction, bool wasBrief) {
+    if (wasBrief)
+        transaction.takenOnLoop();
+    else
+        transaction.taken();
 }
 
 } // namespace
@@ -51,7 +52,7 @@ void ZPDIpcClient::handleRequest(Message message) {
     server_.submitWork(
         [client = shared_from_this(), transaction] { client->carryOut(*transaction); },
         brief ? ZPDServer::Work::brief : ZPDServer::Work::any,
-        [&server = server_, transaction, brief] { letNextIn(server, transaction, brief); });
+        [transaction, brief] { letNextIn(*transaction, brief); });
 }
 
 void ZPDIpcClient::carryOut(Transaction& transaction) {

@@ -72,8 +72,6 @@ public:
     void submitWork(platform::SerialQueue::Block block, Work work = Work::any,
                     platform::SerialQueue::Block afterwards = {});
 
-    [[nodiscard]] platform::ipc::Loop& ipcLoop() { return ipcLoop_; }
-
     void assertOnServiceQueue() const { mainQueue_.assertOnQueue(); }
 
     // ---- Holds (ZPDServerHolds.cpp). Any thread.
