@@ -23,6 +23,9 @@ constexpr std::int64_t storeVersion = 16;
 constexpr const char* versionKey = "version";
 constexpr const char* dataKey = "data";
 
+constexpr const char* unableToLoad =
+    "unable to load annotation database:%{public}@ error:%{public}@ (resetting)";
+
 constexpr const char* globalStore = "/var/db/Zephrin-Annotations";
 constexpr const char* storeFile = "/Zephrin-Annotations";
 constexpr const char* olderContainer = "com.tovana.zpd";
@@ -133,9 +136,7 @@ ZPDAnnotationStore::ZPDAnnotationStore(const std::optional<std::string>& databas
     if (!failure)
         return;
     if (!isMissingFile(*failure)) {
-        ZPDLogOps().error("unable to load annotation database:%{public}@ error:%{public}@ "
-                          "(resetting)",
-                          fileURLFromPath(path_), *failure);
+        ZPDLogOps().error(unableToLoad, fileURLFromPath(path_), *failure);
     }
     migrate();
 }
