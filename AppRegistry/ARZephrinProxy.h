@@ -3,6 +3,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <vector>
 
 #include "AppRegistry/ARApplicationProxy.h"
 #include "platform/value/Uuid.h"
@@ -45,3 +46,5 @@ public:
 
 // "<ARZephrinProxy identifier uuid path>", for log lines.
 [[nodiscard]] std::string describe(const ARZephrinProxy& proxy);
+// "(<...>, <...>)"
+[[nodiscard]] std::string describeAll(const std::vector<ARZephrinProxy::Ptr>& proxies);

@@ -82,6 +82,6 @@ void ZPDServer::handle(ListenerEvent event) {
 // Runs on the registry's queue.
 void ZPDServer::removedPlugIns(const std::vector<ARZephrinProxy::Ptr>& plugIns) {
     // No plug-in process is ever started by this daemon, so that there is none to end.
-    for (const auto& plugIn : plugIns)
-        ZPDLogOps().debug("removal complete for %@", *plugIn);
+    if (ZPDLogOps().enabled(platform::log::Level::debug))
+        ZPDLogOps().debug("removal complete for %@", describeAll(plugIns));
 }

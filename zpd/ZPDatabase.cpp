@@ -20,15 +20,6 @@ namespace {
 
 constexpr std::int64_t elected = 1;
 
-std::string describeAll(const ARApplicationWorkspace::PlugIns& proxies) {
-    std::string text = "(";
-    for (const auto& proxy : proxies) {
-        text += text.size() > 1 ? ", " : "";
-        text += describe(*proxy);
-    }
-    return text + ")";
-}
-
 std::string shown(const std::optional<std::string>& text) {
     return text.value_or("(null)");
 }
