@@ -174,11 +174,10 @@ void ARPass::replace(ARBundleRow&& row) {
     batch_.updated.push_back(shared);
 }
 
-void ARPass::remove(const ARRowPtr& row) {
-    const ARRowPtr kept = row;
-    model_.remove(kept->path.view());
-    batch_.changes.removed.push_back(kept->id);
-    batch_.removed.push_back(kept);
+void ARPass::remove(ARRowPtr row) {
+    model_.remove(row->path.view());
+    batch_.changes.removed.push_back(row->id);
+    batch_.removed.push_back(std::move(row));
     batch_.visible = true;
 }
 

@@ -57,7 +57,7 @@ private:
     void enlist(ARBundleContent&& content, const ARCandidate& candidate, const ARBundleRow* old);
     void refresh(const ARBundleRow& old, const ARCandidate& candidate, const ARStamps& stamps);
     void replace(ARBundleRow&& row);
-    void remove(const ARRowPtr& row);
+    void remove(ARRowPtr row);
     void removeUnseen();
     [[nodiscard]] bool maybeThere(std::string_view path) const;
     void flushWhenDue();
