@@ -75,20 +75,5 @@ TEST(Bundles, ThatAreBrokenAreSkippedAndSaidOnce) {
     }
 }
 
-// Between the registry's pass and a request a bundle may go away.
-TEST(Bundles, ThatVanishHarmNobody) {
-    const Home home;
-    const std::string gone = addAppWith(home, "Gone", {.identifier = "gone"});
-    addAppWith(home, "Good", {.identifier = "good"});
-    Daemon daemon(home.path());
-    WireClient client = daemon.connect();
-    fs::remove_all(home / "Applications/Gone.app");
-    const std::string left = matched(client, Item::map({}));
-    EXPECT_TRUE(left == "good" || left == "gone good") << left;
-    client.request(findRequest(Item::map({{"paths", "file://" + gone}})));
-    EXPECT_TRUE(matched(client, Item::map({})).ends_with("good"));
-    EXPECT_EQ(daemon.terminate(), 0);
-}
-
 } // namespace
 } // namespace e2e

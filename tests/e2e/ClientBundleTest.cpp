@@ -70,19 +70,5 @@ TEST(ClientBundle, HidesOtherRegistrationsOfItsOwnPlugIns) {
     EXPECT_TRUE(daemon.logs(" @ '" + theirs + "' in favor of bundle-relative '" + mine + "'"));
 }
 
-TEST(ClientBundle, SeesItsOwnDedicatedPlugIns) {
-    const Home home;
-    const std::string app = addHost(home, "Host");
-    const Item dedicated = Item::map({{"Dedicated", true}});
-    const std::string mine = addPlugIn(app, "Mine", {.identifier = "mine", .extension = dedicated});
-    addAppWith(home, "Other", {.identifier = "theirs", .extension = dedicated});
-    // Not the executable that the application names: it has no bundle.
-    const std::string helper = app + "/helper";
-    std::filesystem::copy_file(builtProgram("e2e_relay"), helper);
-    const Daemon daemon(home.path());
-    EXPECT_EQ(pathsOf(answerTo(app + "/Host", home, daemon, envelope("match"))), mine);
-    EXPECT_EQ(pathsOf(answerTo(helper, home, daemon, envelope("match"))), "");
-}
-
 } // namespace
 } // namespace e2e

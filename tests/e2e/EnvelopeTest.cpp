@@ -116,20 +116,6 @@ TEST(Envelope, OneWayMessagesAreCarriedOutAndNotAnswered) {
     EXPECT_TRUE(daemon.logs("requested no-answer-please"));
 }
 
-TEST(Envelope, GreetingIsAChallengeThatMayBeAnswered) {
-    const Home home;
-    const Daemon daemon(home.path());
-    WireClient one = daemon.connect();
-    const WireClient two = daemon.connect();
-    ASSERT_EQ(one.greeting().keys(), std::vector<std::string>{"challenge"});
-    const Item& challenge = one.greeting()["challenge"];
-    EXPECT_EQ(challenge.kind(), Item::Kind::bytes);
-    EXPECT_EQ(challenge.text().size(), 16u);
-    EXPECT_NE(challenge, two.greeting()["challenge"]);
-    one.answerGreeting();
-    EXPECT_EQ(errorOf(one.request(envelope("match"))), "");
-}
-
 TEST(Envelope, ClientsAreCountedInTheLog) {
     const Home home;
     Daemon daemon(home.path());

@@ -55,22 +55,5 @@ TEST(Find, TakesAUuidOrAFileUrl) {
     EXPECT_TRUE(daemon.logs("ops default: plugin not found"));
 }
 
-TEST(Find, KeepsUuidsOverARestartAndGivesNewOnesToChangedBundles) {
-    const Home home;
-    const std::string same = addAppWith(home, "Same", {});
-    const std::string changed = addAppWith(home, "Changed", {.identifier = "com.example.changed"});
-    std::vector<Item> uuids;
-    for (int start = 0; start < 2; ++start) {
-        Daemon daemon(home.path());
-        WireClient client = daemon.connect();
-        for (const std::string& path : {same, changed})
-            uuids.push_back(findAt(client, path)["uuid"]);
-        ASSERT_EQ(daemon.terminate(), 0);
-        writeFile(changed + "/plugin", "#!/bin/sh\n# another\n", 0755);
-    }
-    EXPECT_EQ(uuids[0], uuids[2]);
-    EXPECT_NE(uuids[1], uuids[3]);
-}
-
 } // namespace
 } // namespace e2e

@@ -273,34 +273,13 @@ Item decode(std::string_view bytes) {
 }
 
 std::ostream& operator<<(std::ostream& out, const Item& item) {
-    switch (item.kind()) {
-    case Item::Kind::null:
-        return out << "null";
-    case Item::Kind::boolean:
-        return out << (item.truth() ? "true" : "false");
-    case Item::Kind::number:
-        return out << item.number();
-    case Item::Kind::negative:
-        return out << item.integer();
-    case Item::Kind::real:
-        return out << item.real();
-    case Item::Kind::text:
-        return out << '"' << item.text() << '"';
-    case Item::Kind::bytes:
-        return out << '<' << item.text().size() << " bytes>";
-    default:
-        break;
-    }
-    if (item.kind() == Item::Kind::tag)
-        out << item.number();
-    out << (item.kind() == Item::Kind::map ? '{' : '[');
-    for (std::size_t i = 0; i < item.items().size(); ++i) {
-        out << (i ? ", " : "");
-        if (item.kind() == Item::Kind::map)
-            out << item.keys_[i] << ": ";
-        out << item.items()[i];
-    }
-    return out << (item.kind() == Item::Kind::map ? '}' : ']');
+    out << (item.isNull() ? "null" : item.text());
+    if (item.text().empty() && item.items().empty())
+        out << (item.kind() == Item::Kind::real ? item.real() : double(item.integer()));
+    for (std::size_t i = 0; i < item.items().size(); ++i)
+        out << (i ? ", " : "(") << (item.keys_.empty() ? "" : item.keys_[i] + ": ")
+            << item.items()[i];
+    return out << (item.items().empty() ? "" : ")");
 }
 
 } // namespace e2e

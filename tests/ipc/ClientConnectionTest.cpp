@@ -92,20 +92,6 @@ TEST_F(ClientConnectionTest, PendingRequestsOfALostDaemonAreInterruptedOnce) {
     EXPECT_EQ(askAndWait({{"a", 1}}), Result(std::unexpected(ConnectionError::invalid)));
 }
 
-TEST_F(ClientConnectionTest, FirstOfSeveralRepliesCounts) {
-    EchoServer server(path_, {}, [](Connection& connection, const Message& message) {
-        Reply reply = createReply(message);
-        for (const char* text : {"first", "second", "third"}) {
-            reply.body.set("text", text);
-            connection.send(reply);
-        }
-    });
-    connect();
-    for (int i = 0; i < 3; ++i)
-        EXPECT_EQ(*askAndWait({{"a", i}})->find("text"), Value("first"));
-    EXPECT_EQ(seen_->replies.value(), 3);
-}
-
 TEST_F(ClientConnectionTest, AnswersTheGreetingBeforeItsFirstRequest) {
     EchoServer server(path_, {}, [](Connection& connection, const Message& message) {
         Reply reply = createReply(message);

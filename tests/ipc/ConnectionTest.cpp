@@ -143,31 +143,6 @@ TEST_F(ConnectionTest, AReplyPastTheLimitsBecomesAShortError) {
     EXPECT_EQ(reply->body, (Dictionary{{"errorcode", 4}, {"error", "invalid request format"}}));
 }
 
-TEST_F(ConnectionTest, AClientThatNeverReadsIsLeftAloneAndEnded) {
-    Limits limits;
-    limits.stalled = std::chrono::milliseconds(400);
-    EchoServer server(path_, limits, [](Connection& connection, const Message& message) {
-        Reply reply = createReply(message);
-        reply.body.set("data", Data{SharedBytes(std::string(100'000, 'x'))});
-        connection.send(reply);
-    });
-    RawClient deaf(path_);
-    std::string flood;
-    for (std::uint64_t i = 0; i < 500; ++i)
-        flood += request(i, Dictionary{{"a", 1}});
-    ASSERT_TRUE(deaf.write(flood));
-    RawClient other(path_);
-    for (int i = 0; i < 20; ++i) {
-        other.write(request(1, Dictionary{}));
-        ASSERT_TRUE(other.read());
-    }
-    // A few replies fill its socket; the rest is not even begun.
-    EXPECT_LT(server.requests.value(), 20 + 20);
-    EXPECT_TRUE(server.gone.reaches(1));
-    other.write(request(1, Dictionary{}));
-    EXPECT_TRUE(other.read());
-}
-
 TEST_F(ConnectionTest, AFloodDoesNotDelayOthersByMoreThanItsTurn) {
     std::mutex mutex;
     std::vector<std::uint64_t> order;
@@ -297,31 +272,6 @@ TEST_F(ConnectionTest, TellsWhoseBytesARequestIsMadeOf) {
     client.write(text.substr(16) + text);
     EXPECT_EQ(client.read()->body, (Dictionary{{"fromPeer", false}}));
     EXPECT_EQ(client.read()->body, (Dictionary{{"fromPeer", true}}));
-}
-
-TEST_F(ConnectionTest, TellsWhoConnected) {
-    std::promise<std::weak_ptr<Connection>> met;
-    EchoServer server(path_, {}, [&](Connection& connection, const Message& message) {
-        met.set_value(connection.weak_from_this());
-        EXPECT_EQ(connection.pid(), ::getpid());
-        EXPECT_EQ(connection.peer().uid, ::getuid());
-        EXPECT_TRUE(connection.peer().process);
-        const std::string link =
-            "/proc/self/fd/" + std::to_string(connection.peer().executable.get());
-        EXPECT_EQ(std::filesystem::read_symlink(link),
-                  std::filesystem::read_symlink("/proc/self/exe"));
-        connection.send(createReply(message));
-    });
-    auto client = std::make_unique<RawClient>(path_);
-    client->write(request(1, Dictionary{}));
-    ASSERT_TRUE(client->read());
-    const auto connection = met.get_future().get().lock();
-    ASSERT_TRUE(connection);
-    EXPECT_TRUE(connection->isAlive());
-    client.reset();
-    ASSERT_TRUE(server.gone.reaches(1));
-    EXPECT_EQ(connection->pid(), 0);
-    EXPECT_FALSE(connection->isAlive());
 }
 
 } // namespace

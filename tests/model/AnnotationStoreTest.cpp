@@ -75,12 +75,6 @@ TEST_F(StoreTest, StartsEmptyWithoutAFile) {
     EXPECT_FALSE(std::filesystem::exists(path));
 }
 
-TEST_F(StoreTest, KeepsItsUsualPlace) {
-    EXPECT_EQ(ZPDAnnotationStore::defaultDatabasePath(), "/var/db/Zephrin-Annotations");
-    EXPECT_EQ(ZPDAnnotationStore::confstrPath(_CS_PATH), "/bin:/usr/bin");
-    EXPECT_FALSE(ZPDAnnotationStore::confstrPath(-1));
-}
-
 TEST_F(StoreTest, MergesAndSavesWhatIsSet) {
     write(storeText(16, someAnnotations));
     auto store = open();
@@ -104,21 +98,6 @@ TEST_F(StoreTest, LeavesTheFileAloneWhenNothingChanges) {
     store.setAnnotation(Dictionary{{"election", 1}}, *plugIn);
     EXPECT_EQ(platform::stampOf(path), before);
     EXPECT_TRUE(store.annotationForPlugIn(*plugIn)->sameObject(*annotation));
-}
-
-TEST_F(StoreTest, SharesTheAnnotationOfWhatIsReplaced) {
-    const auto replacing = [&](const char* identifier) {
-        auto proxy = samplePlugIn();
-        proxy->identifier = identifier;
-        proxy->granted = Dictionary{{"com.tovana.developer.replace-plugin", sampleKey}};
-        return world.record(proxy);
-    };
-    const auto one = replacing("com.example.one");
-    const auto two = replacing("com.example.two");
-    auto store = open();
-    store.setAnnotation(Dictionary{{"election", 1}}, *one);
-    EXPECT_EQ(store.annotationForPlugIn(*two), (Dictionary{{"election", 1}}));
-    EXPECT_EQ(store.annotationForPlugIn(*plugIn), (Dictionary{{"election", 1}}));
 }
 
 // ---- Damage
@@ -165,14 +144,6 @@ TEST_F(StoreTest, RefusesWhatIsNoStore) {
     }
     write(storeText(15, someAnnotations));
     EXPECT_EQ(open().loadDb(path)->description, "found database version 15 needed version 16");
-}
-
-TEST_F(StoreTest, DropsEntriesThatAreNoAnnotations) {
-    write(storeText(16, Dictionary{{"a", 1}, {"b", Array()}, {sampleKey, Dictionary()}}));
-    auto store = open();
-    EXPECT_EQ(store.annotationForIdentifier("a"), std::nullopt);
-    EXPECT_EQ(store.annotationForIdentifier("b"), std::nullopt);
-    EXPECT_EQ(store.annotationForPlugIn(*plugIn), Dictionary());
 }
 
 TEST_F(StoreTest, KeepsChangesThatCannotBeSavedAndSavesThemLater) {

@@ -197,15 +197,6 @@ TEST(ElectionFilter, IsDroppedWholeForWhatItDoesNotUnderstand) {
     EXPECT_TRUE(ZPDElectionFilter::of({{"HXUserElection", "=-1"}}));
 }
 
-TEST(ElectionFilter, LooksAtTheLowBits) {
-    const auto filter = ZPDElectionFilter::of({{"HXUserElection", Array{"1", "255"}}});
-    ASSERT_TRUE(filter);
-    for (const std::int64_t election : {1, 257, -1, 255, 65537})
-        EXPECT_TRUE(filter->accepts(election)) << election;
-    for (const std::int64_t election : {0, 2, 256, -2})
-        EXPECT_FALSE(filter->accepts(election)) << election;
-}
-
 // ---- Annotations
 
 TEST_F(DatabaseTest, ElectsEntitledPlugInsThatHaveNoElection) {
@@ -231,17 +222,6 @@ TEST_F(DatabaseTest, ElectsEntitledPlugInsThatHaveNoElection) {
     }
     EXPECT_EQ(election(install("plain")), std::nullopt);
     EXPECT_THAT(platform.notifications.posted, IsEmpty());
-}
-
-TEST_F(DatabaseTest, KeepsOtherAnnotationsWhenItElects) {
-    elect("a", 0);
-    const auto plugIn = install("a", {{autoElectKey, true}});
-    const auto record = database->findPlugIn(plugIn->uuid);
-    EXPECT_EQ(database->annotationForPlugIn(*record),
-              (Dictionary{{"election", 1}, {"note", "kept"}}));
-    reopen();
-    EXPECT_EQ(database->annotationForPlugIn(*record),
-              (Dictionary{{"election", 1}, {"note", "kept"}}));
 }
 
 TEST_F(DatabaseTest, TellsOfChangesOnlyWhenAsked) {

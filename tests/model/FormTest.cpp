@@ -1,11 +1,10 @@
-#include <gmock/gmock.h>
+#include <gtest/gtest.h>
 
 #include "Zephrin/ZPPlugInCore.h"
 #include "tests/model/Samples.h"
 
 using platform::Dictionary;
 using platform::Value;
-using testing::ElementsAre;
 
 namespace {
 
@@ -42,13 +41,6 @@ Dictionary with(Dictionary form, std::string_view key, Value value) {
     return form;
 }
 
-std::vector<std::string> keysOf(const Dictionary& dictionary) {
-    std::vector<std::string> keys;
-    for (const auto& entry : dictionary)
-        keys.emplace_back(entry.key.view());
-    return keys;
-}
-
 ZPPlugInCore::Ptr recordWith(Dictionary extension,
                              const std::string& path = "/Applications/H.app/PlugIns/S.appex") {
     return ZPPlugInCore::create("com.example.sample", path, infoWith(std::move(extension)),
@@ -79,19 +71,6 @@ TEST(Form, TakesDefaultsForWhatIsMissing) {
         ASSERT_TRUE(first && second);
         EXPECT_FALSE(first->isEqual(*second));
     }
-
-    auto bare = wholeForm();
-    for (const char* const key : {"lastmodified", "systemResident", "annotations", "entitlements",
-                                  "containingPath", "localizedDisplayName"})
-        bare.remove(key);
-    const auto record = ZPPlugInCore::createWithForm(bare);
-    ASSERT_TRUE(record);
-    EXPECT_EQ(record->lastModified(), 0);
-    EXPECT_FALSE(record->onSystemVolume());
-    EXPECT_EQ(record->annotations(), std::nullopt);
-    EXPECT_EQ(record->entitlements(), std::nullopt);
-    EXPECT_EQ(record->containingPath(), std::nullopt);
-    EXPECT_EQ(record->localizedName(), std::nullopt);
 }
 
 TEST(Form, ThatMakesNoPlugInIsRefused) {
@@ -117,22 +96,6 @@ TEST(Form, CarriesSignatureFactsInOnly) {
     EXPECT_EQ(record->exportForm().value(), wholeForm());
 }
 
-TEST(Form, HasExactlyTheKeysThatAreKnown) {
-    RecordWorld world;
-    auto plugIn = samplePlugIn(infoWith(extensionWith({{"HXExtensionVersion", 5}})));
-    const auto record = world.record(plugIn);
-    const auto form = record->exportForm().value();
-    EXPECT_THAT(keysOf(form),
-                ElementsAre("annotations", "bundleInfo", "containingPath", "hubProtocolVersion",
-                            "identifier", "info", "lastmodified", "localizedContainingDisplayName",
-                            "original-identifier", "path", "systemResident", "uuid", "version"));
-    EXPECT_EQ(*form.find("version"), Value("<none>")); // 5 is not a text
-    EXPECT_EQ(*form.find("annotations"), Value(Dictionary()));
-    EXPECT_EQ(*form.find("lastmodified"), Value(1'700'000'000));
-    EXPECT_EQ(*form.find("uuid"), Value(record->uuid().text()));
-    EXPECT_FALSE(form.find("bundleInfo")->dictionary()->contains("BQBundleInfoPlistURL"));
-}
-
 TEST(Form, ShowsTheLocalizedName) {
     RecordWorld world;
     auto plugIn = samplePlugIn();
@@ -142,6 +105,7 @@ TEST(Form, ShowsTheLocalizedName) {
     EXPECT_EQ(*form.find("bundleInfo")->dictionary()->find("BQBundleDisplayName"), Value("Probe"));
     EXPECT_EQ(*form.find("localizedDisplayName"), Value("Probe"));
     EXPECT_EQ(record->infoKey("BQBundleDisplayName"), Value("Sample"));
+    EXPECT_FALSE(form.find("bundleInfo")->dictionary()->contains("BQBundleInfoPlistURL"));
 }
 
 TEST(Annotations, ChangeOnlyWhereThereAreSome) {
@@ -156,21 +120,6 @@ TEST(Annotations, ChangeOnlyWhereThereAreSome) {
     EXPECT_EQ(record->identifier(), "com.example.sample");
     record->setAnnotation("note", "x");
     EXPECT_EQ(record->annotations(), std::nullopt);
-}
-
-TEST(Records, AreEqualWhenTheirUUIDsAre) {
-    const auto one = ZPPlugInCore::createWithForm(wholeForm());
-    const auto same = ZPPlugInCore::createWithForm(with(wholeForm(), "identifier", "other"));
-    EXPECT_TRUE(one->isEqual(*same));
-    EXPECT_EQ(one->hash(), same->hash());
-    EXPECT_FALSE(recordWith(extensionWith())->isEqual(*recordWith(extensionWith())));
-}
-
-TEST(Records, TakeThePlugInDictionaryGivenWhereThereIsNoInformation) {
-    const auto record = ZPPlugInCore::create("id", "/x", std::nullopt, extensionWith(), {});
-    ASSERT_TRUE(record);
-    EXPECT_EQ(record->plugInDictionary(), extensionWith());
-    EXPECT_FALSE(ZPPlugInCore::create("id", std::nullopt, {}, {}, {}));
 }
 
 TEST(Specs, HaveDefaultsInApplicationExtensionsOnly) {
@@ -252,11 +201,4 @@ TEST(Diagnosis, FindsTheFirstFaultOnly) {
         EXPECT_EQ(found ? found->description : std::nullopt, c.fault);
         EXPECT_EQ(found ? found->code : 12, 12);
     }
-}
-
-TEST(ConfigurationStyle, IsOldOnlyWithoutTheCurrentKey) {
-    EXPECT_FALSE(recordWith(extensionWith())->oldStyle());
-    const auto record = ZPPlugInCore::create("id", "/x", std::nullopt, {}, {});
-    EXPECT_FALSE(record->setDictionaries({{"Zephrin", Dictionary()}}));
-    EXPECT_TRUE(record->oldStyle());
 }

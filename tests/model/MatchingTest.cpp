@@ -28,22 +28,6 @@ struct Comparison {
 
 } // namespace
 
-TEST(Rules, HoldWhenThereAreNone) {
-    RecordWorld world;
-    const auto record = world.record();
-    EXPECT_TRUE(record->match(std::nullopt));
-    EXPECT_TRUE(record->match(Dictionary()));
-}
-
-TEST(Rules, HoldOnlyTogether) {
-    RecordWorld world;
-    const auto record = world.record();
-    EXPECT_TRUE(record->match(Dictionary{{"HXExtensionIdentifier", "com.example.sample"},
-                                         {"HXExtensionVersion", ">=1.9"}}));
-    EXPECT_FALSE(record->match(Dictionary{{"HXExtensionIdentifier", "com.example.sample"},
-                                          {"HXExtensionVersion", "<1.9"}}));
-}
-
 TEST(Rules, CompareTextsByTheirOperators) {
     const Comparison cases[] = {
         {"a", "a", true},
@@ -138,18 +122,6 @@ TEST(Rules, HoldForAnyOfSeveral) {
     for (const auto& c : cases) {
         EXPECT_EQ(AttributeWorld(c.value).holds(c.pattern), c.holds)
             << describe(c.value) << " with " << describe(c.pattern);
-    }
-}
-
-TEST(Rules, HandDictionariesToTheActivationRule) {
-    const Dictionary offer{{"public.png", 2}};
-    for (const bool answer : {true, false}) {
-        AttributeWorld world(Dictionary{{"public.image", 3}});
-        world.platform.types.ruleAnswer = answer;
-        EXPECT_EQ(world.holds(offer), answer);
-        ASSERT_EQ(world.platform.types.evaluated.size(), 1U);
-        EXPECT_EQ(world.platform.types.evaluated[0].first, Value(Dictionary{{"public.image", 3}}));
-        EXPECT_EQ(world.platform.types.evaluated[0].second, offer);
     }
 }
 

@@ -25,26 +25,6 @@ Dictionary decoded(const std::expected<platform::SharedBytes, platform::Error>& 
 
 // ---- Building
 
-TEST(Record, IsBuiltFromTheRegistry) {
-    RecordWorld world;
-    auto plugIn = samplePlugIn();
-    plugIn->original = "com.example.first";
-    plugIn->granted = Dictionary{{"right", "NO"}, {"no", false}, {"none", 0}};
-    plugIn->shortName = "S";
-    const auto record = world.record(plugIn);
-    ASSERT_TRUE(record);
-    EXPECT_EQ(record->uuid(), plugIn->uuid);
-    EXPECT_EQ(record->originalIdentifier(), "com.example.first");
-    EXPECT_EQ(record->lastModified(), 1'700'000'000);
-    EXPECT_EQ(record->localizedShortName(), "S");
-    EXPECT_EQ(record->localizedContainingName(), "The Host");
-    EXPECT_EQ(record->containingPath(), "/Applications/Host.app");
-    EXPECT_EQ(record->dataContainerPath(), "/containers/com.example.sample");
-    EXPECT_TRUE(record->hasEntitlement("right"));
-    EXPECT_FALSE(record->hasEntitlement("no") || record->hasEntitlement("none") ||
-                 record->hasEntitlement("absent"));
-}
-
 TEST(Record, TruncatesTimesTowardZero) {
     RecordWorld world;
     auto plugIn = samplePlugIn();

@@ -20,20 +20,6 @@ std::string infoNaming(const Value& executable) {
 
 } // namespace
 
-TEST(BundleReader, ReadsPathsAndInfo) {
-    const TestFolder folder;
-    folder.write("A.app/Info.plist", infoNaming("Main"));
-    const auto executable = folder.write("A.app/Main", "");
-    fs::create_directory_symlink("A.app", folder / "link");
-    for (const char* name : {"A.app", "A.app/", "link"}) {
-        const auto bundle = BundleReader::atPath(folder / name);
-        EXPECT_EQ(bundle.stringProperty(Property::bundlePath), folder / "A.app");
-        EXPECT_EQ(bundle.stringProperty(Property::supportPath), folder / "A.app");
-        EXPECT_EQ(bundle.stringProperty(Property::executablePath), executable);
-        EXPECT_EQ(*bundle.infoDictionary()->find("Key"), Value(1));
-    }
-}
-
 TEST(BundleReader, TakesOnlyARegularFileInItsFolderForItsExecutable) {
     const TestFolder folder;
     fs::create_directories(folder / "A.app/Folder");

@@ -13,12 +13,10 @@
 #include <gtest/gtest.h>
 
 #include "platform/container/FolderContainers.h"
-#include "platform/ipc/Peer.h"
 #include "platform/notify/FileNotifications.h"
 #include "platform/plist/PropertyList.h"
 #include "platform/preferences/FilePreferences.h"
 #include "platform/process/ProcProcesses.h"
-#include "platform/signing/UnsignedPrograms.h"
 #include "tests/platform/TestFolder.h"
 
 namespace fs = std::filesystem;
@@ -187,12 +185,4 @@ TEST(ProcProcesses, DoNotNameAFileThatIsAnotherByNow) {
     EXPECT_EQ(processes.executablePath(child, 4096).error(), ENOENT) << "replaced";
     ::kill(child, SIGKILL);
     ::waitpid(child, nullptr, 0);
-}
-
-TEST(UnsignedPrograms, HaveNoEntitlements) {
-    UnsignedPrograms signing;
-    const auto answer = signing.taskFor(ipc::Peer())->entitlement("com.x");
-    ASSERT_TRUE(answer);
-    EXPECT_FALSE(*answer);
-    EXPECT_FALSE(signing.bundleEntitlements("/"));
 }

@@ -87,21 +87,6 @@ TEST(Value, ComparesOtherKindsByContent) {
     EXPECT_EQ(Value(Array{1, Dictionary{{"a", true}}}), Value(Array{1.0, Dictionary{{"a", 1}}}));
 }
 
-TEST(Value, AnswersOnlyForItsOwnKind) {
-    EXPECT_FALSE(Value(1).boolean());
-    EXPECT_FALSE(Value(true).unsignedInteger());
-    EXPECT_FALSE(Value(-1).unsignedInteger());
-    EXPECT_FALSE(Value(1.0).unsignedInteger());
-    EXPECT_EQ(Value(1).unsignedInteger(), 1U);
-    EXPECT_EQ(Value(1).signedInteger(), 1);
-    EXPECT_FALSE(Value(mostUnsigned).signedInteger());
-    EXPECT_FALSE(Value(1).real());
-    EXPECT_FALSE(Value(Data{SharedBytes("x")}).string());
-    EXPECT_FALSE(Value("x").data());
-    EXPECT_FALSE(Value(Array{}).dictionary());
-    EXPECT_FALSE(Value("00112233-4455-6677-8899-AABBCCDDEEFF").uuid());
-}
-
 TEST(Value, TakesAnyNumberWhereANumberIsAskedFor) {
     const struct {
         Value value;
@@ -175,17 +160,6 @@ TEST(Array, CopiesOnlyWhenSharedAndChanged) {
     EXPECT_EQ(original, Array{1});
     EXPECT_EQ(copy, (Array{1, 2}));
     EXPECT_TRUE(copy[2].isNull()) << "beyond its end";
-}
-
-TEST(SharedBytes, ShareOneAllocation) {
-    const SharedBytes original(std::string_view("abc\0d", 5));
-    SharedBytes moved = original;
-    EXPECT_TRUE(moved.sameAllocation(original));
-    EXPECT_EQ(moved.size(), 5U);
-    moved = SharedBytes(std::move(moved));
-    EXPECT_EQ(moved, original);
-    EXPECT_EQ(SharedBytes(), SharedBytes(std::string_view()));
-    EXPECT_LT(SharedBytes("a"), SharedBytes("b"));
 }
 
 TEST(Uuid, ReadsBothCasesAndWritesUpper) {

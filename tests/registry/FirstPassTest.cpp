@@ -30,13 +30,6 @@ protected:
 
 } // namespace
 
-TEST_F(FirstPass, KnowsNothingInAnEmptyHome) {
-    open();
-    EXPECT_EQ(identifiers(), Strings());
-    EXPECT_FALSE(registry->knowledge().uuid);
-    EXPECT_EQ(registry->knowledge().sequence, 0U);
-}
-
 TEST_F(FirstPass, FindsPlugInsInApplicationsAndBesidesThem) {
     makeUsual();
     makePlugIn("Elsewhere/Alone.appex", "com.example.alone");
@@ -182,18 +175,6 @@ TEST_F(FirstPass, ForgetsWhatVanished) {
     EXPECT_FALSE(registry->applicationProxyForBundlePath(home / "Applications/A.app"));
 }
 
-TEST_F(FirstPass, MarksAnApplicationThatIsBeingInstalled) {
-    makeUsual();
-    home.write("Applications/A.app/.installing", "");
-    open();
-    EXPECT_TRUE(at(one)->containingBundle()->isPlaceholder());
-    const Uuid uuid = uuidOf(one);
-    remove("Applications/A.app/.installing");
-    open();
-    EXPECT_FALSE(at(one)->containingBundle()->isPlaceholder());
-    EXPECT_EQ(uuidOf(one), uuid);
-}
-
 TEST_F(FirstPass, RegistersOnceWhatIsReachedTwice) {
     makeUsual();
     std::filesystem::create_directory_symlink(home / "Applications/A.app",
@@ -209,6 +190,10 @@ TEST_F(FirstPass, RegistersOnceWhatIsReachedTwice) {
               (Strings{"com.example.a.one", "com.example.a.two", "com.example.b.in"}));
     EXPECT_TRUE(at("Real/B.app/PlugIns/In.appex")->containingBundle());
     EXPECT_EQ(log, "");
+    std::filesystem::create_symlink(home / "nowhere", home / "Applications/Dangling.app");
+    std::filesystem::create_symlink("Loop.app", home / "Applications/Loop.app");
+    open();
+    EXPECT_EQ(identifiers().size(), 3U);
 }
 
 TEST_F(FirstPass, KnowsExtensionPointsAndTypeDeclarations) {
@@ -227,29 +212,6 @@ TEST_F(FirstPass, KnowsExtensionPointsAndTypeDeclarations) {
     EXPECT_FALSE(types.conforms("com.example.thing", "com.example.picture"));
     EXPECT_FALSE(registry->extensionPointForIdentifier("com.example.bad"));
     EXPECT_FALSE(registry->extensionPointForIdentifier("com.example"));
-}
-
-TEST_F(FirstPass, NamesThingsInTheLanguageInUse) {
-    makeBundle("Applications/A.app", {{"BQBundleIdentifier", "com.example.a"},
-                                      {"BQBundleDisplayName", "Pictures"},
-                                      {"BQBundleDisplayName[de]", "Bilder"}});
-    Dictionary info = plugInInfo("com.example.a.one", "p");
-    info.set("BQBundleDisplayName", "Long");
-    info.set("BQBundleDisplayName[de]", "Lang");
-    info.set("BQBundleDisplayName[de_CH]", "Lang CH");
-    info.set("BQBundleName[de]", "Kurz");
-    makeBundle(one, info);
-    open();
-    const auto plugIn = at(one);
-    EXPECT_EQ(plugIn->localizedName(), "Long");
-    EXPECT_EQ(plugIn->localizedShortName(), std::nullopt);
-    EXPECT_EQ(plugIn->containingBundle()->localizedName(), "Pictures");
-    locale.language = "de_AT";
-    EXPECT_EQ(plugIn->localizedName(), "Lang");
-    EXPECT_EQ(plugIn->localizedShortName(), "Kurz");
-    EXPECT_EQ(plugIn->containingBundle()->localizedName(), "Bilder");
-    locale.language = "de_CH";
-    EXPECT_EQ(plugIn->localizedName(), "Lang CH");
 }
 
 TEST_F(FirstPass, AsksForEntitlementsOfTheBundle) {

@@ -1,6 +1,5 @@
 #pragma once
 
-#include <map>
 #include <memory>
 #include <string>
 #include <string_view>
@@ -10,38 +9,10 @@
 
 #include "AppRegistry/ARRegistry.h"
 #include "platform/container/FolderContainers.h"
-#include "platform/locale/Locale.h"
 #include "platform/log/Log.h"
-#include "platform/signing/CodeSigning.h"
 #include "platform/types/DeclaredTypes.h"
 #include "tests/platform/TestFolder.h"
-
-// The language is what the test says.
-class FakeLocale final : public platform::Locale {
-public:
-    [[nodiscard]] std::string current() override { return language; }
-
-    void observeChanges(ChangeHandler /*handler*/) override {}
-
-    std::string language;
-};
-
-// Grants what the test says, by bundle path.
-class FakeSigning final : public platform::CodeSigning {
-public:
-    [[nodiscard]] std::unique_ptr<platform::SigningTask>
-    taskFor(const platform::ipc::Peer& /*peer*/) override {
-        return nullptr;
-    }
-
-    [[nodiscard]] std::optional<platform::Dictionary>
-    bundleEntitlements(std::string_view path) override {
-        const auto found = granted.find(std::string(path));
-        return found == granted.end() ? std::nullopt : std::optional(found->second);
-    }
-
-    std::map<std::string, platform::Dictionary> granted;
-};
+#include "tests/support/FakePlatform.h"
 
 // A temporary home with bundles in it, and the registry over it: opened, closed and opened again
 // as the daemon would.

@@ -35,7 +35,8 @@ struct FakeProcesses final : platform::Processes {
 };
 
 struct FakeSigning final : platform::CodeSigning {
-    platform::Dictionary clientEntitlements; // every client's
+    platform::Dictionary clientEntitlements;             // every client's
+    std::map<std::string, platform::Dictionary> granted; // by bundle path
 
     struct Task final : platform::SigningTask {
         explicit Task(platform::Dictionary e) : entitlements(std::move(e)) {}
@@ -55,8 +56,9 @@ struct FakeSigning final : platform::CodeSigning {
     }
 
     [[nodiscard]] std::optional<platform::Dictionary>
-    bundleEntitlements(std::string_view) override {
-        return std::nullopt;
+    bundleEntitlements(std::string_view path) override {
+        const auto found = granted.find(std::string(path));
+        return found == granted.end() ? std::nullopt : std::optional(found->second);
     }
 };
 

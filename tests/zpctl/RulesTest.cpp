@@ -1,13 +1,11 @@
 #include "zpctl/Rules.h"
 
-#include <cstdio>
-#include <cstdlib>
-#include <fstream>
 #include <string>
-#include <unistd.h>
 #include <vector>
 
 #include <gtest/gtest.h>
+
+#include "tests/platform/TestFolder.h"
 
 using platform::Array;
 using platform::Dictionary;
@@ -45,22 +43,13 @@ TEST(Rules, RefuseWhatIsNoRule) {
 
 class RulesFile : public testing::Test {
 protected:
-    void SetUp() override {
-        char name[] = "/tmp/zpctl-rules-XXXXXX";
-        const int fd = mkstemp(name);
-        ASSERT_GE(fd, 0);
-        close(fd);
-        path_ = name;
-    }
-
-    void TearDown() override { std::remove(path_.c_str()); }
-
     auto rulesOf(const std::string& content) {
-        std::ofstream(path_) << "<plist version=\"1.0\">" << content << "</plist>";
+        folder_.write("rules", "<plist version=\"1.0\">" + content + "</plist>");
         return zpctl::rulesFromFile(path_);
     }
 
-    std::string path_;
+    TestFolder folder_;
+    const std::string path_ = folder_ / "rules";
 };
 
 TEST_F(RulesFile, HoldsOneDictionary) {
@@ -72,7 +61,7 @@ TEST_F(RulesFile, HoldsOneDictionary) {
 TEST_F(RulesFile, TellsWhichFileIsWrong) {
     EXPECT_EQ(rulesOf("<array/>").error(), path_ + ": the rules are not a dictionary");
     EXPECT_TRUE(rulesOf("<dict>").error().starts_with(path_ + ": "));
-    std::remove(path_.c_str());
+    std::filesystem::remove(path_);
     EXPECT_NE(zpctl::rulesFromFile(path_).error().find(path_), std::string::npos);
 }
 
