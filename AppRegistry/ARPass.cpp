@@ -164,13 +164,17 @@ void ARPass::refresh(const ARBundleRow& old, const ARCandidate& candidate, const
     replace(std::move(row));
 }
 
+// Readers are told only of what they can see: where files' stamps alone moved, they keep the very
+// same proxies.
 void ARPass::replace(ARBundleRow&& row) {
     const auto shared = std::make_shared<const ARBundleRow>(std::move(row));
     const ARBundleRow& old = *model_.find(shared->path.view())->row;
-    if (old.placeholder != shared->placeholder || old.presence != shared->presence)
-        batch_.visible = true;
+    const bool visible = old.placeholder != shared->placeholder || old.presence != shared->presence;
     model_.put(shared).seen = number_;
     batch_.changes.updated.push_back(*shared);
+    if (!visible)
+        return;
+    batch_.visible = true;
     batch_.updated.push_back(shared);
 }
 
