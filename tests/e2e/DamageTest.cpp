@@ -49,7 +49,7 @@ TEST(Damage, ARegistryDatabaseIsSetAsideAndRebuilt) {
         {
             // What the first pass wrote is brought from the log into the database after it.
             Daemon first(home.path());
-            ASSERT_TRUE(eventually([&] { return fs::file_size(database) > 3 * 4096u; }));
+            ASSERT_TRUE(eventually([&] { return fs::file_size(database) >= 4 * 8192u; }));
             ASSERT_EQ(first.terminate(), 0);
         }
         fs::remove(database + "-wal");
