@@ -127,6 +127,15 @@ TEST_F(Registration, TellsOfChangesThatALookFinds) {
     EXPECT_EQ(*before->plugInIdentifier(), "in");
 }
 
+TEST_F(Registration, KeepsProxiesWhenFilesWereOnlyTouched) {
+    const auto before = at(inside);
+    makeApplication("Applications/A.app", "com.example.a"); // the same bytes again
+    makePlugIn(inside, "in");
+    registry->rescan();
+    EXPECT_EQ(at(inside), before);
+    EXPECT_EQ(witness.told, Strings());
+}
+
 TEST_F(Registration, RenewsPlugInsWhoseApplicationChanged) {
     const auto before = at(inside);
     makeApplication("Applications/A.app", "com.example.renamed");
