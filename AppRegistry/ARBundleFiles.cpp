@@ -17,7 +17,9 @@ std::expected<ARStamp, std::string> stampOf(const struct ::stat& status, const s
     if (auto refusal = platform::OwnershipTest::refusalOf(status, path))
         return std::unexpected(std::move(*refusal));
     const auto stamp = platform::FileStamp::of(status);
-    return ARStamp{stamp.inode, stamp.size, stamp.settled() ? stamp.changedNanoseconds : 0};
+    // Where no hash could tell later, a fresh stamp has to do.
+    const bool reliable = stamp.size > ARLargestHashed || stamp.settled();
+    return ARStamp{stamp.inode, stamp.size, reliable ? stamp.changedNanoseconds : 0};
 }
 
 std::expected<ARStamp, std::string> unreadable(const std::string& path, int number) {

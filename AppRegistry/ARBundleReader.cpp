@@ -95,7 +95,7 @@ std::expected<void, std::string> ARBundleReader::readOther(ARBundleContent& cont
     if (!stamp)
         return std::unexpected(stamp.error());
     content.row.stamps[file] = *stamp;
-    if (!stamp->present() || stamp->size > largestHashed)
+    if (!stamp->present() || stamp->size > ARLargestHashed)
         return {};
     if (ARIsSameFile(known.stamps[file], *stamp)) {
         content.digests[file] = known.digests[file];

@@ -27,7 +27,6 @@ struct ARBundleContent {
 class ARBundleReader {
 public:
     static constexpr std::size_t largestInfo = std::size_t{1} << 20;
-    static constexpr std::uint64_t largestHashed = std::uint64_t{256} << 20;
 
     explicit ARBundleReader(const ARBundleFiles& files) : files_(files) {}
 

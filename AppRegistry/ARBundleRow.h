@@ -25,6 +25,9 @@ inline constexpr std::size_t countingFiles = 3;
 
 enum ARCountingFile : std::size_t { infoFile = 0, executableFile = 1, signatureFile = 2 };
 
+// A larger file counts by its stamp alone.
+inline constexpr std::uint64_t ARLargestHashed = std::uint64_t{256} << 20;
+
 // Tells whether a counting file is still the one that was read; all zero when there is none.
 // The device is left out: its number may differ after each start of the box.
 struct ARStamp {
