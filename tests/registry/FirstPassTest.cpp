@@ -1,5 +1,4 @@
 #include <functional>
-#include <thread>
 
 #include "platform/plist/PropertyList.h"
 #include "tests/registry/RegistryFixture.h"
@@ -12,11 +11,6 @@ namespace {
 
 constexpr const char* one = "Applications/A.app/PlugIns/One.appex";
 constexpr const char* two = "Applications/A.app/PlugIns/Two.appex";
-
-// Longer than the tick of a file system's clock, so that a stamp can be told from the next.
-void letClockTick() {
-    std::this_thread::sleep_for(std::chrono::milliseconds(50));
-}
 
 class FirstPass : public RegistryTest {
 protected:

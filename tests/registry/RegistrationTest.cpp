@@ -113,6 +113,8 @@ TEST_F(Registration, ForgetsAnAddedBundleThatIsTakenAway) {
 }
 
 TEST_F(Registration, TellsOfChangesThatALookFinds) {
+    letClockTick();
+    reopen();
     const auto before = at(inside);
     makePlugIn("Applications/A.app/PlugIns/New.appex", "new");
     registry->rescan();

@@ -3,6 +3,7 @@
 #include <memory>
 #include <string>
 #include <string_view>
+#include <thread>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -26,6 +27,9 @@ protected:
     void makePlugIn(std::string_view path, std::string_view identifier,
                     std::string_view point = "com.tovana.point") const;
     void remove(std::string_view path) const;
+
+    // Longer than the tick of a file system's clock, so that a stamp can be told from the next.
+    static void letClockTick() { std::this_thread::sleep_for(std::chrono::milliseconds(50)); }
 
     [[nodiscard]] static platform::Dictionary plugInInfo(std::string_view identifier,
                                                          std::string_view point);

@@ -144,6 +144,7 @@ TEST_F(Trust, RefusesIdentifiersThatCannotBeFileNames) {
 
 TEST_F(Trust, DoesNotReadAHugeProgram) {
     std::filesystem::resize_file(badFile(home, "program"), std::uintmax_t{1} << 40);
+    letClockTick();
     open();
     ASSERT_TRUE(at(bad));
     const auto uuid = uuidOf(bad);
