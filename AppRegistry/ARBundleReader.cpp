@@ -26,12 +26,6 @@ std::expected<platform::FileContent, std::string> readFile(const std::string& pa
     return std::move(*content);
 }
 
-// A file too large to be hashed goes by its stamp alone; where that was not settled when it was
-// taken, by what it had of it.
-bool isSameUnhashed(const ARStamp& known, const ARStamp& now) {
-    return known.changed == 0 && known.inode == now.inode && known.size == now.size;
-}
-
 } // namespace
 
 bool ARIsSameFile(const ARStamp& known, const ARStamp& now) {
@@ -44,9 +38,7 @@ bool ARHasSameContent(const ARKnownFiles& known, const ARKnownFiles& now) {
             continue;
         if (!known.stamps[file].present() || !now.stamps[file].present())
             return false;
-        if (now.digests[file] != known.digests[file])
-            return false;
-        if (now.digests[file] == notHashed && !isSameUnhashed(known.stamps[file], now.stamps[file]))
+        if (now.digests[file] == notHashed || now.digests[file] != known.digests[file])
             return false;
     }
     return true;

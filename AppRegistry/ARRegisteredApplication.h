@@ -12,8 +12,6 @@ class ARRegisteredApplication final : public ARApplicationProxy {
 public:
     ARRegisteredApplication(ARRowPtr row, std::shared_ptr<ARProxyContext> context);
 
-    [[nodiscard]] const ARBundleRow& row() const { return *row_; }
-
     [[nodiscard]] std::string_view path() const { return path_; }
 
     [[nodiscard]] const std::string& bundlePath() const override { return path_; }

@@ -57,7 +57,8 @@ void ARSnapshotEditor::takeAway(ARSnapshot& snapshot, const ARRowPtr& row, Outco
 void ARSnapshotEditor::put(ARSnapshot& snapshot, const ARRowPtr& row, Outcome& outcome) const {
     switch (row->kind) {
     case ARKind::application:
-        putApplication(snapshot, row);
+        snapshot.putApplication(std::make_shared<const ARRegisteredApplication>(row, context_));
+        renewPlugInsOf(snapshot, row->path.view());
         return;
     case ARKind::extensionPoint:
         snapshot.putExtensionPoint(row);
@@ -65,14 +66,6 @@ void ARSnapshotEditor::put(ARSnapshot& snapshot, const ARRowPtr& row, Outcome& o
     case ARKind::plugIn:
         putPlugIn(snapshot, row, outcome);
     }
-}
-
-void ARSnapshotEditor::putApplication(ARSnapshot& snapshot, const ARRowPtr& row) const {
-    const ARApplicationPtr known = snapshot.application(row->path.view());
-    if (known && known->row().id == row->id && known->row().placeholder == row->placeholder)
-        return; // only its files' stamps moved: it and its plug-ins stay what they are
-    snapshot.putApplication(std::make_shared<const ARRegisteredApplication>(row, context_));
-    renewPlugInsOf(snapshot, row->path.view());
 }
 
 void ARSnapshotEditor::putPlugIn(ARSnapshot& snapshot, const ARRowPtr& row,

@@ -28,7 +28,6 @@ public:
 private:
     void takeAway(ARSnapshot& snapshot, const ARRowPtr& row, Outcome& outcome) const;
     void put(ARSnapshot& snapshot, const ARRowPtr& row, Outcome& outcome) const;
-    void putApplication(ARSnapshot& snapshot, const ARRowPtr& row) const;
     void putPlugIn(ARSnapshot& snapshot, const ARRowPtr& row, Outcome& outcome) const;
     void renewPlugInsOf(ARSnapshot& snapshot, std::string_view application) const;
     [[nodiscard]] ARPlugInPtr proxyOf(const ARSnapshot& snapshot, const ARRowPtr& row) const;
