@@ -17,6 +17,7 @@ TEST(Find, TakesAUuidOrAFileUrl) {
     std::filesystem::create_symlink(path, home / "link.appex");
     const Daemon daemon(home.path());
     WireClient client = daemon.connect();
+    client.answerGreeting(); // others do not, and are served all the same
     const Item uuid = Item::uuid(findAt(client, path)["uuid"].text());
     const Item url = "file://" + path;
     const Item nowhere = "file://" + home / "Applications/None.app";

@@ -86,32 +86,6 @@ constexpr Mode newestOnly{false, false};
 constexpr Mode allVersions{true, false};
 constexpr Mode everything{true, true};
 
-TEST(Deduplication, KeepsTheBetterOfTwo) {
-    const struct {
-        const char* what;
-        Registration first, second;
-        Mode mode;
-        std::vector<std::size_t> kept;
-    } cases[] = {
-        {"newer version", {"x", "1.9"}, {"x", "1.10"}, newestOnly, {1}},
-        {"older version", {"x", "1.10"}, {"x", "1.9"}, newestOnly, {0}},
-        {"no version", {"x", "<none>"}, {"x", "1"}, newestOnly, {0}},
-        {"both versions", {"x", "1.10"}, {"x", "1.9"}, allVersions, {0, 1}},
-        {"same version once", {"x", "1.0"}, {"x", "1.00"}, allVersions, {0}},
-        {"same version twice", {"x", "1"}, {"x", "1"}, everything, {0, 1}},
-        {"duplicates alone have no effect", {"x", "1"}, {"x", "1"}, {false, true}, {0}},
-        {"system volume wins", {"x", "1", false, 9}, {"x", "1", true, 1}, newestOnly, {1}},
-        {"system volume stays", {"x", "1", true, 1}, {"x", "1", false, 9}, newestOnly, {0}},
-        {"later one wins", {"x", "1", true, 1}, {"x", "1", true, 2}, newestOnly, {1}},
-        {"equal times", {"x", "1", false, 2}, {"x", "1", false, 2}, newestOnly, {0}},
-        {"version before volume", {"x", "1", true, 9}, {"x", "2", false, 1}, newestOnly, {1}},
-        {"another identifier", {"x", "1"}, {"y", "1"}, newestOnly, {0, 1}},
-    };
-
-    for (const auto& test : cases)
-        EXPECT_EQ(keptByIndex({test.first, test.second}, test.mode), test.kept) << test.what;
-}
-
 TEST(Deduplication, AgreesWithAScanOfTheKeptList) {
     std::mt19937 random(20261122);
     const auto any = [&](int below) {
