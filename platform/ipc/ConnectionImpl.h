@@ -40,6 +40,7 @@ struct Connection::Impl final : SocketWatch::Target {
     // Reading. On the loop.
     void readable() override;
     void takeFrames();
+    void comeBack();
     using Complaint = std::optional<std::string>;
     [[nodiscard]] Complaint take(const Frame& frame);
     [[nodiscard]] Complaint takeRequest(const Frame& frame);

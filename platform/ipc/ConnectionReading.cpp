@@ -64,28 +64,40 @@ void Connection::Impl::readable() {
     takeFrames();
 }
 
-// Takes up what has come as far as the limits allow, hands some of it out, and then either reads on
-// or pauses.
+// Takes up what has come as far as the limits allow, hands some of it out, and then reads on, comes
+// back to what is left, or pauses.
 void Connection::Impl::takeFrames() {
     bool took = false;
-    while (mayTake()) {
+    bool emptied = false;
+    while (!emptied && mayTake()) {
         const auto frame = reader.next();
         if (!frame)
             return end(Replies::drop, frame.error());
-        if (!*frame)
-            break;
-        if (const auto complaint = take(**frame))
+        if (!*frame) {
+            emptied = true;
+        } else if (const auto complaint = take(**frame)) {
             return end(Replies::drop, *complaint);
-        took = true;
+        } else {
+            took = true;
+        }
     }
     reader.keep();
     if (took)
         takeTurn();
+    if (ended || !socket)
+        return;
     const bool admitted = admitBegun();
     if (pauseUnless(admitted))
         pause(admitted);
-    else
+    else if (emptied)
         socket->waitReadable(target());
+    else
+        comeBack(); // requests were done meanwhile; no new byte may ever come
+}
+
+// No wait on the socket keeps the connection until then; this does.
+void Connection::Impl::comeBack() {
+    loop.post([connection = owner->shared_from_this()] { connection->impl().goOn(); });
 }
 
 // Answers with what is malformed about the frame.

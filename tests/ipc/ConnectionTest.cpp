@@ -172,6 +172,20 @@ TEST_F(ConnectionTest, AFloodDoesNotDelayOthersByMoreThanItsTurn) {
     EXPECT_LE(last - order.begin(), 5 + 7);
 }
 
+// They come in one read, and no byte after them wakes the daemon.
+TEST_F(ConnectionTest, MoreRequestsThanMayWaitAreAllCarriedOut) {
+    Limits limits;
+    limits.waitingRequests = 8;
+    EchoServer server(path_, limits);
+    RawClient client(path_);
+    std::string all;
+    for (std::uint64_t i = 0; i < 60; ++i)
+        all += request(i, Dictionary{{"number", i}});
+    client.write(all);
+    for (std::uint64_t i = 0; i < 60; ++i)
+        ASSERT_EQ(client.read()->id, i);
+}
+
 TEST_F(ConnectionTest, ReadingPausesAtTheLimitAndGoesOn) {
     Limits limits;
     limits.waitingRequests = 8;
