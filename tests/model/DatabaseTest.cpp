@@ -14,7 +14,6 @@ using platform::Uuid;
 using platform::Value;
 using testing::ElementsAre;
 using testing::IsEmpty;
-using testing::UnorderedElementsAre;
 
 namespace {
 

@@ -8,7 +8,6 @@
 #include "platform/queue/SerialQueue.h"
 #include "tests/server/Awaited.h"
 
-using platform::Array;
 using platform::Dictionary;
 using platform::Value;
 using platform::ipc::ClientConnection;
