@@ -4,8 +4,8 @@
 
 #include "AppRegistry/ARBundleFiles.h"
 #include "AppRegistry/ARFolder.h"
-#include "AppRegistry/ARInfoKeys.h"
 #include "AppRegistry/ARPointKeys.h"
+#include "platform/bundle/InfoKeys.h"
 
 using platform::Dictionary;
 using platform::SharedBytes;
@@ -22,18 +22,18 @@ std::optional<SharedBytes> textEntry(const Dictionary& info, const char* key) {
 }
 
 const Dictionary* declarationOf(const Dictionary& info) {
-    const Value* extension = info.find(ARInfoKey::extension);
+    const Value* extension = info.find(platform::InfoKey::extension);
     return extension ? extension->dictionary() : nullptr;
 }
 
 std::optional<SharedBytes> plugInIdentifier(const Dictionary& info) {
     if (const Dictionary* declaration = declarationOf(info)) {
-        if (auto own = textEntry(*declaration, ARInfoKey::extensionIdentifier))
+        if (auto own = textEntry(*declaration, platform::InfoKey::extensionIdentifier))
             return own;
     }
-    if (auto own = textEntry(info, ARInfoKey::extensionIdentifier))
+    if (auto own = textEntry(info, platform::InfoKey::extensionIdentifier))
         return own;
-    return textEntry(info, ARInfoKey::bundleIdentifier);
+    return textEntry(info, platform::InfoKey::bundleIdentifier);
 }
 
 // The second byte of U+0080 to U+009F, whose first is c2.
@@ -49,7 +49,7 @@ std::optional<SharedBytes> identifierOf(ARKind kind, std::string_view path,
     case ARKind::plugIn:
         return plugInIdentifier(info);
     case ARKind::application:
-        return textEntry(info, ARInfoKey::bundleIdentifier);
+        return textEntry(info, platform::InfoKey::bundleIdentifier);
     case ARKind::extensionPoint:
         break;
     }
@@ -72,12 +72,13 @@ bool ARIsIdentifier(std::string_view text) {
 }
 
 Dictionary ARReportedInfo(ARKind kind, Dictionary info) {
-    if (kind != ARKind::plugIn || info.contains(ARInfoKey::extensionPoint))
+    if (kind != ARKind::plugIn || info.contains(platform::InfoKey::extensionPoint))
         return info;
     const Dictionary* declaration = declarationOf(info);
-    const Value* point = declaration ? declaration->find(ARInfoKey::extensionPoint) : nullptr;
+    const Value* point =
+        declaration ? declaration->find(platform::InfoKey::extensionPoint) : nullptr;
     if (point)
-        info.set(ARInfoKey::extensionPoint, Value(*point));
+        info.set(platform::InfoKey::extensionPoint, Value(*point));
     return info;
 }
 
@@ -90,10 +91,10 @@ std::optional<std::string> ARIdentify(ARBundleRow& row, std::string_view path,
         return "its identifier is not one";
     row.identifier = identifier.value_or(SharedBytes());
     row.originalIdentifier = row.identifier;
-    row.bundleIdentifier = textEntry(info, ARInfoKey::bundleIdentifier);
-    row.bundleVersion = textEntry(info, ARInfoKey::bundleVersion);
-    row.declaresTypes = info.contains(ARInfoKey::typeDeclarations);
-    const auto executable = textEntry(info, ARInfoKey::executable);
+    row.bundleIdentifier = textEntry(info, platform::InfoKey::bundleIdentifier);
+    row.bundleVersion = textEntry(info, platform::InfoKey::bundleVersion);
+    row.declaresTypes = info.contains(platform::InfoKey::typeDeclarations);
+    const auto executable = textEntry(info, platform::InfoKey::executable);
     if (executable && ARIsExecutableName(executable->view()))
         row.executable = *executable;
     if (row.kind == ARKind::plugIn)

@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <string_view>
 
-#include "AppRegistry/ARInfoKeys.h"
+#include "platform/bundle/InfoKeys.h"
 #include "platform/value/NumericOrder.h"
 
 using platform::SharedBytes;
@@ -27,14 +27,15 @@ std::optional<std::string_view> operandOfEquality(std::string_view pattern) {
 }
 
 const Value* ruleValueOf(const platform::Dictionary& info) {
-    const Value* extension = info.find(ARInfoKey::extension);
+    const Value* extension = info.find(platform::InfoKey::extension);
     const auto* declaration = extension ? extension->dictionary() : nullptr;
-    const Value* attributes = declaration ? declaration->find(ARInfoKey::attributes) : nullptr;
+    const Value* attributes =
+        declaration ? declaration->find(platform::InfoKey::attributes) : nullptr;
     if (attributes && attributes->dictionary()) {
-        if (const Value* found = attributes->dictionary()->find(ARInfoKey::extensionPoint))
+        if (const Value* found = attributes->dictionary()->find(platform::InfoKey::extensionPoint))
             return found;
     }
-    return info.find(ARInfoKey::extensionPoint);
+    return info.find(platform::InfoKey::extensionPoint);
 }
 
 } // namespace

@@ -1,8 +1,8 @@
 #include "AppRegistry/ARRegisteredApplication.h"
 
-#include "AppRegistry/ARInfoKeys.h"
 #include "AppRegistry/ARNames.h"
 #include "AppRegistry/ARSnapshot.h"
+#include "platform/bundle/InfoKeys.h"
 
 ARRegisteredApplication::ARRegisteredApplication(ARRowPtr row,
                                                  std::shared_ptr<ARProxyContext> context)
@@ -13,7 +13,7 @@ std::optional<std::string> ARRegisteredApplication::bundleIdentifier() const {
 }
 
 std::optional<std::string> ARRegisteredApplication::localizedName() const {
-    return ARLocalizedName(*context_, *row_, ARInfoKey::displayName);
+    return ARLocalizedName(*context_, *row_, platform::InfoKey::displayName);
 }
 
 std::vector<std::shared_ptr<const ARZephrinProxy>> ARRegisteredApplication::zephrinPlugins() const {

@@ -1,8 +1,8 @@
 #include "AppRegistry/ARRegisteredPlugIn.h"
 
-#include "AppRegistry/ARInfoKeys.h"
 #include "AppRegistry/ARLog.h"
 #include "AppRegistry/ARNames.h"
+#include "platform/bundle/InfoKeys.h"
 #include "platform/container/Containers.h"
 #include "platform/signing/CodeSigning.h"
 
@@ -32,7 +32,7 @@ std::optional<platform::Dictionary> ARRegisteredPlugIn::infoDictionary() const {
 
 std::optional<platform::Dictionary> ARRegisteredPlugIn::plugInDictionary() const {
     const auto info = infoDictionary();
-    const platform::Value* extension = info ? info->find(ARInfoKey::extension) : nullptr;
+    const platform::Value* extension = info ? info->find(platform::InfoKey::extension) : nullptr;
     if (!extension || !extension->dictionary())
         return std::nullopt;
     return *extension->dictionary();
@@ -46,11 +46,11 @@ const std::optional<platform::Dictionary>& ARRegisteredPlugIn::entitlements() co
 }
 
 std::optional<std::string> ARRegisteredPlugIn::localizedName() const {
-    return ARLocalizedName(*context_, *row_, ARInfoKey::displayName);
+    return ARLocalizedName(*context_, *row_, platform::InfoKey::displayName);
 }
 
 std::optional<std::string> ARRegisteredPlugIn::localizedShortName() const {
-    return ARLocalizedName(*context_, *row_, ARInfoKey::name);
+    return ARLocalizedName(*context_, *row_, platform::InfoKey::name);
 }
 
 std::optional<std::string> ARRegisteredPlugIn::dataContainerPath() const {

@@ -1,8 +1,8 @@
 #include "AppRegistry/ARRegistry.h"
 
-#include "AppRegistry/ARInfoKeys.h"
 #include "AppRegistry/ARLog.h"
 #include "AppRegistry/ARPass.h"
+#include "platform/bundle/InfoKeys.h"
 #include "platform/file/File.h"
 #include "platform/types/Types.h"
 
@@ -93,7 +93,8 @@ void ARRegistry::declareTypes() {
     });
     for (const ARRowPtr& row : declaring) {
         const auto info = context_->infos.dictionary(*row);
-        const platform::Value* declared = info ? info->find(ARInfoKey::typeDeclarations) : nullptr;
+        const platform::Value* declared =
+            info ? info->find(platform::InfoKey::typeDeclarations) : nullptr;
         if (declared)
             declarations.push_back(*declared);
     }

@@ -1,6 +1,6 @@
-#include "AppRegistry/ARInfoKeys.h"
 #include "AppRegistry/ARPointKeys.h"
 #include "AppRegistry/ARRegistry.h"
+#include "platform/bundle/InfoKeys.h"
 
 // The questions: answered from the published snapshot, on any thread.
 
@@ -8,7 +8,7 @@ namespace {
 
 // Candidates for the matching rules: narrowed down by the extension point where that is safe.
 ARSnapshot::PlugIns candidates(const ARSnapshot& snapshot, const platform::Dictionary& query) {
-    const platform::Value* pattern = query.find(ARInfoKey::extensionPoint);
+    const platform::Value* pattern = query.find(platform::InfoKey::extensionPoint);
     const auto keys = pattern ? ARPointKeysOfPattern(*pattern) : std::nullopt;
     return keys ? snapshot.plugInsWithPoints(*keys) : snapshot.plugIns();
 }

@@ -1,37 +1,10 @@
 #pragma once
 
-// Keys of information dictionaries, of the plug-in dictionary in them ("HXExtension"), and of
-// forms.
+#include "platform/bundle/InfoKeys.h"
 
-namespace InfoKey {
+namespace InfoKey = platform::InfoKey;
 
-// The information dictionary.
-inline constexpr const char* extension = "HXExtension";
-inline constexpr const char* oldStyle = "Zephrin";
-inline constexpr const char* displayName = "BQBundleDisplayName";
-inline constexpr const char* shortVersion = "BQBundleShortVersionString";
-inline constexpr const char* plistUrl = "BQBundleInfoPlistURL";
-inline constexpr const char* bundleIdentifier = "BQBundleIdentifier";
-
-// The plug-in dictionary.
-inline constexpr const char* multiple = "Multiple";
-inline constexpr const char* attributes = "HXExtensionAttributes";
-inline constexpr const char* protocol = "HXExtensionProtocol";
-inline constexpr const char* extensionPoint = "HXExtensionPointIdentifier";
-inline constexpr const char* principalClass = "PrincipalClass";
-inline constexpr const char* embeddedProtocol = "EmbeddedProtocol";
-inline constexpr const char* embeddedCode = "EmbeddedCode";
-inline constexpr const char* dedicated = "Dedicated";
-inline constexpr const char* passProxy = "PassProxy";
-inline constexpr const char* hubProtocolVersion = "HubProtocolVersion";
-inline constexpr const char* shared = "Shared";
-inline constexpr const char* hostEntitlement = "HXExtensionHostEntitlement";
-
-// The attributes in the plug-in dictionary.
-inline constexpr const char* version = "HXExtensionVersion";
-
-} // namespace InfoKey
-
+// Keys of forms.
 namespace FormKey {
 
 inline constexpr const char* path = "path";

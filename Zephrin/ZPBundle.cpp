@@ -1,6 +1,7 @@
 #include "Zephrin/ZPBundle.h"
 
 #include "Zephrin/FileURL.h"
+#include "Zephrin/InfoKeys.h"
 #include "Zephrin/ZPDLog.h"
 
 using platform::BundleReader;
@@ -9,7 +10,6 @@ using Property = platform::BundleReader::Property;
 namespace {
 
 constexpr const char* ownExecutable = "/proc/self/exe";
-constexpr const char* identifierKey = "BQBundleIdentifier";
 constexpr std::string_view plugInsFolder = "PlugIns";
 
 } // namespace
@@ -75,7 +75,7 @@ std::optional<platform::Dictionary> ZPBundle::infoDictionary() const {
 
 std::optional<std::string> ZPBundle::bundleIdentifier() const {
     const platform::Dictionary* info = reader_.infoDictionary();
-    const platform::Value* identifier = info ? info->find(identifierKey) : nullptr;
+    const platform::Value* identifier = info ? info->find(InfoKey::bundleIdentifier) : nullptr;
     const auto text = identifier ? identifier->string() : std::nullopt;
     return text ? std::optional<std::string>(*text) : std::nullopt;
 }

@@ -2,6 +2,7 @@
 
 #include <sys/stat.h>
 
+#include "platform/bundle/InfoKeys.h"
 #include "platform/file/File.h"
 #include "platform/file/OwnershipTest.h"
 #include "platform/plist/PropertyList.h"
@@ -11,7 +12,6 @@ namespace platform {
 namespace {
 
 constexpr std::string_view infoName = "/Info.plist";
-constexpr std::string_view executableKey = "BQBundleExecutable";
 
 bool isRegularFile(const std::string& path) {
     struct ::stat status = {};
@@ -78,7 +78,7 @@ BundleReader BundleReader::forTrustedExecutable(const std::string& path) {
 
 std::optional<std::string> BundleReader::executablePath() const {
     const Dictionary* info = infoDictionary();
-    const Value* value = info ? info->find(executableKey) : nullptr;
+    const Value* value = info ? info->find(InfoKey::executable) : nullptr;
     const auto name = value ? value->string() : std::nullopt;
     if (!name || !isPlainName(*name))
         return std::nullopt;
