@@ -138,7 +138,7 @@ private:
     // Each answers whether everything was granted.
     bool addResourceExtensions(platform::Dictionary& form) const;
     bool addServiceExtension(platform::Dictionary& form) const;
-    bool issueInto(platform::Dictionary& tokens, const platform::Value& resource) const;
+    void issueInto(platform::Dictionary& tokens, const platform::Value& resource) const;
     [[nodiscard]] std::expected<std::string, int> issueFileExtension(const std::string& file) const;
     [[nodiscard]] std::expected<std::string, int>
     issueServiceExtension(const std::string& bundleIdentifier) const;

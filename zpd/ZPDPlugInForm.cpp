@@ -1,6 +1,7 @@
 // The forms of a daemon record as replies carry them, with the sandbox grants of Sandbox.h, and
 // the encoded form that is kept between requests.
 
+#include <algorithm>
 #include <system_error>
 
 #include "Zephrin/InfoKeys.h"
@@ -121,12 +122,12 @@ bool ZPDPlugIn::addResourceExtensions(Dictionary& form) const {
     const auto resources = sharedResources();
     if (isNothing(resources))
         return true;
-    bool complete = true;
-    Dictionary tokens;
-    for (const Value& resource : asArray(*resources))
-        complete = issueInto(tokens, resource) && complete;
-    form.set(FormKey::extensions, std::move(tokens));
-    return complete;
+    const Dictionary tokens = issueResourceExtensions(*resources);
+    form.set(FormKey::extensions, tokens);
+    const Array wanted = asArray(*resources);
+    return std::all_of(wanted.begin(), wanted.end(), [&](const Value& resource) {
+        return !resource.string() || tokens.contains(*resource.string());
+    });
 }
 
 Dictionary ZPDPlugIn::issueResourceExtensions(const Value& resources) const {
@@ -136,19 +137,16 @@ Dictionary ZPDPlugIn::issueResourceExtensions(const Value& resources) const {
     return tokens;
 }
 
-bool ZPDPlugIn::issueInto(Dictionary& tokens, const Value& resource) const {
+void ZPDPlugIn::issueInto(Dictionary& tokens, const Value& resource) const {
     const auto name = resource.string();
     if (!name)
-        return true;
+        return;
     const std::string file = *name == wholeBundle ? path() : path() + "/" + std::string(*name);
     const auto token = issueFileExtension(file);
-    if (token) {
-        tokens.set(*name, *token);
-        return true;
-    }
+    if (token)
+        return tokens.set(*name, *token);
     ZPDLogSandbox().info("failed to make extension for %@ in plug-in at %@: %{public}s", file,
                          path(), systemText(token.error()));
-    return false;
 }
 
 bool ZPDPlugIn::addServiceExtension(Dictionary& form) const {

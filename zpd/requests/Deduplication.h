@@ -7,6 +7,7 @@
 #include <unordered_map>
 #include <vector>
 
+#include "Zephrin/Collections.h"
 #include "platform/value/NumericOrder.h"
 
 // Decides which registrations of one plug-in identifier a discovery keeps: the newest version, of
@@ -75,8 +76,7 @@ private:
     }
 
     [[nodiscard]] static bool beats(const Registration& newcomer, const Registration& kept) {
-        const auto order =
-            platform::compareNumerically(newcomer.exportedVersion(), kept.exportedVersion());
+        const auto order = compareVersionString(newcomer.exportedVersion(), kept.exportedVersion());
         if (order != 0)
             return order > 0;
         if (newcomer.onSystemVolume() != kept.onSystemVolume())
