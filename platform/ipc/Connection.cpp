@@ -69,10 +69,6 @@ bool Connection::isAlive() const noexcept {
     return impl_->alive;
 }
 
-bool Connection::greetingAnswered() const noexcept {
-    return impl_->greeted;
-}
-
 std::string Connection::describe() const {
     return "<connection " + std::to_string(impl_->number) + " pid=" + std::to_string(pid()) +
            " uid=" + std::to_string(impl_->peer.uid) + ">";

@@ -36,9 +36,6 @@ public:
     [[nodiscard]] pid_t pid() const noexcept;
     // False once the connection is gone.
     [[nodiscard]] bool isAlive() const noexcept;
-    // The client answered the greeting, so it is a program that knows this protocol and was
-    // running when the connection was accepted.
-    [[nodiscard]] bool greetingAnswered() const noexcept;
     // "<connection 17 pid=4242 uid=0>", for log lines.
     [[nodiscard]] std::string describe() const;
 

@@ -87,7 +87,6 @@ struct Connection::Impl final : SocketWatch::Target {
     const Limits limits;
     const std::uint64_t number;
     std::atomic<bool> alive = true;
-    std::atomic<bool> greeted = false;
     Outbox outbox;
 
     // On the loop.
@@ -95,6 +94,7 @@ struct Connection::Impl final : SocketWatch::Target {
     FrameReader reader{FrameReader::Side::daemon};
     SharedBytes challenge;
     bool answered = false;
+    bool greeted = false; // answered by the very process that connected
     bool awaitsUser = false;
     std::size_t reserved = 0;       // in the user's account, for the request that was begun
     std::unique_ptr<Watch> process; // while reading is paused

@@ -149,10 +149,6 @@ bool Loop::isCurrent() const noexcept {
     return impl_->runner.load(std::memory_order_relaxed) == std::this_thread::get_id();
 }
 
-void Loop::assertOnLoop() const {
-    assert(isCurrent());
-}
-
 void Loop::onSignal(int signal, Block handler) {
     assert(isCurrent() || impl_->runner.load() == std::thread::id());
     impl_->signals.push_back(

@@ -51,7 +51,6 @@ public:
     void post(Block block);
     // True on the loop's thread while it runs.
     [[nodiscard]] bool isCurrent() const noexcept;
-    void assertOnLoop() const;
 
     // Calls `handler` on the loop each time that the signal arrives; the signal's default action
     // is off from then on. For the life of the loop.
