@@ -75,6 +75,11 @@ TEST_F(StoreTest, StartsEmptyWithoutAFile) {
     EXPECT_FALSE(std::filesystem::exists(path));
 }
 
+TEST_F(StoreTest, ReadsUserDirectoriesFromTheSystemsConfiguration) {
+    EXPECT_EQ(ZPDAnnotationStore::confstrPath(_CS_PATH), "/bin:/usr/bin");
+    EXPECT_FALSE(ZPDAnnotationStore::confstrPath(-1));
+}
+
 TEST_F(StoreTest, MergesAndSavesWhatIsSet) {
     write(storeText(16, someAnnotations));
     auto store = open();
