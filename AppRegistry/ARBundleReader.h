@@ -6,7 +6,7 @@
 
 #include "AppRegistry/ARBundleFiles.h"
 #include "AppRegistry/ARBundleRow.h"
-#include "AppRegistry/ARContentHash.h"
+#include "platform/digest/Sha256.h"
 #include "platform/value/Value.h"
 
 // What was known of a bundle's files when they were last read.
@@ -45,7 +45,7 @@ private:
               ARCountingFile file, const ARKnownFiles& known);
 
     const ARBundleFiles& files_;
-    ARContentHash hash_;
+    platform::Sha256 hash_;
 };
 
 // True when a file is the one that was known, by its stamp alone.

@@ -5,6 +5,7 @@
 #include <optional>
 #include <vector>
 
+#include "platform/digest/Sha256.h"
 #include "platform/file/File.h"
 #include "platform/value/SharedBytes.h"
 #include "platform/value/Uuid.h"
@@ -41,8 +42,8 @@ struct ARStamp {
 };
 
 using ARStamps = std::array<ARStamp, countingFiles>;
-// SHA-256 each; all zero for a file that is missing or too large to be hashed.
-using ARDigest = std::array<std::uint8_t, 32>;
+// All zero for a file that is missing or too large to be hashed.
+using ARDigest = platform::Sha256Digest;
 using ARDigests = std::array<ARDigest, countingFiles>;
 
 // One entry of the registry as the database keeps it, less its info dictionary, which is fetched

@@ -1,6 +1,7 @@
-#include "AppRegistry/ARContentHash.h"
+#include "platform/digest/Sha256.h"
 
 #include <cerrno>
+#include <limits>
 #include <system_error>
 #include <unistd.h>
 #include <vector>
@@ -9,9 +10,11 @@
 
 #include "platform/file/File.h"
 
+namespace platform {
+
 namespace {
 
-constexpr std::size_t bufferSize = 256 * 1024;
+constexpr std::size_t bufferSize = 256UL * 1024;
 
 struct FreeContext {
     void operator()(EVP_MD_CTX* context) const { EVP_MD_CTX_free(context); }
@@ -23,7 +26,7 @@ struct FreeAlgorithm {
 
 } // namespace
 
-struct ARContentHash::Impl {
+struct Sha256::Impl {
     std::unique_ptr<EVP_MD, FreeAlgorithm> algorithm{EVP_MD_fetch(nullptr, "SHA256", nullptr)};
     std::unique_ptr<EVP_MD_CTX, FreeContext> context{EVP_MD_CTX_new()};
     std::vector<char> buffer;
@@ -34,37 +37,51 @@ struct ARContentHash::Impl {
         EVP_DigestUpdate(context.get(), bytes.data(), bytes.size());
     }
 
-    ARDigest finish() {
-        ARDigest digest{};
+    Sha256Digest finish() {
+        Sha256Digest digest{};
         EVP_DigestFinal_ex(context.get(), digest.data(), nullptr);
         return digest;
     }
 };
 
-ARContentHash::ARContentHash() : impl_(std::make_unique<Impl>()) {}
+Sha256::Sha256() : impl_(std::make_unique<Impl>()) {}
 
-ARContentHash::~ARContentHash() = default;
+Sha256::~Sha256() = default;
 
-ARDigest ARContentHash::of(std::string_view bytes) {
+Sha256Digest Sha256::of(std::string_view bytes) {
     impl_->begin();
     impl_->add(bytes);
     return impl_->finish();
 }
 
-std::expected<ARDigest, std::string> ARContentHash::ofFile(const std::string& path) {
-    const auto file = platform::openRegularFile(path);
+std::expected<Sha256Digest, std::string> Sha256::ofFile(const std::string& path) {
+    const auto file = openRegularFile(path);
     if (!file)
         return std::unexpected(describe(file.error()));
+    auto digest = ofOpenFile(file->get(), std::numeric_limits<std::uint64_t>::max());
+    if (!digest)
+        return std::unexpected(path + ": " + digest.error());
+    return digest;
+}
+
+std::expected<Sha256Digest, std::string> Sha256::ofOpenFile(int file, std::uint64_t largest) {
     impl_->buffer.resize(bufferSize);
     impl_->begin();
+    std::uint64_t offset = 0;
     for (;;) {
-        const ssize_t got = ::read(file->get(), impl_->buffer.data(), bufferSize);
+        const ssize_t got =
+            ::pread(file, impl_->buffer.data(), bufferSize, static_cast<off_t>(offset));
         if (got < 0 && errno == EINTR)
             continue;
         if (got < 0)
-            return std::unexpected(path + ": " + std::generic_category().message(errno));
+            return std::unexpected(std::generic_category().message(errno));
         if (got == 0)
             return impl_->finish();
+        offset += static_cast<std::uint64_t>(got);
+        if (offset > largest)
+            return std::unexpected("it is larger than " + std::to_string(largest) + " bytes");
         impl_->add({impl_->buffer.data(), static_cast<std::size_t>(got)});
     }
 }
+
+} // namespace platform
