@@ -6,6 +6,10 @@ namespace {
 
 class UnsignedTask final : public SigningTask {
 public:
+    void prepare(Done done) override { done(); }
+
+    void recheck() override {}
+
     [[nodiscard]] std::expected<std::optional<Value>, Error>
     entitlement(std::string_view /*key*/) override {
         return std::nullopt;
@@ -18,8 +22,13 @@ std::unique_ptr<SigningTask> UnsignedPrograms::taskFor(const ipc::Peer& /*peer*/
     return std::make_unique<UnsignedTask>();
 }
 
-std::optional<Dictionary> UnsignedPrograms::bundleEntitlements(std::string_view /*path*/) {
-    return std::nullopt;
+std::expected<SignatureGrant, std::string>
+UnsignedPrograms::verifyBundle(const SignedBundle& /*bundle*/) {
+    return std::unexpected("no key is trusted");
+}
+
+bool UnsignedPrograms::isTrusted(std::string_view /*key*/) {
+    return false;
 }
 
 } // namespace platform

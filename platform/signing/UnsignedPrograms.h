@@ -9,7 +9,9 @@ namespace platform {
 class UnsignedPrograms final : public CodeSigning {
 public:
     [[nodiscard]] std::unique_ptr<SigningTask> taskFor(const ipc::Peer& peer) override;
-    [[nodiscard]] std::optional<Dictionary> bundleEntitlements(std::string_view path) override;
+    [[nodiscard]] std::expected<SignatureGrant, std::string>
+    verifyBundle(const SignedBundle& bundle) override;
+    [[nodiscard]] bool isTrusted(std::string_view key) override;
 };
 
 } // namespace platform

@@ -210,7 +210,8 @@ TEST_F(FirstPass, KnowsExtensionPointsAndTypeDeclarations) {
 
 TEST_F(FirstPass, AsksForEntitlementsOfTheBundle) {
     makeUsual();
-    signing.granted[home / one] = Dictionary{{"com.example.may", true}};
+    home.write(std::string(one) + "/Signature", "signed");
+    signing.granted["signed"] = Dictionary{{"com.example.may", true}};
     open();
     EXPECT_EQ(at(one)->entitlements(), (Dictionary{{"com.example.may", true}}));
     EXPECT_FALSE(at(two)->entitlements());

@@ -36,10 +36,15 @@ struct FakeProcesses final : platform::Processes {
 
 struct FakeSigning final : platform::CodeSigning {
     platform::Dictionary clientEntitlements;             // every client's
-    std::map<std::string, platform::Dictionary> granted; // by bundle path
+    std::map<std::string, platform::Dictionary> granted; // by content of the signature file
+    std::string key = "the key";                         // whose grants count
 
     struct Task final : platform::SigningTask {
         explicit Task(platform::Dictionary e) : entitlements(std::move(e)) {}
+
+        void prepare(Done done) override { done(); }
+
+        void recheck() override {}
 
         [[nodiscard]] std::expected<std::optional<platform::Value>, platform::Error>
         entitlement(std::string_view key) override {
@@ -55,11 +60,15 @@ struct FakeSigning final : platform::CodeSigning {
         return std::make_unique<Task>(clientEntitlements);
     }
 
-    [[nodiscard]] std::optional<platform::Dictionary>
-    bundleEntitlements(std::string_view path) override {
-        const auto found = granted.find(std::string(path));
-        return found == granted.end() ? std::nullopt : std::optional(found->second);
+    [[nodiscard]] std::expected<platform::SignatureGrant, std::string>
+    verifyBundle(const platform::SignedBundle& bundle) override {
+        const auto found = granted.find(std::string(bundle.signature));
+        if (found == granted.end())
+            return std::unexpected("nobody granted this");
+        return platform::SignatureGrant{key, found->second};
     }
+
+    [[nodiscard]] bool isTrusted(std::string_view asked) override { return asked == key; }
 };
 
 struct FakeSandbox final : platform::Sandbox {
