@@ -5,56 +5,13 @@
 
 #include <gtest/gtest.h>
 
+#include "tests/ipc/Feed.h"
 #include "tests/ipc/Harness.h"
 
 namespace {
 
 using namespace platform::ipc;
 using namespace tests;
-
-// Feeds a reader in steps of given sizes and collects the bodies that come out.
-class Feed {
-public:
-    explicit Feed(FrameReader::Side side = FrameReader::Side::daemon) : reader_(side) {}
-
-    void bytes(std::string_view stream, bool isFromPeer = true) {
-        while (!stream.empty() && complaint.empty()) {
-            const auto room = reader_.room(scratch_.data(), scratch_.size());
-            std::size_t count = 0;
-            for (const iovec& part : room) {
-                const std::size_t n = std::min(part.iov_len, stream.size());
-                stream.copy(static_cast<char*>(part.iov_base), n);
-                stream.remove_prefix(n);
-                count += n;
-            }
-            reader_.filled(count, isFromPeer);
-            take();
-        }
-    }
-
-    std::vector<std::string> bodies;
-    std::vector<bool> fromPeer;
-    std::string complaint;
-
-private:
-    void take() {
-        for (;;) {
-            const auto frame = reader_.next();
-            if (!frame) {
-                complaint = frame.error();
-                return;
-            }
-            if (!*frame)
-                break;
-            bodies.emplace_back((*frame)->body);
-            fromPeer.push_back((*frame)->fromPeer);
-        }
-        reader_.keep();
-    }
-
-    FrameReader reader_;
-    std::string scratch_ = std::string(100, '\0');
-};
 
 TEST(FrameReaderTest, CutsTheSameFramesHoweverTheyArrive) {
     const std::vector<std::string> bodies = {
