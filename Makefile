@@ -49,7 +49,7 @@ bench:
 
 fuzz:
 	scripts/install-deps.sh build fuzz
-	JOBS=$(JOBS) $(BUILD) fuzz all
+	JOBS=$(JOBS) $(BUILD) fuzz fuzz_targets
 	JOBS=$(JOBS) scripts/fuzz.sh $(SECONDS)
 
 lint:

@@ -107,14 +107,26 @@ function(zephrin_test name)
 endfunction()
 
 # zephrin_fuzz_target(NAME SOURCES... LIBS...)
-# The libFuzzer program fuzz_NAME; `make fuzz` runs every one. Seeds are in fuzz/corpus/fuzz_NAME/.
+# The program fuzz_NAME. In the fuzz preset libFuzzer drives it, and `make fuzz` runs every one; in
+# other builds with tests it runs the inputs of fuzz/corpus/fuzz_NAME/, as the test fuzz.NAME.
 function(zephrin_fuzz_target name)
   cmake_parse_arguments(PARSE_ARGV 1 arg "" "" "SOURCES;LIBS")
   zephrin_reject_unparsed("${arg_UNPARSED_ARGUMENTS}")
   string(REGEX REPLACE "^fuzz_" "" area ${name})
-  add_executable(fuzz_${area} ${arg_SOURCES})
-  target_link_libraries(fuzz_${area} PRIVATE ${arg_LIBS})
-  target_link_options(fuzz_${area} PRIVATE -fsanitize=fuzzer)
+  set(target fuzz_${area})
+  add_executable(${target} ${arg_SOURCES} Require.cpp)
+  target_link_libraries(${target} PRIVATE ${arg_LIBS})
+  if(ZEPHRIN_FUZZ)
+    target_sources(${target} PRIVATE Entry.cpp)
+    target_link_options(${target} PRIVATE -fsanitize=fuzzer)
+    add_dependencies(fuzz_targets ${target})
+    return()
+  endif()
+  target_sources(${target} PRIVATE Replay.cpp)
+  set_target_properties(${target} PROPERTIES
+    RUNTIME_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/tests/bin)
+  add_test(NAME fuzz.${area} COMMAND ${target} ${PROJECT_SOURCE_DIR}/fuzz/corpus/${target})
+  set_tests_properties(fuzz.${area} PROPERTIES TIMEOUT 60)
 endfunction()
 
 function(zephrin_reject_unparsed arguments)

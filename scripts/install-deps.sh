@@ -11,7 +11,7 @@ packages_of() {
         ;;
     test) echo libgtest-dev libgmock-dev binutils ;;
     demo | bench) ;;
-    fuzz) echo clang-19 libclang-rt-19-dev ;;
+    fuzz) echo clang-19 libclang-rt-19-dev llvm-19 ;;
     lint) echo git clang-format-19 clang-tidy-19 ;;
     *)
         echo "install-deps.sh: unknown group: $1" >&2
