@@ -1,32 +1,14 @@
 #include "platform/locale/SystemLocale.h"
 
 #include <algorithm>
-#include <array>
-#include <cerrno>
 #include <cstdlib>
-#include <sys/inotify.h>
-#include <unistd.h>
 #include <utility>
-
-#include "platform/log/Log.h"
 
 namespace platform {
 
 namespace {
 
 constexpr std::size_t largestFile = 64 * 1024;
-
-std::string folderAbove(const std::string& path) {
-    const auto slash = path.rfind('/');
-    return slash == 0 || slash == std::string::npos ? "/" : path.substr(0, slash);
-}
-
-std::string nearestFolder(std::string path) {
-    do {
-        path = folderAbove(path);
-    } while (path != "/" && ::access(path.c_str(), F_OK) != 0);
-    return path;
-}
 
 std::string_view unquoted(std::string_view text) {
     if (text.size() >= 2 && (text.front() == '"' || text.front() == '\'') &&
@@ -79,36 +61,13 @@ std::string languageAndRegion(std::string_view localeName) {
     return std::string(sound ? name : language);
 }
 
-SystemLocale::SystemLocale(std::string path)
-    : path_(std::move(path)), watcher_(::inotify_init1(IN_NONBLOCK | IN_CLOEXEC)) {
-    if (!watcher_)
-        log::defaultLog().error("cannot watch %{public}s: %{errno}d", path_, errno);
-    watchNearestFolder();
+SystemLocale::SystemLocale(std::string path) : path_(std::move(path)), watch_(path_) {
     read();
 }
 
 std::string SystemLocale::current() {
     const std::lock_guard lock(mutex_);
     return current_;
-}
-
-// Watches the file's folder, or while that is missing the nearest one above it; a watch is set
-// before the folder below it is looked for, so that nothing is missed.
-void SystemLocale::watchNearestFolder() {
-    constexpr std::uint32_t events = IN_CLOSE_WRITE | IN_CREATE | IN_DELETE | IN_MOVED_TO |
-                                     IN_MOVED_FROM | IN_DELETE_SELF | IN_MOVE_SELF | IN_ONLYDIR;
-    if (!watcher_)
-        return;
-    for (std::string folder = nearestFolder(path_); folder != watchedFolder_;
-         folder = nearestFolder(path_)) {
-        const int added = ::inotify_add_watch(watcher_.get(), folder.c_str(), events);
-        if (added < 0 && errno == ENOSPC)
-            log::defaultLog().error("cannot watch %{public}s: %{errno}d", folder, errno);
-        if (watch_ >= 0 && added != watch_)
-            ::inotify_rm_watch(watcher_.get(), watch_);
-        watch_ = added;
-        watchedFolder_ = folder;
-    }
 }
 
 bool SystemLocale::read() {
@@ -125,13 +84,8 @@ bool SystemLocale::read() {
 }
 
 void SystemLocale::handleEvents() {
-    alignas(struct ::inotify_event) std::array<char, 4096> room;
-    while (::read(watcher_.get(), room.data(), room.size()) > 0) {
-        // Which name it was does not matter: the file is looked at anyway.
-    }
-    // A folder may have gone and come again: look for it anew.
-    watchedFolder_.clear();
-    watchNearestFolder();
+    if (!watch_.handleEvents())
+        return;
     const auto before = stamp_;
     const bool differs = read();
     if (handler_ && (differs || stamp_ != before))

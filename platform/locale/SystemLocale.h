@@ -6,6 +6,7 @@
 #include <string_view>
 
 #include "platform/file/File.h"
+#include "platform/file/PathWatch.h"
 #include "platform/locale/Locale.h"
 
 namespace platform {
@@ -23,20 +24,17 @@ public:
     void observeChanges(ChangeHandler handler) override { handler_ = std::move(handler); }
 
     // Non-blocking; -1 when this box has no descriptor to spare: then changes are not seen.
-    [[nodiscard]] int watchDescriptor() const { return watcher_.get(); }
+    [[nodiscard]] int watchDescriptor() const { return watch_.descriptor(); }
 
     // REQUIRES: on the main loop
     void handleEvents();
 
 private:
-    void watchNearestFolder();
     // Tells whether the locale is another one.
     bool read();
 
     const std::string path_;
-    UniqueFd watcher_;
-    int watch_ = -1;
-    std::string watchedFolder_;
+    PathWatch watch_;
     std::optional<FileStamp> stamp_;
     ChangeHandler handler_;
     std::mutex mutex_;
