@@ -4,10 +4,7 @@
 #include <memory>
 #include <mutex>
 #include <string>
-#include <string_view>
-#include <vector>
 
-#include "platform/file/File.h"
 #include "platform/signing/Ed25519.h"
 
 namespace platform {
@@ -15,12 +12,17 @@ namespace platform {
 // The keys that count at one time, by identifier. Never changes; shared.
 using TrustedKeys = std::map<std::string, PublicKey, std::less<>>;
 
-// The folder of trusted public keys (*.pem). Looked at anew on each request, read again when the
-// folder or a key changed. The folder and each key must pass the ownership test, or are ignored
-// with one error line for each state. Owned by the signing service; any thread.
+// The folder of trusted public keys (*.pem, one key each). Looked at anew on each request, read
+// again when the folder or a key changed. The folder, the folders above it and each key must pass
+// the ownership test, or are ignored with one error line for each state. Owned by the signing
+// service; any thread.
 class TrustFolder {
 public:
-    explicit TrustFolder(std::string path) : path_(std::move(path)) {}
+    static constexpr std::size_t mostKeys = 64;
+    static constexpr std::size_t largestKey = 64UL << 10;
+
+    explicit TrustFolder(std::string path);
+    ~TrustFolder();
 
     // What counts now; never empty-handed, perhaps without keys. The same object as long as
     // nothing changed.
@@ -33,7 +35,7 @@ private:
 
     const std::string path_;
     std::mutex mutex_;
-    std::shared_ptr<const State> state_;
+    std::unique_ptr<const State> state_;
 };
 
 } // namespace platform
