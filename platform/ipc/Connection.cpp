@@ -31,7 +31,8 @@ std::string describe(ConnectionError error) {
 Connection::Impl::Impl(Loop& itsLoop, UniqueFd itsSocket, Peer itsPeer,
                        std::shared_ptr<UserAccount> itsAccount, const Limits& itsLimits)
     : loop(itsLoop),
-      peer(std::move(itsPeer)),
+      identity(std::make_shared<const Peer>(std::move(itsPeer))),
+      peer(*identity),
       account(std::move(itsAccount)),
       limits(itsLimits),
       number(nextNumber()) {
@@ -57,8 +58,8 @@ Connection::Connection(std::unique_ptr<Impl> impl) : impl_(std::move(impl)) {
 
 Connection::~Connection() = default;
 
-const Peer& Connection::peer() const noexcept {
-    return impl_->peer;
+const std::shared_ptr<const Peer>& Connection::peer() const noexcept {
+    return impl_->identity;
 }
 
 pid_t Connection::pid() const noexcept {

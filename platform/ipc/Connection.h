@@ -31,7 +31,7 @@ public:
     Connection& operator=(const Connection&) = delete;
     ~Connection();
 
-    [[nodiscard]] const Peer& peer() const noexcept;
+    [[nodiscard]] const std::shared_ptr<const Peer>& peer() const noexcept;
     // The peer's process id, 0 once the connection is gone.
     [[nodiscard]] pid_t pid() const noexcept;
     // False once the connection is gone.

@@ -82,7 +82,8 @@ struct Connection::Impl final : SocketWatch::Target {
 
     Connection* owner = nullptr;
     Loop& loop;
-    const Peer peer;
+    const std::shared_ptr<const Peer> identity;
+    const Peer& peer; // the same
     const std::shared_ptr<UserAccount> account;
     const Limits limits;
     const std::uint64_t number;

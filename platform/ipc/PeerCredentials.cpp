@@ -1,10 +1,13 @@
 #include "platform/ipc/PeerCredentials.h"
 
+#include <cerrno>
 #include <fcntl.h>
 #include <string>
 #include <sys/socket.h>
 #include <sys/syscall.h>
 #include <unistd.h>
+
+#include "platform/file/FileGlance.h"
 
 namespace platform::ipc {
 
@@ -17,30 +20,38 @@ constexpr int peerPidfdOption = SO_PEERPIDFD;
 constexpr int peerPidfdOption = 77;
 #endif
 
-// The peer's process as the kernel knows it. Where it cannot tell, the process that has the pid
-// now: opened before anything else is asked of it.
+// The peer's process as the kernel knows it. Only a kernel that has no such answer is asked for the
+// process that has the pid now.
 UniqueFd processOf(int socket, pid_t pid) {
     int descriptor = -1;
     socklen_t size = sizeof(descriptor);
     if (::getsockopt(socket, SOL_SOCKET, peerPidfdOption, &descriptor, &size) == 0)
         return UniqueFd(descriptor);
-    return pid > 0 ? UniqueFd(static_cast<int>(::syscall(SYS_pidfd_open, pid, 0))) : UniqueFd();
+    if (errno != ENOPROTOOPT || pid <= 0)
+        return {};
+    return UniqueFd(static_cast<int>(::syscall(SYS_pidfd_open, pid, 0)));
 }
 
-bool isRunning(int process) {
-    return ::syscall(SYS_pidfd_send_signal, process, 0, nullptr, 0) == 0 || errno == EPERM;
+bool isOurNamespace(const std::string& process, const std::string& kind) {
+    const auto ours = FileGlance::throughProc("/proc/self/ns/" + kind);
+    const auto its = FileGlance::throughProc(process + "/ns/" + kind);
+    return ours && its && its->isSameFileAs(*ours);
 }
 
-// Whatever file the process runs now; empty when it was gone before the file was open, since the
-// pid might have been given to another one.
-UniqueFd executableOf(pid_t pid, int process) {
-    if (pid <= 0)
+// The file that the process runs now. In a user namespace of its own a process may have any file
+// named as the one that it runs, and in a pid namespace of its own it may sign as any process
+// there; neither can be left again, so that a look after the file was opened tells.
+UniqueFd executableOf(const Peer& peer) {
+    if (peer.pid <= 0 || !peer.process)
         return {};
-    const std::string path = "/proc/" + std::to_string(pid) + "/exe";
-    UniqueFd file(::open(path.c_str(), O_PATH | O_CLOEXEC));
-    if (process < 0 || !isRunning(process))
+    const std::string process = "/proc/" + std::to_string(peer.pid);
+    UniqueFd file(::open((process + "/exe").c_str(), O_PATH | O_CLOEXEC));
+    const auto glance = FileGlance::of(file.get());
+    if (!glance || !glance->mayRead())
         return {};
-    return file;
+    if (!isOurNamespace(process, "user") || !isOurNamespace(process, "pid"))
+        return {};
+    return isAlive(peer) ? std::move(file) : UniqueFd();
 }
 
 } // namespace
@@ -55,7 +66,7 @@ std::optional<Peer> peerOf(int socket) {
     peer.uid = credentials.uid;
     peer.gid = credentials.gid;
     peer.process = processOf(socket, peer.pid);
-    peer.executable = executableOf(peer.pid, peer.process.get());
+    peer.executable = executableOf(peer);
     return peer;
 }
 

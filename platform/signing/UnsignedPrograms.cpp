@@ -18,7 +18,7 @@ public:
 
 } // namespace
 
-std::unique_ptr<SigningTask> UnsignedPrograms::taskFor(const ipc::Peer& /*peer*/) {
+std::unique_ptr<SigningTask> UnsignedPrograms::taskFor(std::shared_ptr<const ipc::Peer> /*peer*/) {
     return std::make_unique<UnsignedTask>();
 }
 

@@ -8,7 +8,7 @@ namespace platform {
 // No state; any thread.
 class UnsignedPrograms final : public CodeSigning {
 public:
-    [[nodiscard]] std::unique_ptr<SigningTask> taskFor(const ipc::Peer& peer) override;
+    [[nodiscard]] std::unique_ptr<SigningTask> taskFor(std::shared_ptr<const ipc::Peer> peer) override;
     [[nodiscard]] std::expected<SignatureGrant, std::string>
     verifyBundle(const SignedBundle& bundle) override;
     [[nodiscard]] bool isTrusted(std::string_view key) override;

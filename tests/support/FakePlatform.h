@@ -56,7 +56,7 @@ struct FakeSigning final : platform::CodeSigning {
     };
 
     [[nodiscard]] std::unique_ptr<platform::SigningTask>
-    taskFor(const platform::ipc::Peer&) override {
+    taskFor(std::shared_ptr<const platform::ipc::Peer>) override {
         return std::make_unique<Task>(clientEntitlements);
     }
 
