@@ -1,7 +1,6 @@
 #include "platform/file/FileGlance.h"
 
 #include <array>
-#include <cerrno>
 #include <fcntl.h>
 #include <linux/capability.h>
 #include <linux/openat2.h>
@@ -16,11 +15,11 @@ namespace platform {
 
 namespace {
 
-std::expected<FileGlance, int> look(int folder, const char* path, int flags) {
+std::optional<FileGlance> look(int folder, const char* path, int flags) {
     struct ::statx status = {};
     if (::statx(folder, path, flags | AT_STATX_DONT_SYNC | AT_NO_AUTOMOUNT,
                 STATX_INO | STATX_UID | STATX_GID | STATX_TYPE | STATX_MODE, &status) != 0)
-        return std::unexpected(errno);
+        return std::nullopt;
     return FileGlance{.device = ::makedev(status.stx_dev_major, status.stx_dev_minor),
                       .inode = status.stx_ino,
                       .owner = status.stx_uid,
@@ -40,24 +39,20 @@ bool maySkipPermissions() {
 } // namespace
 
 std::optional<FileGlance> FileGlance::of(int descriptor) {
-    const auto glance = look(descriptor, "", AT_EMPTY_PATH);
-    return glance ? std::optional(*glance) : std::nullopt;
+    return look(descriptor, "", AT_EMPTY_PATH);
 }
 
 std::optional<FileGlance> FileGlance::throughProc(const std::string& link) {
-    const auto glance = look(AT_FDCWD, link.c_str(), 0);
-    return glance ? std::optional(*glance) : std::nullopt;
+    return look(AT_FDCWD, link.c_str(), 0);
 }
 
-std::expected<FileGlance, int> FileGlance::at(const std::string& path) {
+std::optional<FileGlance> FileGlance::at(const std::string& path) {
     ::open_how how{};
     how.flags = O_PATH | O_CLOEXEC;
     how.resolve = RESOLVE_CACHED;
     const UniqueFd file(
         static_cast<int>(::syscall(SYS_openat2, AT_FDCWD, path.c_str(), &how, sizeof(how))));
-    if (!file)
-        return std::unexpected(errno);
-    return look(file.get(), "", AT_EMPTY_PATH);
+    return file ? of(file.get()) : std::nullopt;
 }
 
 bool FileGlance::mayRead() const {

@@ -1,7 +1,6 @@
 #pragma once
 
 #include <cstdint>
-#include <expected>
 #include <optional>
 #include <string>
 
@@ -20,8 +19,8 @@ struct FileGlance {
     [[nodiscard]] static std::optional<FileGlance> of(int descriptor);
     // Of what a link in /proc (".../exe", ".../ns/user") leads to.
     [[nodiscard]] static std::optional<FileGlance> throughProc(const std::string& link);
-    // Of what lies at a path. On failure the errno value; EAGAIN when memory does not tell.
-    [[nodiscard]] static std::expected<FileGlance, int> at(const std::string& path);
+    // Of what lies at a path. Nothing also when memory does not tell.
+    [[nodiscard]] static std::optional<FileGlance> at(const std::string& path);
 
     [[nodiscard]] bool isSameFileAs(const FileGlance& other) const {
         return device == other.device && inode == other.inode;

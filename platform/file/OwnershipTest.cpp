@@ -36,9 +36,9 @@ std::optional<std::string> OwnershipTest::folderRefusal(const std::string& folde
     const auto known = folders_.find(folder);
     if (known != folders_.end())
         return known->second;
-    auto reason = ownRefusal(folder);
-    if (!reason && folder != "/")
-        reason = folderRefusal(folderAbove(folder));
+    auto reason = folder == "/" ? std::nullopt : folderRefusal(folderAbove(folder));
+    if (!reason)
+        reason = ownRefusal(folder);
     folders_.emplace(folder, reason);
     return reason;
 }
@@ -46,9 +46,9 @@ std::optional<std::string> OwnershipTest::folderRefusal(const std::string& folde
 std::optional<std::string> OwnershipTest::refusal(const std::string& canonicalPath) {
     if (!canonicalPath.starts_with('/') || canonicalPath.find('\0') != std::string::npos)
         return "not an absolute path";
-    if (auto reason = ownRefusal(canonicalPath))
+    if (auto reason = folderRefusal(folderAbove(canonicalPath)))
         return reason;
-    return folderRefusal(folderAbove(canonicalPath));
+    return ownRefusal(canonicalPath);
 }
 
 } // namespace platform
