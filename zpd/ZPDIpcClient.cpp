@@ -27,11 +27,11 @@ std::shared_ptr<ZPDIpcClient> ZPDIpcClient::create(const std::shared_ptr<Connect
 }
 
 ZPDIpcClient::ZPDIpcClient(const std::shared_ptr<Connection>& connection, ZPDServer& server)
-    : connection_(connection), server_(server), pid_(connection->pid()) {
+    : connection_(connection), server_(server), peer_(connection->peer()), pid_(peer_->pid) {
     learnPath();
     ZPDLogOps().debug("new client %d %s", pid(), path_);
     platform::probe::clientNew(pid());
-    task_ = server_.services().signing.taskFor(connection->peer());
+    task_ = server_.services().signing.taskFor(peer_);
 }
 
 ZPDIpcClient::~ZPDIpcClient() = default;
@@ -40,7 +40,7 @@ ZPDIpcClient::~ZPDIpcClient() = default;
 // user could change has no bundle. Nothing is lost, as plug-ins in such an application are never
 // registered.
 void ZPDIpcClient::learnPath() {
-    auto path = server_.services().processes.executablePath(pid(), pathRoom);
+    auto path = server_.services().processes.executablePath(*peer_, pathRoom);
     if (!path)
         return;
     path_ = std::move(*path);

@@ -10,6 +10,7 @@
 
 #include "Zephrin/ZPBundle.h"
 #include "platform/ipc/Message.h"
+#include "platform/ipc/Peer.h"
 #include "platform/value/Value.h"
 #include "zpd/ZPDEntitlementHolder.h"
 
@@ -39,6 +40,9 @@ public:
     [[nodiscard]] std::shared_ptr<platform::ipc::Connection> connection() const;
 
     [[nodiscard]] ZPDServer& server() const { return server_; }
+
+    // Who connected; stays when the connection is gone.
+    [[nodiscard]] const platform::ipc::Peer& peer() const { return *peer_; }
 
     // 0 once the connection is gone.
     [[nodiscard]] pid_t pid() const { return pid_; }
@@ -79,6 +83,7 @@ private:
 
     const std::weak_ptr<platform::ipc::Connection> connection_;
     ZPDServer& server_;
+    const std::shared_ptr<const platform::ipc::Peer> peer_;
     std::atomic<pid_t> pid_;
     std::string path_;
     std::optional<ZPBundle> bundle_;

@@ -2,26 +2,18 @@
 
 #include <cerrno>
 #include <climits>
-#include <sys/stat.h>
 #include <unistd.h>
+
+#include "platform/file/FileGlance.h"
+#include "platform/file/OwnershipTest.h"
 
 namespace platform {
 
 namespace {
 
-bool sameFile(const std::string& a, const std::string& b) {
-    struct ::stat first = {};
-    struct ::stat second = {};
-    return ::stat(a.c_str(), &first) == 0 && ::stat(b.c_str(), &second) == 0 &&
-           first.st_dev == second.st_dev && first.st_ino == second.st_ino;
-}
-
-} // namespace
-
-std::expected<std::string, int> ProcProcesses::executablePath(pid_t pid, std::size_t room) {
-    if (pid <= 0)
-        return std::unexpected(ESRCH);
-    const std::string link = "/proc/" + std::to_string(pid) + "/exe";
+// The path of an open file as the kernel has it; what lies there by now may be another one.
+std::expected<std::string, int> pathOf(int descriptor, std::size_t room) {
+    const std::string link = "/proc/self/fd/" + std::to_string(descriptor);
     std::string path(PATH_MAX, '\0');
     const ssize_t length = ::readlink(link.c_str(), path.data(), path.size());
     if (length < 0)
@@ -29,8 +21,33 @@ std::expected<std::string, int> ProcProcesses::executablePath(pid_t pid, std::si
     path.resize(static_cast<std::size_t>(length));
     if (path.size() >= room || path.size() == PATH_MAX)
         return std::unexpected(ENAMETOOLONG);
-    // The link is followed to the running file itself, whatever lies at the path by now.
-    if (!sameFile(link, path))
+    return path;
+}
+
+// A running program's path is in memory as a rule. Where it is not, the way to it is walked only
+// through folders that no stranger made.
+std::optional<FileGlance> fileAt(const std::string& path) {
+    if (const auto glance = FileGlance::at(path))
+        return *glance;
+    if (OwnershipTest().refusal(path))
+        return std::nullopt;
+    const auto file = stampOf(path);
+    return file ? std::optional(FileGlance{.device = file->device, .inode = file->inode})
+                : std::nullopt;
+}
+
+} // namespace
+
+std::expected<std::string, int> ProcProcesses::executablePath(const ipc::Peer& peer,
+                                                              std::size_t room) {
+    const auto running = FileGlance::of(peer.executable.get());
+    if (!running)
+        return std::unexpected(ESRCH);
+    auto path = pathOf(peer.executable.get(), room);
+    if (!path)
+        return path;
+    const auto there = fileAt(*path);
+    if (!there || !there->isSameFileAs(*running))
         return std::unexpected(ENOENT);
     return path;
 }

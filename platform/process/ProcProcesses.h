@@ -7,7 +7,7 @@ namespace platform {
 // Other processes as /proc tells of them. No state; any thread.
 class ProcProcesses final : public Processes {
 public:
-    [[nodiscard]] std::expected<std::string, int> executablePath(pid_t pid,
+    [[nodiscard]] std::expected<std::string, int> executablePath(const ipc::Peer& peer,
                                                                  std::size_t room) override;
 };
 

@@ -3,7 +3,8 @@
 #include <cstddef>
 #include <expected>
 #include <string>
-#include <sys/types.h>
+
+#include "platform/ipc/Peer.h"
 
 namespace platform {
 
@@ -12,10 +13,10 @@ class Processes {
 public:
     virtual ~Processes() = default;
 
-    // The executable path of a process, when it fits a buffer of `room` bytes (its closing NUL
-    // included) and leads, in our own mounts, to the very file that runs. On failure the errno
-    // value.
-    [[nodiscard]] virtual std::expected<std::string, int> executablePath(pid_t pid,
+    // The path of the file that a peer ran when it connected, when it fits a buffer of `room` bytes
+    // (its closing NUL included) and leads, in our own mounts, to that very file. On failure the
+    // errno value. Waits for no file system that a stranger could have put there.
+    [[nodiscard]] virtual std::expected<std::string, int> executablePath(const ipc::Peer& peer,
                                                                          std::size_t room) = 0;
 };
 

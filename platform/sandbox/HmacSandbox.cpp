@@ -62,10 +62,12 @@ HmacSandbox::~HmacSandbox() {
     OPENSSL_cleanse(secret_.data(), secret_.size());
 }
 
-bool HmacSandbox::isSandboxed(pid_t pid) {
-    const auto process = Confinement::of(pid);
+bool HmacSandbox::isSandboxed(const ipc::Peer& peer) {
+    if (!peer.executable)
+        return true;
+    const auto process = Confinement::of(peer.pid);
     const auto self = Confinement::of(::getpid());
-    if (!process || !self)
+    if (!process || !self || !ipc::isAlive(peer))
         return true;
     return isMoreConfined(*process, *self, Confinement::of(1));
 }

@@ -19,7 +19,7 @@ public:
     HmacSandbox();
     ~HmacSandbox() override;
 
-    [[nodiscard]] bool isSandboxed(pid_t pid) override;
+    [[nodiscard]] bool isSandboxed(const ipc::Peer& peer) override;
     [[nodiscard]] std::expected<std::string, int>
     issueFileExtension(std::string_view extensionClass, std::string_view path,
                        std::uint32_t flags) override;

@@ -4,7 +4,8 @@
 #include <expected>
 #include <string>
 #include <string_view>
-#include <sys/types.h>
+
+#include "platform/ipc/Peer.h"
 
 namespace platform {
 
@@ -18,8 +19,9 @@ public:
 
     virtual ~Sandbox() = default;
 
-    // True when the process is more confined than the daemon itself.
-    [[nodiscard]] virtual bool isSandboxed(pid_t pid) = 0;
+    // True when the peer is more confined than the daemon itself, and when nothing may be concluded
+    // about it, as it is without executable or gone.
+    [[nodiscard]] virtual bool isSandboxed(const ipc::Peer& peer) = 0;
 
     // A token, or the errno value.
     [[nodiscard]] virtual std::expected<std::string, int>

@@ -9,6 +9,7 @@
 #include "platform/sandbox/Confinement.h"
 #include "platform/sandbox/HmacSandbox.h"
 #include "tests/platform/TestFolder.h"
+#include "tests/support/PeerOfProcess.h"
 
 using namespace platform;
 using testing::MatchesRegex;
@@ -68,9 +69,14 @@ TEST(HmacSandbox, RefusesWhatIsNotThere) {
 
 TEST(HmacSandbox, TellsWhoIsMoreConfined) {
     HmacSandbox sandbox;
-    EXPECT_FALSE(sandbox.isSandboxed(::getpid()));
-    EXPECT_TRUE(sandbox.isSandboxed(0));
-    EXPECT_TRUE(sandbox.isSandboxed(4'194'305)) << "beyond the greatest pid";
+    ipc::Peer self = peerOfProcess(::getpid());
+    EXPECT_FALSE(sandbox.isSandboxed(self));
+    EXPECT_TRUE(sandbox.isSandboxed(ipc::Peer{}));
+    self.process.reset();
+    EXPECT_TRUE(sandbox.isSandboxed(self)) << "the pid may be another's";
+    self = peerOfProcess(::getpid());
+    self.executable.reset();
+    EXPECT_TRUE(sandbox.isSandboxed(self)) << "nobody knows what it is";
 }
 
 TEST(Confinement, ComparesFiltersAndNamespaces) {

@@ -18,6 +18,7 @@
 #include "platform/preferences/FilePreferences.h"
 #include "platform/process/ProcProcesses.h"
 #include "tests/platform/TestFolder.h"
+#include "tests/support/PeerOfProcess.h"
 
 namespace fs = std::filesystem;
 using namespace platform;
@@ -156,14 +157,13 @@ TEST(FolderContainers, RefusesWhatWouldLeadElsewhere) {
 
 TEST(ProcProcesses, TellTheRunningFileAtItsOwnPath) {
     ProcProcesses processes;
-    const auto own = processes.executablePath(::getpid(), 4096);
+    const ipc::Peer self = peerOfProcess(::getpid());
+    const auto own = processes.executablePath(self, 4096);
     ASSERT_TRUE(own);
     EXPECT_EQ(*own, fs::read_symlink("/proc/self/exe"));
-    EXPECT_EQ(processes.executablePath(::getpid(), own->size() + 1), own);
-    EXPECT_EQ(processes.executablePath(::getpid(), own->size()).error(), ENAMETOOLONG);
-    EXPECT_EQ(processes.executablePath(0, 4096).error(), ESRCH);
-    EXPECT_EQ(processes.executablePath(-1, 4096).error(), ESRCH);
-    EXPECT_FALSE(processes.executablePath(4'194'305, 4096)) << "beyond the greatest pid";
+    EXPECT_EQ(processes.executablePath(self, own->size() + 1), own);
+    EXPECT_EQ(processes.executablePath(self, own->size()).error(), ENAMETOOLONG);
+    EXPECT_EQ(processes.executablePath(ipc::Peer{}, 4096).error(), ESRCH);
 }
 
 TEST(ProcProcesses, DoNotNameAFileThatIsAnotherByNow) {
@@ -176,13 +176,21 @@ TEST(ProcProcesses, DoNotNameAFileThatIsAnotherByNow) {
         ::_exit(127);
     }
     ProcProcesses processes;
-    for (int i = 0; i < 500 && processes.executablePath(child, 4096) != program; ++i)
+    ipc::Peer peer = peerOfProcess(child);
+    for (int i = 0; i < 500 && processes.executablePath(peer, 4096) != program; ++i) {
         ::usleep(10'000);
-    EXPECT_EQ(processes.executablePath(child, 4096), program);
+        peer = peerOfProcess(child);
+    }
+    EXPECT_EQ(processes.executablePath(peer, 4096), program);
+    EXPECT_TRUE(ipc::runsItsExecutable(peer));
     fs::remove(program);
-    EXPECT_EQ(processes.executablePath(child, 4096).error(), ENOENT) << "deleted";
+    EXPECT_EQ(processes.executablePath(peer, 4096).error(), ENOENT) << "deleted";
     fs::copy_file("/bin/sleep", program);
-    EXPECT_EQ(processes.executablePath(child, 4096).error(), ENOENT) << "replaced";
+    EXPECT_EQ(processes.executablePath(peer, 4096).error(), ENOENT) << "replaced";
+    EXPECT_TRUE(ipc::runsItsExecutable(peer));
+    peer.executable = peerOfProcess(::getpid()).executable;
+    EXPECT_FALSE(ipc::runsItsExecutable(peer)) << "became another program";
     ::kill(child, SIGKILL);
     ::waitpid(child, nullptr, 0);
+    EXPECT_FALSE(ipc::isAlive(peer));
 }

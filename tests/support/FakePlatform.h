@@ -23,9 +23,9 @@
 struct FakeProcesses final : platform::Processes {
     std::map<pid_t, std::string> paths;
 
-    [[nodiscard]] std::expected<std::string, int> executablePath(pid_t pid,
+    [[nodiscard]] std::expected<std::string, int> executablePath(const platform::ipc::Peer& peer,
                                                                  std::size_t room) override {
-        const auto found = paths.find(pid);
+        const auto found = paths.find(peer.pid);
         if (found == paths.end())
             return std::unexpected(ESRCH);
         if (found->second.size() >= room)
@@ -76,7 +76,7 @@ struct FakeSandbox final : platform::Sandbox {
     bool confined = false;
     std::vector<std::string> issued;
 
-    [[nodiscard]] bool isSandboxed(pid_t) override { return confined; }
+    [[nodiscard]] bool isSandboxed(const platform::ipc::Peer&) override { return confined; }
 
     [[nodiscard]] std::expected<std::string, int>
     issueFileExtension(std::string_view extensionClass, std::string_view path,

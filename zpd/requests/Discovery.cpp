@@ -45,7 +45,7 @@ void Transaction::matchPlugIns() {
 // Asks for the sandbox only where the entitlement is held.
 bool Transaction::mayDiscoverAll() const {
     return client().hasEntitlement(Entitlement::manager) &&
-           !server().services().sandbox.isSandboxed(client().pid());
+           !server().services().sandbox.isSandboxed(client().peer());
 }
 
 Discovery::Discovery(const Transaction& transaction, std::optional<Dictionary> rules,

@@ -88,10 +88,10 @@ void Discovery::hideRivals(const std::unordered_map<std::string_view, ZPDPlugIn:
 }
 
 std::optional<std::string> Discovery::clientPath() const {
-    const pid_t pid = transaction_.client().pid();
-    auto path = transaction_.server().services().processes.executablePath(pid, pathRoom);
+    const ZPDIpcClient& client = transaction_.client();
+    auto path = transaction_.server().services().processes.executablePath(client.peer(), pathRoom);
     if (path)
         return std::move(*path);
-    ZPDLogOps().error("Failed to determine path for pid %d, %{errno}d", pid, path.error());
+    ZPDLogOps().error("Failed to determine path for pid %d, %{errno}d", client.pid(), path.error());
     return std::nullopt;
 }
