@@ -1,3 +1,4 @@
+#include <algorithm>
 #include <optional>
 #include <vector>
 
@@ -9,9 +10,12 @@ namespace platform::plist {
 namespace {
 
 // What a list may come to when every shared object is counted each time it is used: a few hundred
-// bytes can name billions of values.
+// bytes can name billions of values. A small list must be cheap to read, too; what writers share
+// for good reason (keys, texts, now and then a small container) stays far below these factors.
 constexpr std::size_t mostValues = 262'144;
+constexpr std::size_t mostValuesPerByte = 16;
 constexpr std::size_t mostBytes = 64 * 1024 * 1024;
+constexpr std::size_t mostBytesPerByte = 256;
 
 constexpr std::size_t trailerSize = 32;
 constexpr double secondsFrom1970To2001 = 978'307'200.0;
@@ -22,7 +26,11 @@ constexpr double secondsFrom1970To2001 = 978'307'200.0;
 // marker byte (kind and, mostly, count) with its content. Lives for one call.
 class Reader {
 public:
-    Reader(std::string_view bytes, std::size_t deepest) : bytes_(bytes), deepest_(deepest) {}
+    Reader(std::string_view bytes, std::size_t deepest)
+        : bytes_(bytes),
+          deepest_(deepest),
+          valuesLeft_(std::min(mostValues, mostValuesPerByte * bytes.size())),
+          bytesLeft_(std::min(mostBytes, mostBytesPerByte * bytes.size())) {}
 
     [[nodiscard]] std::optional<Value> read() {
         return readTrailer() ? readObject(top_, 0) : std::nullopt;
@@ -66,8 +74,8 @@ private:
     std::size_t referenceSize_ = 0;
     std::uint64_t count_ = 0;
     std::uint64_t top_ = 0;
-    std::size_t valuesRead_ = 0;
-    std::size_t bytesRead_ = 0;
+    std::size_t valuesLeft_;
+    std::size_t bytesLeft_;
 };
 
 bool Reader::readTrailer() {
@@ -127,14 +135,14 @@ std::optional<std::string_view> Reader::takeBytes(Content& content, std::size_t 
     if (*count > content.bytes.size() / unit)
         return fail("a cut object");
     const std::string_view taken = content.bytes.substr(0, *count * unit);
-    bytesRead_ += taken.size();
-    if (bytesRead_ > mostBytes)
+    if (taken.size() > bytesLeft_)
         return fail("too much text and data");
+    bytesLeft_ -= taken.size();
     return taken;
 }
 
 std::optional<Value> Reader::readObject(std::uint64_t object, std::size_t level) {
-    if (++valuesRead_ > mostValues)
+    if (valuesLeft_-- == 0)
         return fail("too many values");
     const auto offset = offsetOf(object);
     if (!offset)

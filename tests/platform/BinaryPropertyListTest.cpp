@@ -172,14 +172,19 @@ TEST(PropertyListBinary, RefusesBadTables) {
 }
 
 TEST(PropertyListBinary, BoundsWhatSharingCanGrowTo) {
-    // Each array holds the next one fourteen times.
-    std::vector<std::string> arrays;
-    for (unsigned i = 0; i < 12; ++i) {
-        arrays.push_back("\xae");
-        arrays.back().append(14, static_cast<char>(i + 1));
-    }
-    arrays.push_back("\x09");
-    EXPECT_THAT(reason(plist::parse(list(arrays))), HasSubstr("too many values"));
+    // Each array holds the next one fourteen times; behind them stands what nothing refers to.
+    const auto arrays = [](unsigned levels, std::size_t unused) {
+        std::vector<std::string> objects;
+        for (unsigned i = 0; i < levels; ++i)
+            objects.push_back("\xae" + std::string(14, static_cast<char>(i + 1)));
+        objects.push_back("\x09");
+        objects.emplace_back(unused, 'x');
+        return list(objects);
+    };
+    EXPECT_TRUE(plist::parse(arrays(2, 0)));
+    EXPECT_THAT(reason(plist::parse(arrays(3, 0))), HasSubstr("too many values"));
+    EXPECT_TRUE(plist::parse(arrays(4, 60'000)));
+    EXPECT_THAT(reason(plist::parse(arrays(5, 60'000))), HasSubstr("too many values"));
 
     // One text of 30,000 bytes, 10,000 times.
     const std::string text = bytes({0x5f, 0x11}) + bigEndian(30'000, 2) + std::string(30'000, 'x');
