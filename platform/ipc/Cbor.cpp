@@ -94,12 +94,17 @@ Encoded encodeRecord(const SharedBytes& item) {
 }
 
 Encoded encodeRecordArray(std::vector<SharedBytes> items) {
-    std::string text;
-    CborEncoder encoder(text);
-    encoder.head(cbor::Major::array, items.size());
+    std::string array;
+    CborEncoder(array).head(cbor::Major::array, items.size());
+    std::size_t size = array.size();
     for (const SharedBytes& item : items)
-        encoder.shared(item);
-    return wrapped(text, encoder);
+        size += item.size();
+    std::string head;
+    CborEncoder encoder(head);
+    encoder.head(cbor::Major::tag, cbor::tagEncoded);
+    encoder.head(cbor::Major::bytes, size);
+    items.insert(items.begin(), SharedBytes(head + array));
+    return {std::make_shared<const std::vector<SharedBytes>>(std::move(items))};
 }
 
 std::expected<Value, Error> decodeRecord(std::string_view record) {

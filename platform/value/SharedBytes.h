@@ -1,5 +1,6 @@
 #pragma once
 
+#include <atomic>
 #include <cstddef>
 #include <span>
 #include <string_view>
@@ -14,7 +15,11 @@ public:
     SharedBytes() = default;
     explicit SharedBytes(std::string_view content);
     explicit SharedBytes(std::span<const std::byte> content);
-    SharedBytes(const SharedBytes& other) noexcept;
+
+    SharedBytes(const SharedBytes& other) noexcept : node_(other.node_) {
+        if (node_)
+            node_->holders.fetch_add(1, std::memory_order_relaxed);
+    }
 
     SharedBytes(SharedBytes&& other) noexcept : node_(std::exchange(other.node_, nullptr)) {}
 
@@ -23,7 +28,10 @@ public:
         return *this;
     }
 
-    ~SharedBytes();
+    ~SharedBytes() {
+        if (node_ && node_->holders.fetch_sub(1, std::memory_order_acq_rel) == 1)
+            release(node_);
+    }
 
     // Room of `size` bytes that `fill` (called once with the destination) writes before anyone
     // else can see them.
@@ -35,8 +43,9 @@ public:
         return made;
     }
 
-    [[nodiscard]] std::size_t size() const noexcept;
-    [[nodiscard]] const char* data() const noexcept;
+    [[nodiscard]] std::size_t size() const noexcept { return node_ ? node_->size : 0; }
+
+    [[nodiscard]] const char* data() const noexcept { return node_ ? node_->content() : ""; }
 
     [[nodiscard]] std::string_view view() const noexcept { return {data(), size()}; }
 
@@ -57,9 +66,17 @@ public:
     }
 
 private:
-    struct Node;
+    struct Node {
+        std::atomic<std::size_t> holders{1};
+        std::size_t size = 0;
+
+        [[nodiscard]] char* content() noexcept { return reinterpret_cast<char*>(this + 1); }
+    };
+
     [[nodiscard]] static SharedBytes uninitialized(std::size_t size);
-    [[nodiscard]] char* writable() noexcept;
+    static void release(Node* node) noexcept;
+
+    [[nodiscard]] char* writable() noexcept { return node_->content(); }
 
     Node* node_ = nullptr;
 };

@@ -193,9 +193,9 @@ public:
     [[nodiscard]] std::optional<bool> booleanValue() const noexcept;
 
     // Value equality with the booleans: true equals 1, false equals 0, whatever the number's kind.
-    [[nodiscard]] bool equalsTrue() const noexcept { return *this == Value(true); }
+    [[nodiscard]] bool equalsTrue() const noexcept { return isNumber() && *this == Value(true); }
 
-    [[nodiscard]] bool equalsFalse() const noexcept { return *this == Value(false); }
+    [[nodiscard]] bool equalsFalse() const noexcept { return isNumber() && *this == Value(false); }
 
     // Numbers compare by numeric value across kinds (exactly: no rounding of large integers);
     // everything else by kind and content.
