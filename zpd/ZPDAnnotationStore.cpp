@@ -159,6 +159,7 @@ std::optional<Error> ZPDAnnotationStore::loadDb(const std::string& path) {
     if (!loaded)
         return loaded.error();
     annotations_ = entriesThat(*loaded, [](const Value& entry) { return entry.dictionary(); });
+    ++changes_;
     return std::nullopt;
 }
 
@@ -216,7 +217,7 @@ void ZPDAnnotationStore::setAnnotation(const std::optional<Dictionary>& annotati
         add(key, *annotation);
     } else if (annotations_.contains(key)) {
         annotations_.remove(key);
-        unsaved_ = true;
+        changed();
     }
     if (!unsaved_)
         return;
@@ -235,5 +236,10 @@ void ZPDAnnotationStore::add(std::string_view key, const Dictionary& changes) {
     if (stored == merged)
         return;
     annotations_.set(key, std::move(merged));
+    changed();
+}
+
+void ZPDAnnotationStore::changed() {
+    ++changes_;
     unsaved_ = true;
 }

@@ -1,5 +1,7 @@
 #pragma once
 
+#include <atomic>
+#include <cstdint>
 #include <expected>
 #include <optional>
 #include <string>
@@ -17,7 +19,7 @@ class ZPDPlugIn;
 // The annotations of plug-ins that outlive the daemon, above all the user's elections: one
 // property-list file, read once and written whole after every change (docs/annotation-store.md).
 //
-// Owned by the database and called only on its queue; no lock.
+// Owned by the database and called only on its queue, where nothing else is said; no lock.
 class ZPDAnnotationStore {
 public:
     // Reads the store at `databasePath`, or at the usual place. Whatever is found there, the store
@@ -31,6 +33,9 @@ public:
     [[nodiscard]] static std::expected<std::string, platform::Error> confstrPath(int name);
 
     [[nodiscard]] const std::string& annotationsPath() const { return path_; }
+
+    // A number that is another one after each change of what is stored. Any thread.
+    [[nodiscard]] std::uint64_t changes() const noexcept { return changes_; }
 
     [[nodiscard]] std::optional<platform::Dictionary>
     annotationForIdentifier(std::string_view key) const;
@@ -51,9 +56,11 @@ private:
     void migrate();
     void prepareFolder(bool usualPlace) const;
     void add(std::string_view key, const platform::Dictionary& changes);
+    void changed();
 
     platform::Containers& containers_;
     std::string path_;
     platform::Dictionary annotations_; // annotation key to annotation dictionary
+    std::atomic<std::uint64_t> changes_ = 0;
     bool unsaved_ = false;
 };

@@ -54,6 +54,7 @@ ZPDPlugIn::Ptr ZPDatabase::cachedPlugIn(const Uuid& uuid) {
     if (found->second->isStillValid())
         return found->second;
     cache_.erase(found);
+    recordsDropped();
     return nullptr;
 }
 
@@ -77,7 +78,19 @@ void ZPDatabase::purgeCachesToLimit(std::uint32_t limit) {
         return;
     ZPDLogOps().info("purging cache for %d > %d", cache_.size(), limit);
     cache_.clear();
+    recordsDropped();
     platform_.workspace.clearSchemaCaches();
+}
+
+void ZPDatabase::recordsDropped() {
+    ++dropped_;
+    answers_.clear();
+}
+
+ZPDKnownAnswers::Basis ZPDatabase::basis() const {
+    return {.knowledge = platform_.workspace.knowledgeSequence(),
+            .annotations = annotations_.changes(),
+            .dropped = dropped_};
 }
 
 // The names of the records are in the old language.
@@ -139,11 +152,35 @@ ZPDatabase::plugInsWithinApplication(std::string_view canonicalPath) {
     return plugIns;
 }
 
-std::optional<ZPDatabase::PlugIns> ZPDatabase::findPlugIns(const std::optional<Dictionary>& query) {
+// Where every step is logged, every step is taken. An answer that left something out is made anew,
+// since it also tells in the log what it leaves out.
+std::shared_ptr<const ZPDatabase::PlugIns>
+ZPDatabase::findPlugIns(const std::optional<Dictionary>& query) {
+    auto key = debugging(ZPDLogOps()) ? std::nullopt : ZPDKnownAnswers::keyOf(query);
+    if (!key)
+        return ask(query).found;
+    ZPDKnownAnswers::Basis before;
+    auto known = sync_.sync([&] {
+        before = basis();
+        return answers_.find(*key, before);
+    });
+    if (known)
+        return known;
+    Answer answer = ask(query);
+    if (answer.complete) {
+        sync_.sync([&] {
+            if (before == basis())
+                answers_.keep(std::move(*key), answer.found, before);
+        });
+    }
+    return std::move(answer.found);
+}
+
+ZPDatabase::Answer ZPDatabase::ask(const std::optional<Dictionary>& query) {
     const bool debug = debugging(ZPDLogOps());
     const auto proxies = candidates(query);
     if (!proxies)
-        return std::nullopt;
+        return {};
     const std::size_t cachedBefore = debug ? cacheSize() : 0;
     PlugIns found;
     found.reserve(proxies->size());
@@ -155,7 +192,8 @@ std::optional<ZPDatabase::PlugIns> ZPDatabase::findPlugIns(const std::optional<D
         ZPDLogOps().debug("AR reported %u plug-ins (cache %u/%u)", found.size(), cachedBefore,
                           cacheSize());
     }
-    return found;
+    const bool complete = found.size() == proxies->size();
+    return {std::make_shared<const PlugIns>(std::move(found)), complete};
 }
 
 std::optional<ARApplicationWorkspace::PlugIns>
@@ -235,6 +273,7 @@ void ZPDatabase::pluginsWillUninstall(const std::vector<ARZephrinProxy::Ptr>& pl
                                  shown(proxy->bundlePath()));
             cache_.erase(proxy->plugInUUID());
         }
+        recordsDropped();
     });
     if (ZPDatabaseDelegate* const delegate = delegate_)
         delegate->removedPlugIns(plugIns);

@@ -17,6 +17,7 @@
 #include "zpd/Platform.h"
 #include "zpd/ZPDAnnotationStore.h"
 #include "zpd/ZPDKeyPool.h"
+#include "zpd/ZPDKnownAnswers.h"
 #include "zpd/ZPDPlugIn.h"
 #include "zpd/ZPDPlugInContext.h"
 
@@ -39,7 +40,7 @@ public:
 // after its destruction, which is on the main thread.
 class ZPDatabase : public ZPDAnnotationSource, private ARWorkspaceObserver {
 public:
-    using PlugIns = std::vector<ZPDPlugIn::Ptr>;
+    using PlugIns = ZPDKnownAnswers::PlugIns;
 
     static constexpr std::uint32_t defaultCacheLimit = 1'000'000;
     static constexpr const char* annotationChangeNotification =
@@ -62,9 +63,10 @@ public:
 
     // ---- Look-ups
 
-    // The plug-ins that the rules could accept, each once, in the registry's order; nothing when
-    // the registry's query fails. Without rules all.
-    [[nodiscard]] std::optional<PlugIns>
+    // The plug-ins that the rules could accept, each once, in the registry's order; empty when the
+    // registry's query fails. Without rules all. An answer is shared with whoever asks the same
+    // while nothing moves.
+    [[nodiscard]] std::shared_ptr<const PlugIns>
     findPlugIns(const std::optional<platform::Dictionary>& query);
     [[nodiscard]] ZPDPlugIn::Ptr findPlugIn(const platform::Uuid& uuid);
     // True when `findPlugIn` would find a record made already, and nobody uses the cache just now.
@@ -88,6 +90,10 @@ public:
     std::optional<platform::Error>
     setAnnotation(const std::optional<platform::Dictionary>& annotation, const ZPDPlugIn& plugIn);
     void notifyAnnotationChange();
+
+    // A number that is another one after each change of an annotation. Any thread.
+    [[nodiscard]] std::uint64_t annotationChanges() const { return annotations_.changes(); }
+
     // Elects a plug-in that has no election yet.
     // REQUIRES: on the database queue
     void autoElect(const ZPDPlugIn& plugIn);
@@ -103,8 +109,18 @@ private:
     [[nodiscard]] ZPDPlugIn::Ptr cachedPlugIn(const platform::Uuid& uuid);
     [[nodiscard]] ZPDPlugIn::Ptr createPlugInForProxy(const ARZephrinProxy::Ptr& proxy);
     void purgeCachesToLimit(std::uint32_t limit);
+    void recordsDropped();
+    [[nodiscard]] ZPDKnownAnswers::Basis basis() const;
 
     void localeChanged();
+
+    // What the registry answers, and whether nothing of it was left out.
+    struct Answer {
+        std::shared_ptr<const PlugIns> found;
+        bool complete = false;
+    };
+
+    [[nodiscard]] Answer ask(const std::optional<platform::Dictionary>& query);
     [[nodiscard]] std::optional<ARApplicationWorkspace::PlugIns>
     candidates(const std::optional<platform::Dictionary>& query);
     [[nodiscard]] ZPDPlugIn::Ptr plugInForCandidate(const ARZephrinProxy::Ptr& proxy);
@@ -119,5 +135,7 @@ private:
     std::atomic<std::uint32_t> cacheLimit_ = defaultCacheLimit;
     ZPDAnnotationStore annotations_;
     std::unordered_map<platform::Uuid, ZPDPlugIn::Ptr> cache_;
+    ZPDKnownAnswers answers_;
+    std::uint64_t dropped_ = 0;  // how often records left the cache
     platform::SerialQueue sync_; // last: its blocks use all of the above
 };

@@ -50,13 +50,14 @@ struct DatabaseTest : testing::Test {
         if (!granted.empty())
             plugIn->granted = std::move(granted);
         platform.workspace.installed.push_back(plugIn);
+        platform.workspace.move();
         return plugIn;
     }
 
     [[nodiscard]] std::vector<std::string> found(const std::optional<Dictionary>& query) {
         std::vector<std::string> identifiers;
-        const auto plugIns = database->findPlugIns(query).value();
-        for (const auto& plugIn : plugIns)
+        const auto plugIns = database->findPlugIns(query);
+        for (const auto& plugIn : *plugIns)
             identifiers.push_back(plugIn->identifier());
         return identifiers;
     }
@@ -132,8 +133,9 @@ TEST_F(DatabaseTest, FindsNothingForWhatIsUnknown) {
     EXPECT_FALSE(database->plugInsWithinApplication("/Applications/Host.app"));
     EXPECT_THAT(found(std::nullopt), IsEmpty());
     platform.workspace.failQueries = true;
-    EXPECT_EQ(database->findPlugIns(std::nullopt), std::nullopt);
-    EXPECT_EQ(database->findPlugIns(Dictionary{{"a", "b"}}), std::nullopt);
+    platform.workspace.move();
+    EXPECT_FALSE(database->findPlugIns(std::nullopt));
+    EXPECT_FALSE(database->findPlugIns(Dictionary{{"a", "b"}}));
 }
 
 TEST_F(DatabaseTest, SkipsWhatIsNotReady) {
@@ -147,6 +149,38 @@ TEST_F(DatabaseTest, SkipsWhatIsNotReady) {
     EXPECT_THAT(found(std::nullopt), ElementsAre("a", "alone"));
     EXPECT_THAT(found(Dictionary()), ElementsAre("a", "alone"));
     EXPECT_THAT(found(Dictionary{{"HXExtensionPointIdentifier", "x"}}), ElementsAre("a", "alone"));
+}
+
+TEST_F(DatabaseTest, SharesAnAnswerUntilSomethingMoves) {
+    const auto plugIn = install("a");
+    const Dictionary query{{"HXExtensionPointIdentifier", "x"}};
+    const auto record = database->findPlugIn(plugIn->uuid);
+
+    const struct {
+        const char* name;
+        std::function<void()> change;
+    } cases[] = {
+        {"registry", [&] { platform.workspace.move(); }},
+        {"annotations", [&] { database->setAnnotation(Dictionary{{"election", 1}}, *record); }},
+        {"language", [&] { platform.locale.changed(); }},
+        {"removal", [&] { platform.workspace.observer->pluginsWillUninstall({plugIn}); }},
+    };
+
+    for (const auto& c : cases) {
+        const auto answer = database->findPlugIns(query);
+        EXPECT_EQ(database->findPlugIns(query), answer) << c.name;
+        EXPECT_NE(database->findPlugIns(std::nullopt), answer) << c.name;
+        c.change();
+        EXPECT_NE(database->findPlugIns(query), answer) << c.name;
+    }
+
+    const auto oldest = database->findPlugIns(query);
+    for (int i = 0; i < 16; ++i)
+        EXPECT_NE(database->findPlugIns(Dictionary{{"other", i}}), oldest);
+    EXPECT_NE(database->findPlugIns(query), oldest) << "only the last few are known";
+    install("unfinished")->application->placeholder = true;
+    const auto incomplete = database->findPlugIns(query);
+    EXPECT_NE(database->findPlugIns(query), incomplete) << "what is skipped is told each time";
 }
 
 TEST_F(DatabaseTest, FindsThePlugInsOfAnApplicationInOrder) {

@@ -34,7 +34,7 @@ struct Mode {
 
 // The kept ones of `offered`, by their places in it.
 std::vector<std::size_t> keptByIndex(const std::vector<Registration>& offered, Mode mode) {
-    Deduplication<Registration> deduplication(mode.allVersions, mode.allDuplicates);
+    Deduplication<Registration> deduplication(mode.allVersions, mode.allDuplicates, offered.size());
     std::vector<std::size_t> numbered;
     std::vector<bool> gone(offered.size());
     for (std::size_t i = 0; i < offered.size(); ++i) {

@@ -37,6 +37,7 @@ std::shared_ptr<FakePlugIn> ServerFixture::addPlugIn(const std::string& identifi
          Dictionary{{"HXExtensionPointIdentifier", "com.example.point"},
                     {"HXExtensionAttributes", Dictionary{{"HXExtensionVersion", version}}}}}};
     platform_.workspace.installed.push_back(plugIn);
+    platform_.workspace.move();
     return plugIn;
 }
 

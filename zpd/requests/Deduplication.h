@@ -1,10 +1,11 @@
 #pragma once
 
+#include <bit>
 #include <cstddef>
+#include <cstdint>
+#include <functional>
 #include <optional>
 #include <string>
-#include <string_view>
-#include <unordered_map>
 #include <vector>
 
 #include "Zephrin/Collections.h"
@@ -18,8 +19,8 @@
 // The rule is that of a scan over all kept matches, which decides at the first one of the same
 // identifier (and, with all versions, the same version). At most one such match is ever kept, so
 // a hash index finds it. Lives for one request, on the service queue; what it is offered outlives
-// it. A Registration tells identifier() (a string without NUL that stays where it is),
-// exportedVersion(), onSystemVolume() and lastModified().
+// it. A Registration tells identifier() (a string that stays where it is), exportedVersion(),
+// onSystemVolume() and lastModified().
 template <class Registration>
 class Deduplication {
 public:
@@ -28,55 +29,62 @@ public:
         std::optional<std::size_t> displaced; // the number of the match that goes
     };
 
-    // `allDuplicates` counts only with `allVersions`.
-    Deduplication(bool allVersions, bool allDuplicates)
-        : allVersions_(allVersions), everything_(allVersions && allDuplicates) {}
-
-    // Makes room for so many.
-    void reserve(std::size_t registrations) {
-        kept_.reserve(registrations);
-        if (!everything_)
-            (allVersions_ ? byVersion_.reserve(registrations) : newest_.reserve(registrations));
+    // `allDuplicates` counts only with `allVersions`. At most `most` registrations are offered.
+    Deduplication(bool allVersions, bool allDuplicates, std::size_t most)
+        : allVersions_(allVersions),
+          everything_(allVersions && allDuplicates),
+          places_(everything_ ? 0 : std::bit_ceil(2 * most + 1), nobody) {
+        kept_.reserve(most);
     }
 
     [[nodiscard]] Verdict offer(const Registration& registration) {
         if (everything_)
             return {true, std::nullopt};
-        const auto [place, isNew] = placeOf(registration);
-        if (isNew)
-            return keep(registration, *place, std::nullopt);
-        if (!beats(registration, *kept_[*place]))
+        std::uint32_t& place = placeOf(registration);
+        if (place == nobody)
+            return keep(registration, place, std::nullopt);
+        if (!beats(registration, *kept_[place]))
             return {false, std::nullopt};
-        return keep(registration, *place, *place);
+        return keep(registration, place, place);
     }
 
 private:
-    // Where the number of the kept rival is, or of the newcomer when there is none.
-    struct Place {
-        std::size_t* number;
-        bool isNew;
-    };
+    static constexpr std::uint32_t nobody = UINT32_MAX;
 
-    [[nodiscard]] Place placeOf(const Registration& registration) {
-        if (!allVersions_) {
-            const auto [found, isNew] = newest_.try_emplace(registration.identifier());
-            return {&found->second, isNew};
-        }
-        const auto [found, isNew] =
-            byVersion_.try_emplace(std::string(registration.identifier()) + '\0' +
-                                   platform::numericEqualityKey(registration.exportedVersion()));
-        return {&found->second, isNew};
+    // Where the number of the kept rival is, or that of the newcomer goes when there is none.
+    [[nodiscard]] std::uint32_t& placeOf(const Registration& registration) {
+        const std::size_t mask = places_.size() - 1;
+        std::size_t at = hashOf(registration) & mask;
+        while (places_[at] != nobody && !areRivals(registration, *kept_[places_[at]]))
+            at = (at + 1) & mask;
+        return places_[at];
     }
 
-    Verdict keep(const Registration& registration, std::size_t& place,
+    [[nodiscard]] std::size_t hashOf(const Registration& registration) const {
+        const std::hash<std::string> hash;
+        if (!allVersions_)
+            return hash(registration.identifier());
+        return hash(registration.identifier()) ^
+               hash(platform::numericEqualityKey(registration.exportedVersion()));
+    }
+
+    [[nodiscard]] bool areRivals(const Registration& a, const Registration& b) const {
+        return a.identifier() == b.identifier() && (!allVersions_ || orderOf(a, b) == 0);
+    }
+
+    [[nodiscard]] static std::weak_ordering orderOf(const Registration& a, const Registration& b) {
+        return compareVersionString(a.exportedVersion(), b.exportedVersion());
+    }
+
+    Verdict keep(const Registration& registration, std::uint32_t& place,
                  std::optional<std::size_t> displaced) {
-        place = kept_.size();
+        place = static_cast<std::uint32_t>(kept_.size());
         kept_.push_back(&registration);
         return {true, displaced};
     }
 
     [[nodiscard]] static bool beats(const Registration& newcomer, const Registration& kept) {
-        const auto order = compareVersionString(newcomer.exportedVersion(), kept.exportedVersion());
+        const auto order = orderOf(newcomer, kept);
         if (order != 0)
             return order > 0;
         if (newcomer.onSystemVolume() != kept.onSystemVolume())
@@ -87,6 +95,5 @@ private:
     const bool allVersions_;
     const bool everything_;
     std::vector<const Registration*> kept_;
-    std::unordered_map<std::string_view, std::size_t> newest_; // by identifier
-    std::unordered_map<std::string, std::size_t> byVersion_;   // by identifier and version
+    std::vector<std::uint32_t> places_; // numbers of kept ones, by hash; never more than half full
 };

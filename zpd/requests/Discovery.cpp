@@ -53,18 +53,17 @@ Discovery::Discovery(const Transaction& transaction, std::optional<Dictionary> r
     : transaction_(transaction),
       rules_(std::move(rules)),
       flags_(flags),
-      ownPlugInsPath_(plugInsPathOf(transaction.client())),
-      deduplication_(has(ZPDaemonClient::ZPDiscoverAllVersions),
-                     has(ZPDaemonClient::ZPDiscoverAllDuplicates)) {}
+      ownPlugInsPath_(plugInsPathOf(transaction.client())) {}
 
 std::vector<SharedBytes> Discovery::run() {
     readExclusions();
     fetchCandidates();
     traceCandidates();
     preferOwnPlugIns();
-    deduplication_.reserve(candidates_.size());
-    matches_.reserve(candidates_.size());
-    for (const auto& candidate : candidates_) {
+    deduplication_.emplace(has(ZPDaemonClient::ZPDiscoverAllVersions),
+                           has(ZPDaemonClient::ZPDiscoverAllDuplicates), candidates_->size());
+    matches_.reserve(candidates_->size());
+    for (const auto& candidate : *candidates_) {
         if (passes(*candidate))
             take(*candidate);
     }

@@ -2,6 +2,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <memory>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -39,7 +40,8 @@ private:
     void fetchCandidates();
     void traceCandidates() const;
     void preferOwnPlugIns();
-    void hideRivals(const std::unordered_map<std::string_view, ZPDPlugIn::Ptr>& ownPlugIns);
+    using OwnPlugIns = std::unordered_map<std::string_view, const ZPDPlugIn*>;
+    void hideRivals(const OwnPlugIns& ownPlugIns);
     [[nodiscard]] std::optional<std::string> clientPath() const;
 
     // ---- Which of them the client may see (DiscoveryFilters.cpp)
@@ -66,9 +68,9 @@ private:
     const std::optional<platform::Dictionary> rules_;
     const std::uint64_t flags_;
     const std::optional<std::string> ownPlugInsPath_;
-    std::vector<std::optional<platform::Dictionary>> exclusions_;
-    std::vector<ZPDPlugIn::Ptr> candidates_;
-    Deduplication<ZPDPlugIn> deduplication_;
+    std::vector<platform::Dictionary> exclusions_;
+    std::shared_ptr<const std::vector<ZPDPlugIn::Ptr>> candidates_; // keeps them
+    std::optional<Deduplication<ZPDPlugIn>> deduplication_;         // of them
     std::vector<Match> matches_; // displaced ones included; of candidates
     std::unordered_map<std::string, std::size_t> overrides_; // identifier to match that replaces it
     std::unordered_map<std::size_t, ReplyForm> markedForms_; // of matches that take part in that

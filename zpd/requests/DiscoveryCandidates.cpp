@@ -44,20 +44,21 @@ void Discovery::readExclusions() {
 }
 
 void Discovery::fetchCandidates() {
-    if (auto found = transaction_.server().findPlugIns(rules_))
-        candidates_ = std::move(*found);
+    candidates_ = transaction_.server().findPlugIns(rules_);
+    if (!candidates_)
+        candidates_ = std::make_shared<const std::vector<ZPDPlugIn::Ptr>>();
 }
 
 void Discovery::traceCandidates() const {
-    const auto count = static_cast<unsigned>(candidates_.size());
+    const auto count = static_cast<unsigned>(candidates_->size());
     platform::probe::discoverRaw(count);
     const auto& log = ZPDLogOps();
     if (!log.enabled(platform::log::Level::info))
         return;
-    if (candidates_.empty())
+    if (candidates_->empty())
         return log.info("Candidate plugin count: 0");
     Array lines;
-    for (const auto& candidate : candidates_)
+    for (const auto& candidate : *candidates_)
         lines.append(candidateLine(*candidate));
     log.info("Candidate plugin count: %u, info: %{public}@", count, Value(lines));
 }
@@ -67,24 +68,28 @@ void Discovery::preferOwnPlugIns() {
     const auto path = clientPath();
     if (!path)
         return;
-    std::unordered_map<std::string_view, ZPDPlugIn::Ptr> ownPlugIns;
-    for (const auto& candidate : candidates_) {
+    OwnPlugIns ownPlugIns;
+    for (const auto& candidate : *candidates_) {
         if (isWithin(*path, candidate->containingPath()))
-            ownPlugIns.insert_or_assign(candidate->identifier(), candidate);
+            ownPlugIns.insert_or_assign(candidate->identifier(), candidate.get());
     }
     if (!ownPlugIns.empty())
         hideRivals(ownPlugIns);
 }
 
-void Discovery::hideRivals(const std::unordered_map<std::string_view, ZPDPlugIn::Ptr>& ownPlugIns) {
-    std::erase_if(candidates_, [&](const ZPDPlugIn::Ptr& candidate) {
+void Discovery::hideRivals(const OwnPlugIns& ownPlugIns) {
+    std::vector<ZPDPlugIn::Ptr> visible;
+    visible.reserve(candidates_->size());
+    for (const auto& candidate : *candidates_) {
         const auto own = ownPlugIns.find(candidate->identifier());
-        if (own == ownPlugIns.end() || own->second == candidate)
-            return false;
-        ZPDLogOps().info(ignoringRival, own->second->uuid(), candidate->path(),
-                         own->second->path());
-        return true;
-    });
+        if (own == ownPlugIns.end() || own->second == candidate.get()) {
+            visible.push_back(candidate);
+        } else {
+            ZPDLogOps().info(ignoringRival, own->second->uuid(), candidate->path(),
+                             own->second->path());
+        }
+    }
+    candidates_ = std::make_shared<const std::vector<ZPDPlugIn::Ptr>>(std::move(visible));
 }
 
 std::optional<std::string> Discovery::clientPath() const {

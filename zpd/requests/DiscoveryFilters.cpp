@@ -37,7 +37,7 @@ bool Discovery::isDedicatedToAnother(const ZPDPlugIn& plugIn) const {
 
 bool Discovery::isExcluded(const ZPDPlugIn& plugIn) const {
     const bool excluded = std::ranges::any_of(
-        exclusions_, [&](const auto& exclusion) { return plugIn.match(exclusion); });
+        exclusions_, [&](const auto& exclusion) { return plugIn.match(std::optional(exclusion)); });
     if (excluded) {
         ZPDLogOps().info("client %d plugin %{public}@ globally excluded",
                          transaction_.client().pid(), plugIn.uuid());

@@ -19,7 +19,7 @@ void Discovery::take(const ZPDPlugIn& plugIn) {
     auto encoded = formOf(plugIn).encode();
     if (!encoded)
         return;
-    const auto verdict = deduplication_.offer(plugIn);
+    const auto verdict = deduplication_->offer(plugIn);
     if (verdict.displaced)
         matches_[*verdict.displaced].displaced = true;
     if (!verdict.keep)
