@@ -76,6 +76,10 @@ public:
     // Gives the form the plug-in's stored annotation, or an empty one.
     // REQUIRES: on the service queue
     void addAnnotationForPlugIn(const ZPDPlugIn& plugIn, ReplyForm& form) const;
+    // The plug-in's form, with its annotation, in its wire encoding; nothing, and a log line, when
+    // it cannot be made.
+    // REQUIRES: on the service queue
+    [[nodiscard]] std::optional<platform::SharedBytes> encodedForm(const ZPDPlugIn& plugIn) const;
 
 private:
     struct RequestType;

@@ -114,15 +114,19 @@ std::optional<Dictionary> ZPDPlugIn::infoPlist() const {
 }
 
 std::shared_ptr<const ZPDPlugInInfo> ZPDPlugIn::currentInfo() const {
-    const std::uint64_t sequence = context_.workspace.knowledgeSequence();
     const auto lock = locked();
+    follow();
+    return info_;
+}
+
+void ZPDPlugIn::follow() const {
+    const std::uint64_t sequence = context_.workspace.knowledgeSequence();
     if (sequence != 0 && sequence == knowledgeSequence_)
-        return info_;
+        return;
     const auto knowledge = context_.workspace.knowledge().uuid;
     if (!knowledge || knowledge != arKnowledgeUUID_)
         refresh(knowledge);
     knowledgeSequence_ = sequence;
-    return info_;
 }
 
 void ZPDPlugIn::refresh(const std::optional<Uuid>& knowledge) const {

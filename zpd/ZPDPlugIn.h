@@ -61,6 +61,8 @@ public:
     [[nodiscard]] std::optional<platform::Value> attribute(std::string_view key) const override;
     [[nodiscard]] std::optional<std::string> version() const override;
     [[nodiscard]] bool isDedicated() const override;
+    // What the registry has now, for several questions in a row; empty when the bundle has gone.
+    [[nodiscard]] std::shared_ptr<const ZPDPlugInInfo> currentInfo() const;
     // Every entry but those with keys that begin with "DT".
     [[nodiscard]] static platform::Dictionary
     prunedInfoDictionaryFor(const std::optional<platform::Dictionary>& info);
@@ -90,9 +92,13 @@ public:
     [[nodiscard]] std::expected<platform::Dictionary, platform::Error>
     replyForm(const platform::Dictionary& annotation) const;
     // The same in its wire encoding, one complete item. Kept until the annotation, a name or the
-    // registry's entry changes: asking again costs next to nothing.
+    // registry's entry changes. `annotations` is the state of the annotations in which this one
+    // was looked up, as a number.
     [[nodiscard]] std::expected<platform::SharedBytes, platform::Error>
-    encodedReplyForm(const platform::Dictionary& annotation) const;
+    encodedReplyForm(const platform::Dictionary& annotation, std::uint64_t annotations) const;
+    // The form that was kept, when it was made or confirmed in this state of the annotations:
+    // there is no need to look the annotation up again. Else empty.
+    [[nodiscard]] platform::SharedBytes keptReplyForm(std::uint64_t annotations) const;
 
     void setLocalizedName(std::optional<std::string> name) override;
     void setLocalizedShortName(std::optional<std::string> name) override;
@@ -100,8 +106,10 @@ public:
 
     // ---- Rules (ZPDPlugInMatching.cpp)
 
-    // True when every rule holds; without rules they do.
+    // True when every rule holds; without rules they do. `info` is the current information, for
+    // one who has it at hand.
     [[nodiscard]] bool match(const std::optional<platform::Dictionary>& rules) const;
+    [[nodiscard]] bool match(const platform::Dictionary& rules, const ZPDPlugInInfo* info) const;
     [[nodiscard]] bool matchKey(std::string_view key, const platform::Value& pattern) const;
     // One pattern or any of several.
     [[nodiscard]] bool matchValue(const platform::Value& value,
@@ -114,21 +122,23 @@ public:
 
     // Nothing when the client may see and use the plug-in, else the reason why not.
     [[nodiscard]] std::optional<std::string> allowForClient(ZPDEntitlementHolder& client) const;
+    [[nodiscard]] std::optional<std::string> allowForClient(ZPDEntitlementHolder& client,
+                                                            const ZPDPlugInInfo* info) const;
 
 private:
     // What is kept of an encoded form, and what it was made of.
     struct KeptForm {
         platform::SharedBytes encoded;
         platform::Dictionary annotation;
+        std::uint64_t annotations; // the state in which that was looked up
     };
 
     explicit ZPDPlugIn(const ZPDPlugInContext& context) : context_(context) {}
 
     [[nodiscard]] bool setupWithProxy(const ARZephrinProxy::Ptr& proxy);
-    // The information as the registry has it now; empty when it has gone.
-    [[nodiscard]] std::shared_ptr<const ZPDPlugInInfo> currentInfo() const;
 
     // REQUIRES: the record's lock is held
+    void follow() const;
     void refresh(const std::optional<platform::Uuid>& knowledge) const;
     void takeInfo(const ARZephrinProxy::Ptr& proxy) const;
     void setInfo(const std::optional<platform::Dictionary>& info) const;
@@ -143,7 +153,11 @@ private:
     [[nodiscard]] std::expected<std::string, int>
     issueServiceExtension(const std::string& bundleIdentifier) const;
 
-    [[nodiscard]] std::optional<platform::Value> ruleValue(std::string_view key) const;
+    [[nodiscard]] bool matchKey(std::string_view key, const platform::Value& pattern,
+                                const ZPDPlugInInfo* info) const;
+    [[nodiscard]] bool matchPattern(const platform::Value* value,
+                                    const platform::Value& pattern) const;
+    [[nodiscard]] std::optional<std::string> textProperty(std::string_view key) const;
     [[nodiscard]] std::string electionText() const;
 
     const ZPDPlugInContext& context_;

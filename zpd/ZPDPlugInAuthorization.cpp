@@ -19,13 +19,17 @@ std::string lacksEntitlement(const Value& entitlement) {
 } // namespace
 
 std::optional<std::string> ZPDPlugIn::allowForClient(ZPDEntitlementHolder& client) const {
+    return allowForClient(client, currentInfo().get());
+}
+
+std::optional<std::string> ZPDPlugIn::allowForClient(ZPDEntitlementHolder& client,
+                                                     const ZPDPlugInInfo* info) const {
     if (const auto allowed = client.entitlementValueForKey(Entitlement::allowedPlugIns)) {
         if (!allowed->dictionary())
             return "invalid host restriction entitlement";
-        if (!match(*allowed->dictionary()))
+        if (!match(*allowed->dictionary(), info))
             return "the host's plug-in entitlement does not allow this plug-in";
     }
-    const auto info = currentInfo();
     if (const Value* const required = info ? info->hostEntitlement() : nullptr) {
         const auto name = required->string();
         if (!name || !client.hasEntitlement(*name))

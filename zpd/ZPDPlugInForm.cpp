@@ -65,11 +65,14 @@ std::expected<Dictionary, Error> ZPDPlugIn::replyForm(const Dictionary& annotati
 }
 
 // A form that lacks a grant is not kept: the next request asks for the grant again.
-std::expected<SharedBytes, Error> ZPDPlugIn::encodedReplyForm(const Dictionary& annotation) const {
+std::expected<SharedBytes, Error> ZPDPlugIn::encodedReplyForm(const Dictionary& annotation,
+                                                              std::uint64_t annotations) const {
     const auto lock = locked();
-    const auto info = currentInfo(); // forgets the kept form when the registry's entry moved
-    if (keptForm_ && keptForm_->annotation.sameObject(annotation))
+    follow(); // forgets the kept form when the registry's entry moved
+    if (keptForm_ && keptForm_->annotation.sameObject(annotation)) {
+        keptForm_->annotations = annotations;
         return keptForm_->encoded;
+    }
     auto exported = exportForm();
     if (!exported)
         return std::unexpected(exported.error());
@@ -78,8 +81,14 @@ std::expected<SharedBytes, Error> ZPDPlugIn::encodedReplyForm(const Dictionary& 
     SharedBytes encoded = platform::ipc::encodeShared(*exported);
     keptForm_.reset();
     if (complete)
-        keptForm_ = KeptForm{encoded, annotation};
+        keptForm_ = KeptForm{encoded, annotation, annotations};
     return encoded;
+}
+
+SharedBytes ZPDPlugIn::keptReplyForm(std::uint64_t annotations) const {
+    const auto lock = locked();
+    follow();
+    return keptForm_ && keptForm_->annotations == annotations ? keptForm_->encoded : SharedBytes();
 }
 
 void ZPDPlugIn::forgetForm() const {

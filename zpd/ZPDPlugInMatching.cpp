@@ -60,26 +60,42 @@ bool compares(std::string_view value, std::string_view pattern) {
     return op->accepts(platform::compareNumerically(value, operand));
 }
 
-bool isThere(const std::optional<Value>& value) {
+bool isThere(const Value* value) {
     return value && !value->equalsFalse();
 }
 
 } // namespace
 
 bool ZPDPlugIn::match(const std::optional<Dictionary>& rules) const {
-    if (!rules)
-        return true;
-    for (const auto& rule : *rules) {
-        if (!matchKey(rule.key.view(), rule.value))
-            return false;
-    }
-    return true;
+    return !rules || match(*rules, currentInfo().get());
+}
+
+bool ZPDPlugIn::match(const Dictionary& rules, const ZPDPlugInInfo* info) const {
+    return std::all_of(rules.begin(), rules.end(), [&](const platform::DictionaryEntry& rule) {
+        return matchKey(rule.key.view(), rule.value, info);
+    });
 }
 
 bool ZPDPlugIn::matchKey(std::string_view key, const Value& pattern) const {
+    return matchKey(key, pattern, currentInfo().get());
+}
+
+bool ZPDPlugIn::matchKey(std::string_view key, const Value& pattern,
+                         const ZPDPlugInInfo* info) const {
+    if (key.starts_with(entitlementPrefix)) {
+        const auto value = valueForEntitlement(key.substr(entitlementPrefix.size()));
+        return matchPattern(value ? &*value : nullptr, pattern);
+    }
     if (key == containingAppRule && !containingPath())
         return false; // even where nothing is asked for
-    const auto value = ruleValue(key);
+    if (const auto text = textProperty(key)) {
+        const Value value(*text);
+        return matchPattern(&value, pattern);
+    }
+    return matchPattern(info ? info->property(key) : nullptr, pattern);
+}
+
+bool ZPDPlugIn::matchPattern(const Value* value, const Value& pattern) const {
     if (pattern.equalsTrue())
         return isThere(value);
     if (pattern.equalsFalse())
@@ -95,20 +111,15 @@ bool ZPDPlugIn::matchKey(std::string_view key, const Value& pattern) const {
                                    [&](const Value& v) { return matchValue(v, pattern); });
 }
 
-std::optional<Value> ZPDPlugIn::ruleValue(std::string_view key) const {
-    if (key.starts_with(entitlementPrefix))
-        return valueForEntitlement(key.substr(entitlementPrefix.size()));
+// The properties that are texts, and no entries of the information dictionary.
+std::optional<std::string> ZPDPlugIn::textProperty(std::string_view key) const {
     if (key == identifierRule)
         return identifier();
     if (key == uuidRule)
         return uuid().text();
     if (key == electionRule)
         return electionText();
-    if (key == containingAppRule)
-        return containingPath().transform([](const std::string& path) { return Value(path); });
-    const auto info = currentInfo();
-    const Value* const property = info ? info->property(key) : nullptr;
-    return property ? std::optional(*property) : std::nullopt;
+    return key == containingAppRule ? containingPath() : std::nullopt;
 }
 
 std::string ZPDPlugIn::electionText() const {

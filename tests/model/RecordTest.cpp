@@ -155,7 +155,7 @@ TEST(Refresh, SeesWhatTheRegistrySaysNow) {
     EXPECT_EQ(record->version(), std::nullopt);
     EXPECT_EQ(record->infoPlist(), std::nullopt);
     EXPECT_FALSE(record->exportForm());
-    EXPECT_FALSE(record->encodedReplyForm({}));
+    EXPECT_FALSE(record->encodedReplyForm({}, 0));
 
     world.platform.workspace.installed = {moved};
     EXPECT_EQ(record->version(), std::nullopt); // not before the registry moves again
@@ -211,10 +211,10 @@ TEST(Grants, MayFailWithoutHarmToTheForm) {
     Dictionary form;
     EXPECT_FALSE(record->augmentForm(form));
     EXPECT_EQ(form, (Dictionary{{"extensions", Dictionary()}}));
-    EXPECT_FALSE(decoded(record->encodedReplyForm({})).contains("service-extension"));
+    EXPECT_FALSE(decoded(record->encodedReplyForm({}, 0)).contains("service-extension"));
 
     world.platform.sandbox.failure = 0;
-    EXPECT_TRUE(decoded(record->encodedReplyForm({})).contains("service-extension"));
+    EXPECT_TRUE(decoded(record->encodedReplyForm({}, 0)).contains("service-extension"));
 }
 
 // ---- The kept form
@@ -224,10 +224,10 @@ TEST(KeptForm, StaysUntilSomethingInItChanges) {
     auto plugIn = samplePlugIn();
     const auto record = world.record(plugIn);
     const Dictionary annotation{{"election", 1}};
-    const auto first = record->encodedReplyForm(annotation).value();
+    const auto first = record->encodedReplyForm(annotation, 0).value();
     EXPECT_EQ(decoded(first), record->replyForm(annotation).value());
     const auto isKept = [&] {
-        return record->encodedReplyForm(annotation).value().sameAllocation(first);
+        return record->encodedReplyForm(annotation, 0).value().sameAllocation(first);
     };
     EXPECT_TRUE(isKept());
 
@@ -239,6 +239,13 @@ TEST(KeptForm, StaysUntilSomethingInItChanges) {
     world.platform.workspace.installed = {equal};
     world.platform.workspace.move();
     EXPECT_TRUE(isKept());
+
+    EXPECT_TRUE(record->keptReplyForm(0).sameAllocation(first));
+    EXPECT_EQ(record->keptReplyForm(1).size(), 0U); // the annotation may be another by now
+    EXPECT_TRUE(record->encodedReplyForm(annotation, 1).value().sameAllocation(first));
+    EXPECT_TRUE(record->keptReplyForm(1).sameAllocation(first)); // and is not
+    record->setLocalizedName("Probe");
+    EXPECT_EQ(record->keptReplyForm(1).size(), 0U);
 }
 
 TEST(KeptForm, IsMadeAnewForEachChange) {
@@ -246,7 +253,7 @@ TEST(KeptForm, IsMadeAnewForEachChange) {
     auto plugIn = samplePlugIn();
     const auto record = world.record(plugIn);
     const auto now = [&](Dictionary annotation) {
-        return decoded(record->encodedReplyForm(annotation));
+        return decoded(record->encodedReplyForm(annotation, 0));
     };
     EXPECT_EQ(*now({{"election", 1}}).find("annotations"), Value(Dictionary{{"election", 1}}));
     EXPECT_EQ(*now({{"election", 0}}).find("annotations"), Value(Dictionary{{"election", 0}}));

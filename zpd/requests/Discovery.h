@@ -45,12 +45,14 @@ private:
     [[nodiscard]] std::optional<std::string> clientPath() const;
 
     // ---- Which of them the client may see (DiscoveryFilters.cpp)
+    // `info` is the plug-in's current information, or null.
     [[nodiscard]] bool passes(const ZPDPlugIn& plugIn) const;
-    [[nodiscard]] bool isOffered(const ZPDPlugIn& plugIn) const;
+    [[nodiscard]] bool isOffered(const ZPDPlugIn& plugIn, const ZPDPlugInInfo* info) const;
     [[nodiscard]] bool isInPlace(const ZPDPlugIn& plugIn) const;
-    [[nodiscard]] bool isDedicatedToAnother(const ZPDPlugIn& plugIn) const;
-    [[nodiscard]] bool isExcluded(const ZPDPlugIn& plugIn) const;
-    [[nodiscard]] bool isAllowed(const ZPDPlugIn& plugIn) const;
+    [[nodiscard]] bool isDedicatedToAnother(const ZPDPlugIn& plugIn,
+                                            const ZPDPlugInInfo* info) const;
+    [[nodiscard]] bool isExcluded(const ZPDPlugIn& plugIn, const ZPDPlugInInfo* info) const;
+    [[nodiscard]] bool isAllowed(const ZPDPlugIn& plugIn, const ZPDPlugInInfo* info) const;
 
     // ---- What is kept of them (DiscoveryMatches.cpp)
     void take(const ZPDPlugIn& plugIn);

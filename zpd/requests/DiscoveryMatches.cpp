@@ -16,7 +16,7 @@ ReplyForm Discovery::formOf(const ZPDPlugIn& plugIn) const {
 }
 
 void Discovery::take(const ZPDPlugIn& plugIn) {
-    auto encoded = formOf(plugIn).encode();
+    auto encoded = transaction_.encodedForm(plugIn);
     if (!encoded)
         return;
     const auto verdict = deduplication_->offer(plugIn);

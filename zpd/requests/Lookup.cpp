@@ -8,7 +8,6 @@
 #include "zpd/Transaction.h"
 #include "zpd/ZPDPlugIn.h"
 #include "zpd/ZPDServer.h"
-#include "zpd/requests/ReplyForm.h"
 
 using platform::Value;
 
@@ -19,9 +18,7 @@ void Transaction::findPlugIn() {
         return fail(ZPDErrorCode::notFound, "Cannot locate PlugIn");
     }
     ZPDLogOps().standard("plugin found %{public}@", *plugIn);
-    ReplyForm form{.plugIn = *plugIn};
-    addAnnotationForPlugIn(*plugIn, form);
-    if (const auto encoded = form.encode())
+    if (const auto encoded = encodedForm(*plugIn))
         setMatches(ZPDaemonClient::convertToIPC(*encoded, version()));
     done();
 }

@@ -24,7 +24,8 @@ std::expected<SharedBytes, Error> encodeMarked(const ReplyForm& form) {
 
 std::optional<SharedBytes> ReplyForm::encode() const {
     const bool isMarked = overrider || overriding;
-    auto encoded = isMarked ? encodeMarked(*this) : plugIn.encodedReplyForm(annotations);
+    auto encoded =
+        isMarked ? encodeMarked(*this) : plugIn.encodedReplyForm(annotations, annotationState);
     if (encoded)
         return std::move(*encoded);
     ZPDLogOps().error("failed to export matching plug-in %{public}@: %{public}@", plugIn.uuid(),

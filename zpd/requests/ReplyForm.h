@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstdint>
 #include <optional>
 #include <string>
 
@@ -12,6 +13,7 @@
 struct ReplyForm {
     const ZPDPlugIn& plugIn;
     platform::Dictionary annotations{};
+    std::uint64_t annotationState = 0;       // of the database, when those were looked up
     std::optional<std::string> overrider{};  // UUID text of the plug-in that replaces this one
     std::optional<std::string> overriding{}; // identifier of the plug-in that this one replaces
 
