@@ -4,6 +4,7 @@
 
 #include "Zephrin/ZPDLog.h"
 #include "platform/ipc/Connection.h"
+#include "platform/ipc/Peer.h"
 #include "platform/log/Render.h"
 #include "platform/probe/Probes.h"
 #include "platform/process/Processes.h"
@@ -61,14 +62,27 @@ std::shared_ptr<Connection> ZPDIpcClient::connection() const {
 
 std::optional<Value> ZPDIpcClient::entitlementValueForKey(std::string_view key) {
     server_.assertOnServiceQueue();
-    if (!vouched_ || !task_)
+    if (!vouched_)
         return std::nullopt;
+    if (!std::exchange(rechecked_, true))
+        task_->recheck();
     auto value = task_->entitlement(key);
     if (!value) {
         ZPDLogOps().error("error retrieving entitlements for client %d", pid());
         return std::nullopt;
     }
-    return std::move(*value);
+    return *value && isStillItself() ? std::move(*value) : std::nullopt;
+}
+
+// What its process wrote counts for the program only while it lives and has not become another:
+// its pid tells who wrote, and is free for others once it has ended.
+bool ZPDIpcClient::isStillItself() {
+    if (!isStillItself_) {
+        isStillItself_ = platform::ipc::runsItsExecutable(*peer_);
+        if (!*isStillItself_)
+            ZPDLogOps().info("client %d has ended or runs another program by now", pid());
+    }
+    return *isStillItself_;
 }
 
 bool ZPDIpcClient::hasEntitlement(std::string_view key) {

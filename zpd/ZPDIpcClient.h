@@ -61,7 +61,8 @@ public:
     [[nodiscard]] std::uint32_t requestCount() const { return requestCount_; }
 
     // A failed query counts as absent, and so does every entitlement while the request under way
-    // is not proven to come from the program that connected.
+    // is not proven to come from the program that connected. The first question of a request looks
+    // whether what is known of the program still holds.
     // REQUIRES: on the service queue
     [[nodiscard]] std::optional<platform::Value>
     entitlementValueForKey(std::string_view key) override;
@@ -76,8 +77,13 @@ private:
 
     void handle(platform::ipc::Event event);
     void handleRequest(platform::ipc::Message message);
+    void prepare(std::shared_ptr<Transaction> transaction);
+    void prepared(std::shared_ptr<Transaction> transaction);
+    void submit(std::shared_ptr<Transaction> transaction);
     // REQUIRES: on the service queue
     void carryOut(Transaction& transaction);
+    // REQUIRES: on the service queue
+    [[nodiscard]] bool isStillItself();
     void dying();
     void dead();
 
@@ -90,9 +96,17 @@ private:
     std::unique_ptr<platform::SigningTask> task_;
     std::atomic<bool> acceptWork_ = true;
 
+    // Of the request that is prepared; one at a time. Whoever comes second, the one who asked or
+    // the answer, takes the request on.
+    enum class Preparation : std::uint8_t { asked, awaited, known };
+    std::atomic<Preparation> preparation_ = Preparation::asked;
+
     // Only on the service queue.
     std::uint32_t requestCount_ = 0;
-    bool vouched_ = false; // the request under way comes from the program itself
+    // Of the request under way.
+    bool vouched_ = false; // it comes from the program itself
+    bool rechecked_ = false;
+    std::optional<bool> isStillItself_; // once that was asked
 };
 
 [[nodiscard]] inline std::string describe(const ZPDIpcClient& client) {

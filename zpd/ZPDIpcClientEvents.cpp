@@ -1,5 +1,5 @@
-// What a client's connection brings. On the IPC loop, or on the service queue for a request that
-// waited for the one before it.
+// What a client's connection brings. On the IPC loop, or on the service queue's thread for a
+// request that waited for the one before it.
 
 #include <utility>
 #include <variant>
@@ -7,6 +7,7 @@
 #include "Zephrin/ZPDLog.h"
 #include "platform/ipc/Connection.h"
 #include "platform/probe/Probes.h"
+#include "platform/signing/CodeSigning.h"
 #include "zpd/Transaction.h"
 #include "zpd/ZPDIpcClient.h"
 #include "zpd/ZPDServer.h"
@@ -48,6 +49,34 @@ void ZPDIpcClient::handleRequest(Message message) {
     auto transaction = std::make_shared<Transaction>(std::move(message), shared_from_this());
     if (platform::probe::requestInputEnabled())
         platform::probe::requestInput(pid(), platform::describe(transaction->request()).c_str());
+    if (transaction->isVouchedFor())
+        prepare(std::move(transaction));
+    else
+        submit(std::move(transaction));
+}
+
+// What the program may do must be known before its request is carried out. It is already, as a
+// rule; else the request waits, and with it all that this client sends after it.
+void ZPDIpcClient::prepare(std::shared_ptr<Transaction> transaction) {
+    if (!server_.preparations().begin())
+        return;
+    preparation_ = Preparation::asked;
+    task_->prepare([transaction]() mutable {
+        ZPDServer& server = transaction->server();
+        transaction->client().prepared(std::move(transaction));
+        server.preparations().end();
+    });
+    if (preparation_.exchange(Preparation::awaited) == Preparation::known)
+        submit(std::move(transaction));
+}
+
+// Runs within `prepare`, or later on the signing service's thread.
+void ZPDIpcClient::prepared(std::shared_ptr<Transaction> transaction) {
+    if (preparation_.exchange(Preparation::known) == Preparation::awaited)
+        submit(std::move(transaction));
+}
+
+void ZPDIpcClient::submit(std::shared_ptr<Transaction> transaction) {
     const bool brief = transaction->isBrief();
     server_.submitWork(
         [client = shared_from_this(), transaction] { client->carryOut(*transaction); },
@@ -61,6 +90,8 @@ void ZPDIpcClient::carryOut(Transaction& transaction) {
     if (++requestCount_ % countedEvery == 0)
         ZPDLogOps().debug("client %d used %u requests so far", pid(), requestCount_);
     vouched_ = transaction.isVouchedFor();
+    rechecked_ = false;
+    isStillItself_.reset();
     transaction.dispatch();
     vouched_ = false;
 }

@@ -37,6 +37,7 @@ std::expected<std::unique_ptr<ZPDServer>, Error> ZPDServer::create(const Platfor
 ZPDServer::~ZPDServer() {
     service_.reset();
     ipcLoop_.stop(); // from here on no client calls in
+    preparations_.close();
     setDelegate(nullptr);
     theServer = nullptr;
 }

@@ -14,6 +14,7 @@
 #include "platform/value/Uuid.h"
 #include "zpd/Platform.h"
 #include "zpd/ZPDPlugInHold.h"
+#include "zpd/ZPDPreparations.h"
 #include "zpd/ZPDUserPrefs.h"
 #include "zpd/ZPDatabase.h"
 
@@ -72,6 +73,9 @@ public:
     void submitWork(platform::SerialQueue::Block block, Work work = Work::any,
                     platform::SerialQueue::Block afterwards = {});
 
+    // Requests of clients of whom it is not known yet what they may do. Any thread.
+    [[nodiscard]] ZPDPreparations& preparations() { return preparations_; }
+
     void assertOnServiceQueue() const { mainQueue_.assertOnQueue(); }
 
     // ---- Holds (ZPDServerHolds.cpp). Any thread.
@@ -101,6 +105,7 @@ private:
     ZPDUserPrefs userPrefs_;
     std::vector<ZPDPlugInHold::Ptr> holds_; // only on "serverSync"
     std::atomic<bool> holdsAny_ = false;    // whether there is one; changed there, read anywhere
+    ZPDPreparations preparations_;
     platform::SerialQueue syncQueue_;
     platform::ipc::Loop ipcLoop_;
     platform::SerialQueue mainQueue_;

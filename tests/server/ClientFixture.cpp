@@ -8,7 +8,6 @@
 #include "platform/ipc/Connection.h"
 #include "platform/ipc/Listener.h"
 #include "platform/queue/SerialQueue.h"
-#include "tests/server/Awaited.h"
 
 using platform::ipc::Connection;
 using platform::ipc::Listener;
@@ -56,9 +55,13 @@ std::shared_ptr<Transaction> ClientFixture::transaction(Dictionary request) {
 }
 
 ClientFixture::Reply ClientFixture::askThroughClient(const Dictionary& request) {
+    return beginToAskThroughClient(request).get();
+}
+
+Awaited<ClientFixture::Reply> ClientFixture::beginToAskThroughClient(const Dictionary& request) {
     const Awaited<Reply> arrived;
     otherEnd_->sendWithReply(request, [arrived](Reply reply) { arrived.bring(std::move(reply)); });
-    return arrived.get();
+    return arrived;
 }
 
 void ClientFixture::onServiceQueue(platform::SerialQueue::Block block) {

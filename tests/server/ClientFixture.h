@@ -3,6 +3,7 @@
 #include <memory>
 
 #include "platform/ipc/Loop.h"
+#include "tests/server/Awaited.h"
 #include "tests/server/ServerFixture.h"
 #include "zpd/Transaction.h"
 #include "zpd/ZPDIpcClient.h"
@@ -26,6 +27,7 @@ protected:
     // A request of the client, not yet dispatched.
     [[nodiscard]] std::shared_ptr<Transaction> transaction(Dictionary request);
     [[nodiscard]] Reply askThroughClient(const Dictionary& request);
+    [[nodiscard]] Awaited<Reply> beginToAskThroughClient(const Dictionary& request);
     // Runs a block on the service queue and waits for it.
     void onServiceQueue(platform::SerialQueue::Block block);
 

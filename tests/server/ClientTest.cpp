@@ -1,8 +1,13 @@
+#include <chrono>
+#include <future>
 #include <memory>
 #include <string>
+#include <thread>
 #include <unistd.h>
 #include <vector>
 
+#include "platform/ipc/ClientConnection.h"
+#include "platform/queue/SerialQueue.h"
 #include "tests/server/ClientFixture.h"
 
 namespace {
@@ -60,6 +65,72 @@ TEST_F(Client, HasEntitlementsOnlyWithinARequestThatIsItsOwn) {
     platform_.signing.clientEntitlements = Dictionary{{"a", true}};
     const auto there = client();
     onServiceQueue([&] { EXPECT_FALSE(there->hasEntitlement("a")); });
+}
+
+TEST_F(Client, IsLookedAtOnceForEachRequestThatAsksWhatItMayDo) {
+    for (const char* const identifier : {"a", "b", "c"})
+        addPlugIn(identifier);
+    EXPECT_EQ(match().size(), 3U);
+    EXPECT_EQ(platform_.signing.rechecked, 1U) << "although each plug-in asked";
+    (void)ask("find", {});
+    EXPECT_EQ(platform_.signing.rechecked, 1U);
+}
+
+class SlowlyKnownClient : public ClientFixture {
+protected:
+    SlowlyKnownClient() {
+        addPlugIn("a");
+        platform_.signing.clientEntitlements =
+            Dictionary{{"com.tovana.private.zephrin.manager", true}};
+    }
+
+    void awaitWaiting() {
+        while (platform_.signing.waiting() == 0)
+            std::this_thread::sleep_for(std::chrono::milliseconds(1));
+    }
+
+    // A request of the client that waits.
+    [[nodiscard]] Awaited<Reply> begin() {
+        (void)client();
+        platform_.signing.later = true;
+        auto reply = beginToAskThroughClient(discoverAll);
+        awaitWaiting();
+        platform_.signing.later = false;
+        return reply;
+    }
+
+    const Dictionary discoverAll{{"version", 3U}, {"request", "match"}, {"flags", 0x200U}};
+};
+
+TEST_F(SlowlyKnownClient, WaitsAloneAndIsServedThen) {
+    const auto reply = begin();
+    EXPECT_EQ(failureOf(discoverAll), "") << "another client";
+    platform_.signing.answer();
+    EXPECT_TRUE(reply.get()->contains("matches"));
+}
+
+TEST_F(SlowlyKnownClient, IsNotServedAnyMoreWhenItHasGone) {
+    const auto reply = begin();
+    disconnect();
+    EXPECT_FALSE(reply.get());
+    platform_.signing.answer();
+    onServiceQueue([this] { EXPECT_EQ(client()->requestCount(), 2U) << "taken up, no more"; });
+}
+
+TEST_F(SlowlyKnownClient, IsWaitedForByAServerThatEnds) {
+    server();
+    platform_.signing.later = true;
+    platform::ipc::ClientConnection connection(folder_ / "zpd",
+                                               std::make_shared<platform::SerialQueue>("replies"));
+    connection.resume();
+    connection.sendWithReply(discoverAll, [](const Reply&) {});
+    awaitWaiting();
+    const auto later = std::async(std::launch::async, [this] {
+        std::this_thread::sleep_for(std::chrono::milliseconds(20));
+        platform_.signing.answer();
+    });
+    stopServer();
+    EXPECT_EQ(platform_.signing.waiting(), 0U);
 }
 
 } // namespace

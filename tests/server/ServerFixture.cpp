@@ -18,6 +18,10 @@ ServerFixture::ServerFixture() {
 }
 
 ServerFixture::~ServerFixture() {
+    stopServer();
+}
+
+void ServerFixture::stopServer() {
     client_.reset();
     server_.reset();
 }

@@ -42,6 +42,7 @@ protected:
 
     // Started with the first call.
     ZPDServer& server();
+    void stopServer();
 
     [[nodiscard]] Reply ask(const Dictionary& request);
     // The keys besides the envelope's.

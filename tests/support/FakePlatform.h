@@ -1,5 +1,6 @@
 #pragma once
 
+#include <atomic>
 #include <functional>
 #include <map>
 #include <mutex>
@@ -35,16 +36,25 @@ struct FakeProcesses final : platform::Processes {
 };
 
 struct FakeSigning final : platform::CodeSigning {
-    platform::Dictionary clientEntitlements;             // every client's
+    using Done = platform::SigningTask::Done;
+
+    platform::Dictionary clientEntitlements; // every client's
+    std::atomic<bool> later = false;         // whether it takes time to know them
+    std::atomic<unsigned> rechecked = 0;
     std::map<std::string, platform::Dictionary> granted; // by content of the signature file
     std::string key = "the key";                         // whose grants count
 
     struct Task final : platform::SigningTask {
-        explicit Task(platform::Dictionary e) : entitlements(std::move(e)) {}
+        explicit Task(FakeSigning& its) : signing(its), entitlements(its.clientEntitlements) {}
 
-        void prepare(Done done) override { done(); }
+        void prepare(Done done) override {
+            if (!signing.later)
+                return done();
+            const std::lock_guard lock(signing.mutex_);
+            signing.waiting_.push_back(std::move(done));
+        }
 
-        void recheck() override {}
+        void recheck() override { ++signing.rechecked; }
 
         [[nodiscard]] std::expected<std::optional<platform::Value>, platform::Error>
         entitlement(std::string_view key) override {
@@ -52,12 +62,30 @@ struct FakeSigning final : platform::CodeSigning {
             return found ? std::optional(*found) : std::nullopt;
         }
 
+        FakeSigning& signing;
         platform::Dictionary entitlements;
     };
 
+    // How many requests wait until it is known what their client may do.
+    [[nodiscard]] std::size_t waiting() {
+        const std::lock_guard lock(mutex_);
+        return waiting_.size();
+    }
+
+    // Now it is known.
+    void answer() {
+        std::vector<Done> answered;
+        {
+            const std::lock_guard lock(mutex_);
+            answered.swap(waiting_);
+        }
+        for (Done& done : answered)
+            done();
+    }
+
     [[nodiscard]] std::unique_ptr<platform::SigningTask>
     taskFor(std::shared_ptr<const platform::ipc::Peer>) override {
-        return std::make_unique<Task>(clientEntitlements);
+        return std::make_unique<Task>(*this);
     }
 
     [[nodiscard]] std::expected<platform::SignatureGrant, std::string>
@@ -69,6 +97,10 @@ struct FakeSigning final : platform::CodeSigning {
     }
 
     [[nodiscard]] bool isTrusted(std::string_view asked) override { return asked == key; }
+
+private:
+    std::mutex mutex_;
+    std::vector<Done> waiting_;
 };
 
 struct FakeSandbox final : platform::Sandbox {
