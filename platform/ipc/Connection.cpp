@@ -43,6 +43,8 @@ Connection::Impl::Impl(Loop& itsLoop, UniqueFd itsSocket, Peer itsPeer,
 Connection::Impl::~Impl() {
     outbox.close();
     account->release(unfinishedCost + reserved);
+    if (wide)
+        account->leaveWide();
     account->close();
     if ((socket || process || timer) && !loop.isCurrent())
         loop.post([s = std::move(socket), p = std::move(process), t = std::move(timer)] {});

@@ -67,6 +67,7 @@ struct Connection::Impl final : SocketWatch::Target {
     // Writing. `write` on any thread, the rest on the loop.
     void greet();
     void write(FrameKind kind, std::uint64_t id, const Dictionary& body);
+    void widenFor(std::size_t frameSize);
     void writeRest();
     void writable() override;
     void watchProgress();
@@ -89,6 +90,7 @@ struct Connection::Impl final : SocketWatch::Target {
     const std::uint64_t number;
     std::atomic<bool> alive = true;
     Outbox outbox;
+    std::atomic<bool> wide = false; // the socket takes more than usual
 
     // On the loop.
     std::unique_ptr<SocketWatch> socket; // none once it is closed

@@ -11,6 +11,11 @@ namespace {
 
 constexpr std::chrono::milliseconds longestProgressCheck{5'000};
 
+// How large a reply may be that goes out at once: through any socket, and through a wide one.
+constexpr std::size_t usualRoom = 128UL << 10;
+constexpr std::size_t wideRoom = 384UL << 10;
+constexpr int wideSocket = 512 << 10;
+
 // What goes out in place of a reply that does not fit the wire.
 const Dictionary& oversizedReply() {
     static const Dictionary body{{"errorcode", 4U}, {"error", "invalid request format"}};
@@ -32,8 +37,21 @@ void Connection::Impl::write(FrameKind kind, std::uint64_t id, const Dictionary&
             peer.pid, text.bodySize());
         return write(kind, id, oversizedReply());
     }
+    widenFor(text.bodySize());
     if (outbox.send(text.text(), text.encoder()) == Outbox::Outcome::waiting)
         post(&Impl::writeRest);
+}
+
+// What does not fit into the socket goes back to the loop, and waits there until the client has
+// read most of the rest. For replies of a middling size it is cheaper to have more room.
+void Connection::Impl::widenFor(std::size_t frameSize) {
+    if (frameSize <= usualRoom || frameSize > wideRoom || wide.exchange(true))
+        return;
+    if (account->takeWide()) {
+        outbox.widen(wideSocket);
+    } else {
+        wide = false;
+    }
 }
 
 void Connection::Impl::writeRest() {

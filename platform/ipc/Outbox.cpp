@@ -41,6 +41,13 @@ void Outbox::open(int descriptor) {
     descriptor_ = descriptor;
 }
 
+// Without it the usual room stays, and more is left to `flush`.
+void Outbox::widen(int bytes) {
+    const std::lock_guard lock(mutex_);
+    const int half = bytes / 2; // the kernel doubles it, for what it keeps besides the content
+    (void)::setsockopt(descriptor_, SOL_SOCKET, SO_SNDBUF, &half, sizeof half);
+}
+
 void Outbox::close() {
     const std::lock_guard lock(mutex_);
     closed_ = true;

@@ -32,6 +32,8 @@ public:
 
     // Nothing is written before; what was sent by then goes out with the next `flush`.
     void open(int descriptor);
+    // Lets the socket take as much as `bytes` before it is full, as far as the system allows.
+    void widen(int bytes);
     // After it returns the descriptor is not used any more. What waits is dropped.
     void close();
 

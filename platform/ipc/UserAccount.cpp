@@ -20,6 +20,13 @@ bool UserAccount::open(std::size_t most) {
     return true;
 }
 
+bool UserAccount::takeWide() noexcept {
+    if (wide_.fetch_add(1) < mostWide)
+        return true;
+    leaveWide();
+    return false;
+}
+
 bool UserAccount::fits(std::size_t bytes) const noexcept {
     const std::size_t waiting = waiting_;
     return waiting == 0 || waiting + bytes <= mostWaiting_;

@@ -24,6 +24,12 @@ public:
 
     void close() noexcept { --connections_; }
 
+    // Whether one more connection may have a wide socket: what the kernel holds of replies that
+    // nobody reads is its memory, not ours to share.
+    [[nodiscard]] bool takeWide() noexcept;
+
+    void leaveWide() noexcept { --wide_; }
+
     void add(std::size_t bytes) noexcept { waiting_.fetch_add(bytes); }
 
     // Adds only what fits. REQUIRES: on the loop.
@@ -41,10 +47,13 @@ public:
 private:
     using Retries = std::deque<std::move_only_function<void()>>;
 
+    static constexpr std::size_t mostWide = 32;
+
     void wake(std::size_t most);
 
     const std::size_t mostWaiting_;
     std::atomic<std::size_t> connections_ = 0;
+    std::atomic<std::size_t> wide_ = 0;
     std::atomic<std::size_t> waiting_ = 0;
     std::atomic<bool> awaited_ = false;
     std::mutex mutex_;
