@@ -76,10 +76,11 @@ public:
     // Gives the form the plug-in's stored annotation, or an empty one.
     // REQUIRES: on the service queue
     void addAnnotationForPlugIn(const ZPDPlugIn& plugIn, ReplyForm& form) const;
-    // The plug-in's form, with its annotation, in its wire encoding; nothing, and a log line, when
-    // it cannot be made.
+    // The plug-in's form, with its annotation, in its wire encoding: the one that is `kept`, if
+    // any. Nothing, and a log line, when it cannot be made.
     // REQUIRES: on the service queue
-    [[nodiscard]] std::optional<platform::SharedBytes> encodedForm(const ZPDPlugIn& plugIn) const;
+    [[nodiscard]] std::optional<platform::SharedBytes>
+    encodedForm(const ZPDPlugIn& plugIn, platform::SharedBytes kept) const;
 
 private:
     struct RequestType;

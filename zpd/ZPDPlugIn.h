@@ -96,9 +96,15 @@ public:
     // was looked up, as a number.
     [[nodiscard]] std::expected<platform::SharedBytes, platform::Error>
     encodedReplyForm(const platform::Dictionary& annotation, std::uint64_t annotations) const;
-    // The form that was kept, when it was made or confirmed in this state of the annotations:
-    // there is no need to look the annotation up again. Else empty.
-    [[nodiscard]] platform::SharedBytes keptReplyForm(std::uint64_t annotations) const;
+
+    // The current information, and the form that was kept, when it was made or confirmed in this
+    // state of the annotations: there is no need to look the annotation up again. Else no form.
+    struct Current {
+        std::shared_ptr<const ZPDPlugInInfo> info;
+        platform::SharedBytes replyForm;
+    };
+
+    [[nodiscard]] Current current(std::uint64_t annotations) const;
 
     void setLocalizedName(std::optional<std::string> name) override;
     void setLocalizedShortName(std::optional<std::string> name) override;

@@ -85,10 +85,11 @@ std::expected<SharedBytes, Error> ZPDPlugIn::encodedReplyForm(const Dictionary& 
     return encoded;
 }
 
-SharedBytes ZPDPlugIn::keptReplyForm(std::uint64_t annotations) const {
+ZPDPlugIn::Current ZPDPlugIn::current(std::uint64_t annotations) const {
     const auto lock = locked();
     follow();
-    return keptForm_ && keptForm_->annotations == annotations ? keptForm_->encoded : SharedBytes();
+    const bool holds = keptForm_ && keptForm_->annotations == annotations;
+    return {info_, holds ? keptForm_->encoded : SharedBytes()};
 }
 
 void ZPDPlugIn::forgetForm() const {

@@ -240,12 +240,12 @@ TEST(KeptForm, StaysUntilSomethingInItChanges) {
     world.platform.workspace.move();
     EXPECT_TRUE(isKept());
 
-    EXPECT_TRUE(record->keptReplyForm(0).sameAllocation(first));
-    EXPECT_EQ(record->keptReplyForm(1).size(), 0U); // the annotation may be another by now
+    EXPECT_TRUE(record->current(0).replyForm.sameAllocation(first));
+    EXPECT_EQ(record->current(1).replyForm.size(), 0U); // the annotation may be another by now
     EXPECT_TRUE(record->encodedReplyForm(annotation, 1).value().sameAllocation(first));
-    EXPECT_TRUE(record->keptReplyForm(1).sameAllocation(first)); // and is not
+    EXPECT_TRUE(record->current(1).replyForm.sameAllocation(first)); // and is not
     record->setLocalizedName("Probe");
-    EXPECT_EQ(record->keptReplyForm(1).size(), 0U);
+    EXPECT_EQ(record->current(1).replyForm.size(), 0U);
 }
 
 TEST(KeptForm, IsMadeAnewForEachChange) {

@@ -17,8 +17,8 @@ void Transaction::addAnnotationForPlugIn(const ZPDPlugIn& plugIn, ReplyForm& for
         form.annotations = {};
 }
 
-std::optional<platform::SharedBytes> Transaction::encodedForm(const ZPDPlugIn& plugIn) const {
-    auto kept = plugIn.keptReplyForm(server().annotationChanges());
+std::optional<platform::SharedBytes> Transaction::encodedForm(const ZPDPlugIn& plugIn,
+                                                              platform::SharedBytes kept) const {
     if (kept.size() != 0)
         return kept;
     ReplyForm form{.plugIn = plugIn};

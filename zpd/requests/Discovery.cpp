@@ -63,9 +63,11 @@ std::vector<SharedBytes> Discovery::run() {
     deduplication_.emplace(has(ZPDaemonClient::ZPDiscoverAllVersions),
                            has(ZPDaemonClient::ZPDiscoverAllDuplicates), candidates_->size());
     matches_.reserve(candidates_->size());
+    const std::uint64_t annotations = transaction_.server().annotationChanges();
     for (const auto& candidate : *candidates_) {
-        if (passes(*candidate))
-            take(*candidate);
+        ZPDPlugIn::Current current = candidate->current(annotations);
+        if (passes(*candidate, current.info.get()))
+            take(*candidate, std::move(current.replyForm));
     }
     markReplacements();
     logMatches();

@@ -46,7 +46,7 @@ private:
 
     // ---- Which of them the client may see (DiscoveryFilters.cpp)
     // `info` is the plug-in's current information, or null.
-    [[nodiscard]] bool passes(const ZPDPlugIn& plugIn) const;
+    [[nodiscard]] bool passes(const ZPDPlugIn& plugIn, const ZPDPlugInInfo* info) const;
     [[nodiscard]] bool isOffered(const ZPDPlugIn& plugIn, const ZPDPlugInInfo* info) const;
     [[nodiscard]] bool isInPlace(const ZPDPlugIn& plugIn) const;
     [[nodiscard]] bool isDedicatedToAnother(const ZPDPlugIn& plugIn,
@@ -55,7 +55,7 @@ private:
     [[nodiscard]] bool isAllowed(const ZPDPlugIn& plugIn, const ZPDPlugInInfo* info) const;
 
     // ---- What is kept of them (DiscoveryMatches.cpp)
-    void take(const ZPDPlugIn& plugIn);
+    void take(const ZPDPlugIn& plugIn, platform::SharedBytes keptForm);
     [[nodiscard]] ReplyForm formOf(const ZPDPlugIn& plugIn) const;
     void declareReplacements(const ZPDPlugIn& plugIn, std::size_t match);
     void markReplacements();

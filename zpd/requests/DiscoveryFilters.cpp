@@ -10,10 +10,8 @@
 #include "zpd/ZPDServer.h"
 #include "zpd/requests/Discovery.h"
 
-bool Discovery::passes(const ZPDPlugIn& plugIn) const {
+bool Discovery::passes(const ZPDPlugIn& plugIn, const ZPDPlugInInfo* info) const {
     const bool everything = has(ZPDaemonClient::ZPDiscoverAll);
-    const auto current = plugIn.currentInfo();
-    const ZPDPlugInInfo* const info = current.get();
     if (!everything && !isOffered(plugIn, info))
         return false;
     if ((rules_ && !plugIn.match(*rules_, info)) || isExcluded(plugIn, info))

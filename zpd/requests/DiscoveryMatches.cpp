@@ -1,5 +1,7 @@
 // Discovery, third part: one registration per identifier, replacements, and the reply's forms.
 
+#include <utility>
+
 #include "Zephrin/ZPDLog.h"
 #include "zpd/Entitlements.h"
 #include "zpd/Transaction.h"
@@ -15,8 +17,8 @@ ReplyForm Discovery::formOf(const ZPDPlugIn& plugIn) const {
     return form;
 }
 
-void Discovery::take(const ZPDPlugIn& plugIn) {
-    auto encoded = transaction_.encodedForm(plugIn);
+void Discovery::take(const ZPDPlugIn& plugIn, SharedBytes keptForm) {
+    auto encoded = transaction_.encodedForm(plugIn, std::move(keptForm));
     if (!encoded)
         return;
     const auto verdict = deduplication_->offer(plugIn);

@@ -1,5 +1,7 @@
 // "find": one plug-in by its UUID or by the URL of its bundle, without any filter.
 
+#include <utility>
+
 #include "Zephrin/FileURL.h"
 #include "Zephrin/ZPDError.h"
 #include "Zephrin/ZPDLog.h"
@@ -18,7 +20,8 @@ void Transaction::findPlugIn() {
         return fail(ZPDErrorCode::notFound, "Cannot locate PlugIn");
     }
     ZPDLogOps().standard("plugin found %{public}@", *plugIn);
-    if (const auto encoded = encodedForm(*plugIn))
+    ZPDPlugIn::Current current = plugIn->current(server().annotationChanges());
+    if (const auto encoded = encodedForm(*plugIn, std::move(current.replyForm)))
         setMatches(ZPDaemonClient::convertToIPC(*encoded, version()));
     done();
 }
