@@ -120,14 +120,19 @@ std::expected<FileContent, Error> readRegularFile(const std::string& path, std::
     const auto file = openRegularFile(path);
     if (!file)
         return std::unexpected(file.error());
+    return readOpenFile(file->get(), path, largest);
+}
+
+std::expected<FileContent, Error> readOpenFile(int file, const std::string& path,
+                                               std::size_t largest) {
     struct ::stat status = {};
-    if (::fstat(file->get(), &status) != 0)
+    if (::fstat(file, &status) != 0)
         return std::unexpected(readError(errno, path));
     FileContent content{{}, FileStamp::of(status)};
     if (content.stamp.size > largest)
         return std::unexpected(tooLarge(path));
     content.bytes.resize(content.stamp.size + 1); // one more, to see the end in the first read
-    if (auto error = readUpTo(file->get(), largest, path, content.bytes))
+    if (auto error = readUpTo(file, largest, path, content.bytes))
         return std::unexpected(std::move(*error));
     return content;
 }

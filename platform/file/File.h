@@ -74,6 +74,9 @@ struct FileContent {
 // (fileErrorNoSuchFile for a missing file).
 [[nodiscard]] std::expected<FileContent, Error> readRegularFile(const std::string& path,
                                                                 std::size_t largest);
+// The same for a file that is open and was not read from yet; `path` only for the text.
+[[nodiscard]] std::expected<FileContent, Error> readOpenFile(int file, const std::string& path,
+                                                             std::size_t largest);
 
 // Replaces `path` by a complete new file of exactly this mode: written beside it under a name that
 // begins with a dot, synced, renamed, folder synced. On failure nothing is left beside it.
