@@ -17,7 +17,7 @@
 #include "platform/preferences/FilePreferences.h"
 #include "platform/process/ProcProcesses.h"
 #include "platform/sandbox/HmacSandbox.h"
-#include "platform/signing/UnsignedPrograms.h"
+#include "platform/signing/SignedPrograms.h"
 #include "platform/types/DeclaredTypes.h"
 #include "zpd/Platform.h"
 #include "zpd/ZPDServer.h"
@@ -49,7 +49,7 @@ struct Daemon::Parts {
     const platform::Places places;
     platform::ipc::Loop mainLoop{"main"};
     platform::ProcProcesses processes;
-    platform::UnsignedPrograms signing;
+    platform::SignedPrograms signing;
     platform::HmacSandbox sandbox;
     platform::DeclaredTypes types;
     platform::FilePreferences preferences;
@@ -63,6 +63,7 @@ struct Daemon::Parts {
 
 Daemon::Parts::Parts(platform::Places where)
     : places(std::move(where)),
+      signing(places.trust),
       types(places.types),
       preferences(places.preferences),
       notifications(places.notify),
