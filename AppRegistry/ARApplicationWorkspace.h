@@ -71,6 +71,8 @@ public:
 
     // Drops what was derived from info dictionaries and can be derived again.
     virtual void clearSchemaCaches() = 0;
+    // The trusted keys may be others: what signatures grant is looked up anew when asked for.
+    virtual void trustChanged() = 0;
 
     // The observer must outlive the workspace or be taken away before it goes.
     virtual void setObserver(ARWorkspaceObserver* observer) = 0;

@@ -19,8 +19,9 @@ std::expected<Dictionary, std::string> parseInfo(std::string_view bytes) {
     return std::unexpected("its property list is not a dictionary");
 }
 
-std::expected<platform::FileContent, std::string> readFile(const std::string& path) {
-    auto content = platform::readRegularFile(path, ARBundleReader::largestInfo);
+std::expected<platform::FileContent, std::string> readFile(const std::string& path,
+                                                           std::size_t largest) {
+    auto content = platform::readRegularFile(path, largest);
     if (!content)
         return std::unexpected(describe(content.error()));
     return std::move(*content);
@@ -71,7 +72,7 @@ std::expected<Dictionary, std::string> ARBundleReader::readInfo(ARBundleContent&
         return std::unexpected(stamp.error());
     if (!stamp->present())
         return std::unexpected("it has no Info.plist");
-    const auto file = readFile(candidate.folder.pathOf(name));
+    const auto file = readFile(candidate.folder.pathOf(name), largestInfo);
     if (!file)
         return std::unexpected(file.error());
     content.row.stamps[infoFile] = *stamp;
@@ -89,14 +90,27 @@ std::expected<void, std::string> ARBundleReader::readOther(ARBundleContent& cont
     content.row.stamps[file] = *stamp;
     if (!stamp->present() || stamp->size > ARLargestHashed)
         return {};
+    const std::string path = candidate.folder.pathOf(names[file]);
+    if (file == signatureFile && stamp->size <= largestSignature)
+        return readSignature(content, path);
     if (ARIsSameFile(known.stamps[file], *stamp)) {
         content.digests[file] = known.digests[file];
         return {};
     }
-    auto digest = hash_.ofFile(candidate.folder.pathOf(names[file]));
+    auto digest = hash_.ofFile(path);
     if (!digest)
         return std::unexpected(std::move(digest.error()));
     content.digests[file] = *digest;
+    return {};
+}
+
+std::expected<void, std::string> ARBundleReader::readSignature(ARBundleContent& content,
+                                                               const std::string& path) {
+    auto file = readFile(path, largestSignature);
+    if (!file)
+        return std::unexpected(std::move(file.error()));
+    content.digests[signatureFile] = hash_.of(file->bytes);
+    content.signature = std::move(file->bytes);
     return {};
 }
 
@@ -104,7 +118,7 @@ std::optional<Dictionary> ARReadReportedInfo(const ARBundleRow& row) {
     std::string path(row.path.view());
     if (row.kind != ARKind::extensionPoint)
         path += "/Info.plist";
-    const auto file = readFile(path);
+    const auto file = readFile(path, ARBundleReader::largestInfo);
     if (!file)
         return std::nullopt;
     auto info = parseInfo(file->bytes);

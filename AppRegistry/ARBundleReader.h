@@ -2,6 +2,7 @@
 
 #include <cstdint>
 #include <expected>
+#include <optional>
 #include <string>
 
 #include "AppRegistry/ARBundleFiles.h"
@@ -19,7 +20,8 @@ struct ARKnownFiles {
 struct ARBundleContent {
     ARBundleRow row;
     ARDigests digests{};
-    platform::Dictionary info; // as the registry reports it
+    platform::Dictionary info;            // as the registry reports it
+    std::optional<std::string> signature; // what its file `Signature` holds, unless too large
 };
 
 // Reads and checks one bundle: its info dictionary and the hashes of its counting files. On the
@@ -27,6 +29,7 @@ struct ARBundleContent {
 class ARBundleReader {
 public:
     static constexpr std::size_t largestInfo = std::size_t{1} << 20;
+    static constexpr std::size_t largestSignature = std::size_t{256} << 10;
 
     explicit ARBundleReader(const ARBundleFiles& files) : files_(files) {}
 
@@ -43,6 +46,9 @@ private:
     [[nodiscard]] std::expected<void, std::string>
     readOther(ARBundleContent& content, const ARCandidate& candidate, const Names& names,
               ARCountingFile file, const ARKnownFiles& known);
+
+    [[nodiscard]] std::expected<void, std::string> readSignature(ARBundleContent& content,
+                                                                 const std::string& path);
 
     const ARBundleFiles& files_;
     platform::Sha256 hash_;

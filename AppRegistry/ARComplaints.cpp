@@ -1,13 +1,11 @@
 #include "AppRegistry/ARComplaints.h"
 
-#include "AppRegistry/ARLog.h"
-
-void ARComplaints::report(const std::string& path, const std::string& reason) {
+bool ARComplaints::isNew(const std::string& path, const std::string& reason) {
     std::string& last = reported_[path];
     if (last == reason)
-        return;
+        return false;
     last = reason;
-    ARLog().error("skipping %{public}@: %{public}@", path, reason);
+    return true;
 }
 
 void ARComplaints::forget(const std::string& path) {

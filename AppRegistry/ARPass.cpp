@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <cmath>
 
+#include "AppRegistry/ARGrants.h"
+#include "AppRegistry/ARLog.h"
 #include "platform/ipc/Cbor.h"
 
 namespace {
@@ -18,10 +20,12 @@ bool liesBelow(std::string_view path, std::string_view folder) {
 
 } // namespace
 
-ARPass::ARPass(ARStore& store, ARModel& model, ARComplaints& complaints, Apply apply)
+ARPass::ARPass(ARStore& store, ARModel& model, ARComplaints& complaints, ARGrants& grants,
+               Apply apply)
     : store_(store),
       model_(model),
       complaints_(complaints),
+      grants_(grants),
       apply_(std::move(apply)),
       number_(model.beginPass()),
       batchBegan_(std::chrono::steady_clock::now()) {}
@@ -90,7 +94,8 @@ bool ARPass::found(const ARCandidate& candidate) {
 
 void ARPass::refused(const std::string& path, const std::string& reason) {
     lastRefusal_ = reason;
-    complaints_.report(path, reason);
+    if (complaints_.isNew(path, reason))
+        ARLog().error("skipping %{public}@: %{public}@", path, reason);
 }
 
 void ARPass::unreadable(const std::string& path, const std::string& reason) {
@@ -130,6 +135,7 @@ bool ARPass::readAgain(const ARCandidate& candidate, const ARBundleRow* known) {
     complaints_.forget(std::string(candidate.path));
     if (known && ARHasSameContent(before, {content->row.stamps, content->digests})) {
         refresh(*known, candidate, content->row.stamps);
+        keepSignature(known->id, *content);
         return true;
     }
     enlist(std::move(*content), candidate, known);
@@ -150,6 +156,7 @@ void ARPass::enlist(ARBundleContent&& content, const ARCandidate& candidate,
         row.originalIdentifier = old->originalIdentifier;
         remove(model_.find(candidate.path)->row);
     }
+    keepSignature(row.id, content);
     const auto shared = std::make_shared<const ARBundleRow>(std::move(row));
     model_.put(shared).seen = number_;
     batch_.changes.added.push_back({*shared, content.digests, platform::ipc::encode(content.info)});
@@ -162,6 +169,11 @@ void ARPass::refresh(const ARBundleRow& old, const ARCandidate& candidate, const
     row.stamps = stamps;
     row.placeholder = row.kind == ARKind::application && files_.isPlaceholder(candidate);
     replace(std::move(row));
+}
+
+void ARPass::keepSignature(std::int64_t id, const ARBundleContent& content) {
+    if (auto signature = grants_.judge(content))
+        batch_.changes.signatures.push_back({id, std::move(*signature)});
 }
 
 // Readers are told only of what they can see: where files' stamps alone moved, they keep the very
@@ -180,6 +192,7 @@ void ARPass::replace(ARBundleRow&& row) {
 
 void ARPass::remove(ARRowPtr row) {
     model_.remove(row->path.view());
+    grants_.forget(row->path.view());
     batch_.changes.removed.push_back(row->id);
     batch_.removed.push_back(std::move(row));
     batch_.visible = true;

@@ -15,6 +15,8 @@
 #include "AppRegistry/ARStore.h"
 #include "platform/paths/Places.h"
 
+class ARGrants;
+
 // Changes that a pass hands on together: those to be stored, and the same for the readers.
 struct ARBatch {
     ARStoreChanges changes; // without the knowledge
@@ -36,7 +38,7 @@ public:
 
     using Apply = std::function<void(ARBatch&&)>;
 
-    ARPass(ARStore& store, ARModel& model, ARComplaints& complaints, Apply apply);
+    ARPass(ARStore& store, ARModel& model, ARComplaints& complaints, ARGrants& grants, Apply apply);
 
     // Looks at everything; what was not met is gone.
     void run(const platform::Places& places);
@@ -56,6 +58,7 @@ private:
     bool readAgain(const ARCandidate& candidate, const ARBundleRow* known);
     void enlist(ARBundleContent&& content, const ARCandidate& candidate, const ARBundleRow* old);
     void refresh(const ARBundleRow& old, const ARCandidate& candidate, const ARStamps& stamps);
+    void keepSignature(std::int64_t id, const ARBundleContent& content);
     void replace(ARBundleRow&& row);
     void remove(ARRowPtr row);
     void removeUnseen();
@@ -66,6 +69,7 @@ private:
     ARStore& store_;
     ARModel& model_;
     ARComplaints& complaints_;
+    ARGrants& grants_;
     Apply apply_;
     platform::OwnershipTest ownership_;
     ARBundleFiles files_{ownership_};

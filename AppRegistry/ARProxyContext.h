@@ -3,10 +3,10 @@
 #include <memory>
 #include <mutex>
 
+#include "AppRegistry/ARGrants.h"
 #include "AppRegistry/ARInfoCache.h"
 
 namespace platform {
-class CodeSigning;
 class Containers;
 class Locale;
 struct Places;
@@ -39,7 +39,7 @@ private:
 struct ARProxyContext {
     platform::Locale& locale;
     platform::Containers& containers;
-    platform::CodeSigning& signing;
     ARInfoCache infos;
+    ARGrants grants;
     ARPublished published;
 };

@@ -4,32 +4,6 @@
 #include "AppRegistry/ARNames.h"
 #include "platform/bundle/InfoKeys.h"
 #include "platform/container/Containers.h"
-#include "platform/digest/Sha256.h"
-#include "platform/signing/CodeSigning.h"
-
-namespace {
-
-// What the signature of the bundle grants now.
-std::optional<platform::Dictionary> grantedTo(const ARBundleRow& row,
-                                              platform::CodeSigning& signing) {
-    const std::string path(row.path.view());
-    const auto signature = platform::readRegularFile(path + "/Signature", 256UL << 10);
-    platform::Sha256 hash;
-    const auto info = hash.ofFile(path + "/Info.plist");
-    if (!signature || !info)
-        return std::nullopt;
-    platform::SignedBundle bundle{signature->bytes, *info, std::nullopt};
-    if (!row.executable.view().empty()) {
-        const auto digest = hash.ofFile(path + "/" + std::string(row.executable.view()));
-        if (!digest)
-            return std::nullopt;
-        bundle.executable = {row.stamps[executableFile].size, *digest};
-    }
-    auto grant = signing.verifyBundle(bundle);
-    return grant ? std::optional(std::move(grant->entitlements)) : std::nullopt;
-}
-
-} // namespace
 
 ARRegisteredPlugIn::ARRegisteredPlugIn(ARRowPtr row, bool onSystem,
                                        ARApplicationProxy::Ptr application,
@@ -63,10 +37,8 @@ std::optional<platform::Dictionary> ARRegisteredPlugIn::plugInDictionary() const
     return *extension->dictionary();
 }
 
-const std::optional<platform::Dictionary>& ARRegisteredPlugIn::entitlements() const {
-    std::call_once(entitlementsKnown_,
-                   [this] { entitlements_ = grantedTo(*row_, context_->signing); });
-    return entitlements_;
+std::optional<platform::Dictionary> ARRegisteredPlugIn::entitlements() const {
+    return context_->grants.entitlements(*row_, granted_);
 }
 
 std::optional<std::string> ARRegisteredPlugIn::localizedName() const {

@@ -1,7 +1,6 @@
 #pragma once
 
 #include <memory>
-#include <mutex>
 
 #include "AppRegistry/ARModel.h"
 #include "AppRegistry/ARProxyContext.h"
@@ -30,7 +29,7 @@ public:
     [[nodiscard]] std::optional<std::string> originalIdentifier() const override;
     [[nodiscard]] std::optional<platform::Dictionary> infoDictionary() const override;
     [[nodiscard]] std::optional<platform::Dictionary> plugInDictionary() const override;
-    [[nodiscard]] const std::optional<platform::Dictionary>& entitlements() const override;
+    [[nodiscard]] std::optional<platform::Dictionary> entitlements() const override;
 
     [[nodiscard]] platform::Date registrationDate() const override { return row_->registered; }
 
@@ -49,8 +48,7 @@ private:
     ARRowPtr row_;
     ARApplicationProxy::Ptr application_;
     std::shared_ptr<ARProxyContext> context_;
-    mutable std::optional<platform::Dictionary> entitlements_; // looked up once
-    mutable std::once_flag entitlementsKnown_;
+    mutable ARKnownGrant granted_;
     bool onSystem_;
 };
 

@@ -23,7 +23,7 @@ ARRegistry::open(platform::Places places, platform::Locale& locale,
         return std::unexpected(std::move(opened.error()));
     const std::shared_ptr<ARStore> store = std::move(opened->first);
     const std::shared_ptr<ARProxyContext> context(
-        new ARProxyContext{locale, containers, signing, ARInfoCache(store), {}});
+        new ARProxyContext{locale, containers, ARInfoCache(store), ARGrants(store, signing), {}});
     std::unique_ptr<ARRegistry> registry(
         new ARRegistry(std::move(places), store, std::move(opened->second), context, types));
     registry->queue_.sync([&] { registry->firstPass(); });
@@ -41,9 +41,11 @@ ARRegistry::ARRegistry(platform::Places places, std::shared_ptr<ARStore> store,
       editor_(places_, context_),
       knowledge_(content.knowledge) {
     model_.fill(std::move(content.rows));
+    context_->grants.onLearnt([this] { queue_.async([this] { storeLearntGrants(); }); });
 }
 
 ARRegistry::~ARRegistry() {
+    context_->grants.onLearnt({});
     queue_.sync([] {}); // what is queued still comes first
     context_->published.set(nullptr);
 }
@@ -51,7 +53,8 @@ ARRegistry::~ARRegistry() {
 // ---- On the queue
 
 void ARRegistry::firstPass() {
-    ARPass pass(*store_, model_, complaints_, [this](ARBatch&& batch) { store(batch); });
+    ARPass pass(*store_, model_, complaints_, context_->grants,
+                [this](ARBatch&& batch) { store(batch); });
     pass.run(places_);
     publish(editor_.build(model_.pick([](const ARModel::Entry&) { return true; })));
     declareTypes();
@@ -65,6 +68,12 @@ void ARRegistry::store(ARBatch& batch) {
     batch.changes.knowledge = knowledge_;
     if (const auto error = store_->commit(batch.changes))
         ARLog().error("the registry database cannot be written: %{public}@", *error);
+}
+
+void ARRegistry::storeLearntGrants() {
+    ARBatch batch;
+    batch.changes.judgedAgain = context_->grants.takeLearnt();
+    store(batch);
 }
 
 void ARRegistry::applyLive(ARBatch&& batch) {
@@ -103,7 +112,7 @@ void ARRegistry::declareTypes() {
 
 void ARRegistry::rescan() {
     queue_.sync([this] {
-        ARPass pass(*store_, model_, complaints_,
+        ARPass pass(*store_, model_, complaints_, context_->grants,
                     [this](ARBatch&& batch) { applyLive(std::move(batch)); });
         pass.run(places_);
     });
@@ -114,7 +123,7 @@ std::optional<platform::Error> ARRegistry::registerPlugin(std::string_view path)
     if (!canonical)
         return platform::posixError(canonical.error(), std::string(path));
     const auto reason = queue_.sync([&] {
-        ARPass pass(*store_, model_, complaints_,
+        ARPass pass(*store_, model_, complaints_, context_->grants,
                     [this](ARBatch&& batch) { applyLive(std::move(batch)); });
         return pass.add(*canonical);
     });
@@ -127,7 +136,7 @@ std::optional<platform::Error> ARRegistry::unregisterPlugin(std::string_view pat
     // A bundle that vanished goes by the path that it had.
     const std::string known = platform::canonicalPath(path).value_or(std::string(path));
     const bool done = queue_.sync([&] {
-        ARPass pass(*store_, model_, complaints_,
+        ARPass pass(*store_, model_, complaints_, context_->grants,
                     [this](ARBatch&& batch) { applyLive(std::move(batch)); });
         return pass.withdraw(known);
     });

@@ -52,6 +52,7 @@ public:
     [[nodiscard]] std::optional<platform::Error> registerPlugin(std::string_view path) override;
     [[nodiscard]] std::optional<platform::Error> unregisterPlugin(std::string_view path) override;
     void clearSchemaCaches() override;
+    void trustChanged() override;
     void setObserver(ARWorkspaceObserver* observer) override;
 
     // Compares everything with the folders again, and waits for it.
@@ -63,6 +64,7 @@ private:
 
     void firstPass();
     void store(ARBatch& batch);
+    void storeLearntGrants();
     void applyLive(ARBatch&& batch);
     void publish(std::shared_ptr<ARSnapshot> snapshot);
     void declareTypes();

@@ -57,3 +57,7 @@ ARKnowledge ARRegistry::knowledge() {
 void ARRegistry::clearSchemaCaches() {
     context_->infos.clear();
 }
+
+void ARRegistry::trustChanged() {
+    context_->grants.trustChanged();
+}

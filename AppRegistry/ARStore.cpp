@@ -15,9 +15,20 @@ constexpr const char* insertEntrySql =
     " VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13, ?14, ?15)";
 constexpr const char* updateEntrySql =
     "UPDATE entries SET presence = ?2, placeholder = ?3, stamps = ?4 WHERE id = ?1";
+constexpr const char* selectSignatureSql =
+    "SELECT s.content, s.key, s.entitlements, d.digests FROM signatures s"
+    " JOIN details d ON d.id = s.id WHERE s.id = ?1";
 
 std::optional<std::string_view> view(const std::optional<platform::SharedBytes>& text) {
     return text ? std::optional(text->view()) : std::nullopt;
+}
+
+std::optional<ARDigests> digestsIn(std::string_view bytes) {
+    if (bytes.size() != sizeof(ARDigests))
+        return std::nullopt;
+    ARDigests digests;
+    std::memcpy(&digests, bytes.data(), sizeof digests);
+    return digests;
 }
 
 template <class E>
@@ -37,15 +48,21 @@ ARStore::Impl::Impl(ARSqlConnection writing, ARSqlConnection reading)
       updateEntry(writer, updateEntrySql),
       removeEntry(writer, "DELETE FROM entries WHERE id = ?1"),
       removeDetail(writer, "DELETE FROM details WHERE id = ?1"),
+      putSignature(writer, "INSERT OR REPLACE INTO signatures (id, key, entitlements, content)"
+                           " VALUES (?1, ?2, ?3, ?4)"),
+      updateSignature(writer, "UPDATE signatures SET key = ?2, entitlements = ?3 WHERE id = ?1"),
+      removeSignature(writer, "DELETE FROM signatures WHERE id = ?1"),
       setKnowledge(writer, "UPDATE knowledge SET sequence = ?1, uuid = ?2 WHERE id = 1"),
       selectDigests(writer, "SELECT digests FROM details WHERE id = ?1"),
       reader(std::move(reading)),
-      selectInfo(reader, "SELECT info FROM details WHERE id = ?1") {}
+      selectInfo(reader, "SELECT info FROM details WHERE id = ?1"),
+      selectSignature(reader, selectSignatureSql) {}
 
 int ARStore::Impl::prepared() const {
     for (const ARSqlStatement* statement :
          {&begin, &end, &rollback, &insertEntry, &insertDetail, &updateEntry, &removeEntry,
-          &removeDetail, &setKnowledge, &selectDigests, &selectInfo}) {
+          &removeDetail, &putSignature, &updateSignature, &removeSignature, &setKnowledge,
+          &selectDigests, &selectInfo, &selectSignature}) {
         if (statement->prepared() != SQLITE_OK)
             return statement->prepared();
     }
@@ -72,8 +89,28 @@ int ARStore::Impl::update(const ARBundleRow& row) {
 }
 
 int ARStore::Impl::remove(std::int64_t id) {
-    const int code = removeEntry.run(id);
-    return code == SQLITE_OK ? removeDetail.run(id) : code;
+    for (ARSqlStatement* statement : {&removeEntry, &removeDetail, &removeSignature}) {
+        if (const int code = statement->run(id); code != SQLITE_OK)
+            return code;
+    }
+    return SQLITE_OK;
+}
+
+int ARStore::Impl::writeSignatures(const ARStoreChanges& changes) {
+    for (const auto& [id, signature] : changes.signatures) {
+        const int code = putSignature.run(id, std::string_view(signature.key),
+                                          std::string_view(signature.entitlements),
+                                          std::string_view(signature.content));
+        if (code != SQLITE_OK)
+            return code;
+    }
+    for (const auto& [id, signature] : changes.judgedAgain) {
+        const int code = updateSignature.run(id, std::string_view(signature.key),
+                                             std::string_view(signature.entitlements));
+        if (code != SQLITE_OK)
+            return code;
+    }
+    return SQLITE_OK;
 }
 
 int ARStore::Impl::setTo(const ARKnowledge& known) {
@@ -95,6 +132,8 @@ int ARStore::Impl::write(const ARStoreChanges& changes) {
         if (const int code = insert(entry); code != SQLITE_OK)
             return code;
     }
+    if (const int code = writeSignatures(changes); code != SQLITE_OK)
+        return code;
     return setTo(changes.knowledge);
 }
 
@@ -120,8 +159,8 @@ std::optional<ARDigests> ARStore::digests(std::int64_t id) {
     ARSqlStatement& select = impl_->selectDigests;
     std::optional<ARDigests> found;
     select.bindAll(id);
-    if (select.step() == SQLITE_ROW && select.bytes(0).size() == sizeof(ARDigests))
-        std::memcpy(&found.emplace(), select.bytes(0).data(), sizeof(ARDigests));
+    if (select.step() == SQLITE_ROW)
+        found = digestsIn(select.bytes(0));
     select.reset();
     return found;
 }
@@ -139,6 +178,22 @@ std::optional<std::string> ARStore::info(std::int64_t id) const {
     select.bindAll(id);
     if (select.step() == SQLITE_ROW)
         found = select.bytes(0);
+    select.reset();
+    return found;
+}
+
+std::optional<ARSignatureFacts> ARStore::signature(std::int64_t id) const {
+    const std::lock_guard lock(impl_->readerLock);
+    ARSqlStatement& select = impl_->selectSignature;
+    std::optional<ARSignatureFacts> found;
+    select.bindAll(id);
+    const int code = select.step();
+    const auto digests = code == SQLITE_ROW ? digestsIn(select.bytes(3)) : std::nullopt;
+    if (digests) {
+        found.emplace(ARSignature{std::string(select.bytes(0)), std::string(select.bytes(1)),
+                                  std::string(select.bytes(2))},
+                      *digests);
+    }
     select.reset();
     return found;
 }

@@ -10,6 +10,7 @@
 
 #include "AppRegistry/ARApplicationWorkspace.h"
 #include "AppRegistry/ARBundleRow.h"
+#include "AppRegistry/ARSignature.h"
 #include "platform/value/Error.h"
 
 // A new entry with all that is stored of it.
@@ -26,9 +27,16 @@ struct ARStoreChanges {
     // state changed.
     std::vector<ARBundleRow> updated;
     std::vector<std::int64_t> removed;
+    // Signatures of entries that are added, or whose files were read again.
+    std::vector<ARSignatureOfEntry> signatures;
+    // What came out when signatures that are stored were judged again; their content stays.
+    std::vector<ARSignatureOfEntry> judgedAgain;
     ARKnowledge knowledge; // after the change
 
-    [[nodiscard]] bool empty() const { return added.empty() && updated.empty() && removed.empty(); }
+    [[nodiscard]] bool empty() const {
+        return added.empty() && updated.empty() && removed.empty() && signatures.empty() &&
+               judgedAgain.empty();
+    }
 };
 
 // Why a database could not be used. Damage (also a database of another version) is healed by
@@ -40,8 +48,8 @@ struct ARStoreFailure {
 
 // The registry's database: what the registry learnt about the bundles, in SQLite. Nothing in it
 // is the only copy of what the folders tell, so that it may be thrown away at any time.
-// Owned by the registry. One thread at a time, except info(), which any thread may call at any
-// time: it has a connection of its own that no writer keeps waiting.
+// Owned by the registry. One thread at a time, except info() and signature(), which any thread may
+// call at any time: they have a connection of their own that no writer keeps waiting.
 class ARStore {
 public:
     struct Content {
@@ -63,6 +71,8 @@ public:
 
     // The encoded info dictionary of an entry; nothing when it is gone or cannot be read.
     [[nodiscard]] std::optional<std::string> info(std::int64_t id) const;
+    // The signature of an entry; nothing when it has none, is gone or cannot be read.
+    [[nodiscard]] std::optional<ARSignatureFacts> signature(std::int64_t id) const;
 
 private:
     struct Impl;

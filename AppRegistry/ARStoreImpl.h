@@ -18,6 +18,7 @@ struct ARStore::Impl {
     [[nodiscard]] int insert(const ARNewEntry& entry);
     [[nodiscard]] int update(const ARBundleRow& row);
     [[nodiscard]] int remove(std::int64_t id);
+    [[nodiscard]] int writeSignatures(const ARStoreChanges& changes);
     [[nodiscard]] int setTo(const ARKnowledge& known);
 
     ARSqlConnection writer;
@@ -29,10 +30,14 @@ struct ARStore::Impl {
     ARSqlStatement updateEntry;
     ARSqlStatement removeEntry;
     ARSqlStatement removeDetail;
+    ARSqlStatement putSignature;
+    ARSqlStatement updateSignature;
+    ARSqlStatement removeSignature;
     ARSqlStatement setKnowledge;
     ARSqlStatement selectDigests;
 
     std::mutex readerLock; // held for one look-up at a time, never by a writer
     ARSqlConnection reader;
     ARSqlStatement selectInfo;
+    ARSqlStatement selectSignature;
 };

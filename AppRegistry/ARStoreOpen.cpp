@@ -11,11 +11,11 @@
 
 namespace {
 
-// Raised with every change of the tables: a database of another version is rebuilt.
-constexpr std::int64_t schemaVersion = 1;
+// Raised with every change of the tables. An older database is upgraded, a newer one rebuilt.
+constexpr std::int64_t schemaVersion = 2;
 constexpr int waitForOtherProcessMilliseconds = 5000;
 
-constexpr const char* schema =
+constexpr const char* version1 =
     "BEGIN;"
     "CREATE TABLE entries (id INTEGER PRIMARY KEY, kind INTEGER NOT NULL, presence INTEGER NOT "
     "NULL,"
@@ -29,6 +29,17 @@ constexpr const char* schema =
     "INSERT INTO knowledge VALUES (1, 0, NULL);"
     "PRAGMA user_version = 1;"
     "COMMIT;";
+// A plug-in that has a signature file (the last of the three stamps has an inode) gets a stamp for
+// it that proves nothing, so that the next pass reads it again.
+constexpr const char* version2 =
+    "BEGIN;"
+    "CREATE TABLE signatures (id INTEGER PRIMARY KEY, key BLOB NOT NULL,"
+    " entitlements BLOB NOT NULL, content BLOB NOT NULL);"
+    "UPDATE entries SET stamps = CAST(substr(stamps, 1, 64) || zeroblob(8) AS BLOB)"
+    " WHERE kind = 1 AND length(stamps) = 72 AND substr(stamps, 49, 8) <> zeroblob(8);"
+    "PRAGMA user_version = 2;"
+    "COMMIT;";
+constexpr const char* upgrades[schemaVersion] = {version1, version2}; // each from the one before
 
 // In the log, commits need no sync to be whole after a crash; checkpoints are made by the registry.
 constexpr const char* writerSettings =
@@ -70,24 +81,32 @@ std::expected<std::int64_t, int> firstNumber(ARSqlConnection& connection, const 
     return statement.integer(0);
 }
 
-// Makes the tables of a new database, and refuses one of another version or with damage.
-std::optional<ARStoreFailure> makeUsable(ARSqlConnection& connection) {
-    const auto version = firstNumber(connection, "PRAGMA user_version");
-    const auto tables = firstNumber(connection, "SELECT count(*) FROM sqlite_schema");
-    if (!version || !tables)
-        return failure(version ? tables.error() : version.error());
-    if (*tables == 0 && *version == 0) {
-        const int code = connection.execute(schema);
-        return code == SQLITE_OK ? std::nullopt : std::optional(failure(code));
-    }
-    if (*version != schemaVersion)
-        return ARStoreFailure{true, "its version is " + std::to_string(*version)};
+std::optional<ARStoreFailure> checkWhole(ARSqlConnection& connection) {
     ARSqlStatement check(connection, "PRAGMA quick_check(1)");
     const int code = check.step();
     if (code != SQLITE_ROW)
         return failure(code);
     if (check.bytes(0) != "ok")
         return ARStoreFailure{true, std::string(check.bytes(0))};
+    return std::nullopt;
+}
+
+// Makes the tables of a new database and upgrades those of an older one; refuses one of an unknown
+// version or with damage.
+std::optional<ARStoreFailure> makeUsable(ARSqlConnection& connection) {
+    const auto version = firstNumber(connection, "PRAGMA user_version");
+    const auto tables = firstNumber(connection, "SELECT count(*) FROM sqlite_schema");
+    if (!version || !tables)
+        return failure(version ? tables.error() : version.error());
+    const bool isNew = *tables == 0 && *version == 0;
+    if (!isNew && (*version < 1 || *version > schemaVersion))
+        return ARStoreFailure{true, "its version is " + std::to_string(*version)};
+    if (auto damage = checkWhole(connection))
+        return damage;
+    for (std::int64_t reached = *version; reached < schemaVersion; ++reached) {
+        if (const int code = connection.execute(upgrades[reached]); code != SQLITE_OK)
+            return failure(code);
+    }
     return std::nullopt;
 }
 

@@ -29,7 +29,8 @@ public:
     [[nodiscard]] virtual std::optional<platform::Dictionary> infoDictionary() const = 0;
     // Its "HXExtension" entry.
     [[nodiscard]] virtual std::optional<platform::Dictionary> plugInDictionary() const = 0;
-    [[nodiscard]] virtual const std::optional<platform::Dictionary>& entitlements() const = 0;
+    // What its signature grants at this moment; nothing when it does not count.
+    [[nodiscard]] virtual std::optional<platform::Dictionary> entitlements() const = 0;
     [[nodiscard]] virtual platform::Date registrationDate() const = 0;
     [[nodiscard]] virtual bool isOnSystemPartition() const = 0;
     // In the language in use; nothing when the bundle has no such name.

@@ -207,20 +207,3 @@ TEST_F(FirstPass, KnowsExtensionPointsAndTypeDeclarations) {
     EXPECT_FALSE(registry->extensionPointForIdentifier("com.example.bad"));
     EXPECT_FALSE(registry->extensionPointForIdentifier("com.example"));
 }
-
-TEST_F(FirstPass, AsksForEntitlementsOfTheBundle) {
-    makeUsual();
-    home.write(std::string(one) + "/Signature", "signed");
-    signing.granted["signed"] = Dictionary{{"com.example.may", true}};
-    open();
-    EXPECT_EQ(at(one)->entitlements(), (Dictionary{{"com.example.may", true}}));
-    EXPECT_FALSE(at(two)->entitlements());
-    std::vector<std::string> asked;
-    const auto kept = registry->pluginsMatchingQuery(
-        {}, [&](std::string_view identifier, const auto& entitlements) {
-            asked.emplace_back(identifier);
-            return entitlements.has_value();
-        });
-    EXPECT_EQ(asked, (Strings{"com.example.a.one", "com.example.a.two"}));
-    EXPECT_EQ(kept, (ARApplicationWorkspace::PlugIns{at(one)}));
-}

@@ -43,6 +43,7 @@ struct FakeSigning final : platform::CodeSigning {
     std::atomic<unsigned> rechecked = 0;
     std::map<std::string, platform::Dictionary> granted; // by content of the signature file
     std::string key = "the key";                         // whose grants count
+    int verified = 0;                                    // signatures that took calculation
 
     struct Task final : platform::SigningTask {
         explicit Task(FakeSigning& its) : signing(its), entitlements(its.clientEntitlements) {}
@@ -90,6 +91,7 @@ struct FakeSigning final : platform::CodeSigning {
 
     [[nodiscard]] std::expected<platform::SignatureGrant, std::string>
     verifyBundle(const platform::SignedBundle& bundle) override {
+        ++verified;
         const auto found = granted.find(std::string(bundle.signature));
         if (found == granted.end())
             return std::unexpected("nobody granted this");

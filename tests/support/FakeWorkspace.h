@@ -69,7 +69,7 @@ struct FakePlugIn final : ARZephrinProxy {
         return *found->dictionary();
     }
 
-    [[nodiscard]] const std::optional<platform::Dictionary>& entitlements() const override {
+    [[nodiscard]] std::optional<platform::Dictionary> entitlements() const override {
         return granted;
     }
 
@@ -108,6 +108,7 @@ public:
     ARWorkspaceObserver* observer = nullptr;
     int proxiesAsked = 0;
     int schemaCachesCleared = 0;
+    int trustChanges = 0;
     std::vector<std::string> registered;
     std::vector<std::string> unregistered;
 
@@ -124,7 +125,7 @@ public:
             return std::nullopt;
         PlugIns kept;
         for (const auto& plugIn : installed) {
-            if (filter(plugIn->plugInIdentifier().value_or(""), plugIn->entitlements()))
+            if (!filter || filter(plugIn->plugInIdentifier().value_or(""), plugIn->entitlements()))
                 kept.push_back(plugIn);
         }
         return kept;
@@ -163,6 +164,8 @@ public:
     }
 
     void clearSchemaCaches() override { ++schemaCachesCleared; }
+
+    void trustChanged() override { ++trustChanges; }
 
     void setObserver(ARWorkspaceObserver* o) override { observer = o; }
 

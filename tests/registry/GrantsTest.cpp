@@ -1,0 +1,275 @@
+#include <functional>
+
+#include <sqlite3.h>
+
+#include "platform/digest/Sha256.h"
+#include "tests/registry/RegistryFixture.h"
+
+using platform::Dictionary;
+using Strings = std::vector<std::string>;
+
+namespace {
+
+constexpr const char* one = "Applications/A.app/PlugIns/One.appex";
+constexpr const char* two = "Applications/A.app/PlugIns/Two.appex";
+constexpr const char* outside = "Elsewhere/Out.appex";
+constexpr const char* complaint = "ar error: the signature of ";
+
+const Dictionary some{{"com.example.may", true}, {"com.example.names", platform::Array{"a", 1}}};
+
+class Grants : public RegistryTest {
+protected:
+    void SetUp() override {
+        makeApplication("Applications/A.app", "com.example.a");
+        makePlugIn(one, "one");
+        makePlugIn(two, "two");
+        signing.granted["good"] = some;
+    }
+
+    void sign(std::string_view plugIn, std::string_view signature) const {
+        home.write(std::string(plugIn) + "/Signature", signature);
+    }
+
+    void changeTrust(const std::string& key, const std::map<std::string, Dictionary>& granted) {
+        signing.key = key;
+        signing.granted = granted;
+        registry->trustChanged();
+    }
+
+    // How often something was verified since the last call.
+    int verified() { return std::exchange(signing.verified, 0); }
+
+    void execute(const char* sql) {
+        registry.reset();
+        sqlite3* handle = nullptr;
+        ASSERT_EQ(sqlite3_open(places.registryDatabase.c_str(), &handle), SQLITE_OK);
+        EXPECT_EQ(sqlite3_exec(handle, sql, nullptr, nullptr, nullptr), SQLITE_OK) << sql;
+        sqlite3_close(handle);
+    }
+};
+
+std::size_t linesWith(std::string_view log, std::string_view text) {
+    std::size_t found = 0;
+    for (auto at = log.find(text); at != log.npos; at = log.find(text, at + 1))
+        ++found;
+    return found;
+}
+
+// Keeps what it was given to verify.
+struct Examiner final : platform::CodeSigning {
+    std::vector<platform::SignedBundle> seen;
+
+    [[nodiscard]] std::unique_ptr<platform::SigningTask>
+    taskFor(std::shared_ptr<const platform::ipc::Peer>) override {
+        return nullptr;
+    }
+
+    [[nodiscard]] std::expected<platform::SignatureGrant, std::string>
+    verifyBundle(const platform::SignedBundle& bundle) override {
+        seen.push_back(bundle);
+        return std::unexpected("no");
+    }
+
+    [[nodiscard]] bool isTrusted(std::string_view) override { return false; }
+};
+
+} // namespace
+
+TEST_F(Grants, AreVerifiedWhenABundleIsNewOrChangedAndAtNoOtherTime) {
+    sign(one, "good");
+    letClockTick();
+    EXPECT_EQ(open(), "");
+    EXPECT_EQ(at(one)->entitlements(), some);
+    EXPECT_EQ(at(two)->entitlements(), std::nullopt);
+    EXPECT_EQ(verified(), 1);
+    open(); // from the database
+    EXPECT_EQ(at(one)->entitlements(), some);
+    EXPECT_EQ(at(one)->entitlements(), some);
+    EXPECT_EQ(verified(), 0);
+
+    makePlugIn(one, "one", "com.tovana.other"); // the same signature on another bundle
+    sign(two, "good");
+    letClockTick();
+    registry->rescan();
+    EXPECT_EQ(verified(), 2);
+    EXPECT_EQ(at(two)->entitlements(), some);
+    remove(std::string(two) + "/Signature");
+    registry->rescan();
+    EXPECT_EQ(at(two)->entitlements(), std::nullopt);
+    EXPECT_EQ(verified(), 0);
+
+    makePlugIn(outside, "out");
+    sign(outside, "good");
+    EXPECT_FALSE(registry->registerPlugin(home / outside));
+    EXPECT_EQ(at(outside)->entitlements(), some);
+}
+
+TEST_F(Grants, AreJudgedByWhatTheFilesHold) {
+    Examiner examiner;
+    sign(one, "this");
+    sign(two, "that");
+    remove(std::string(two) + "/program");
+    registry = std::move(*ARRegistry::open(places, locale, containers, types, examiner));
+    platform::Sha256 hash;
+    ASSERT_EQ(examiner.seen.size(), 2U);
+    EXPECT_EQ(examiner.seen[0].info, *hash.ofFile(home / (std::string(one) + "/Info.plist")));
+    ASSERT_TRUE(examiner.seen[0].executable);
+    EXPECT_EQ(examiner.seen[0].executable->size, std::string("code of one").size());
+    EXPECT_EQ(examiner.seen[0].executable->digest, hash.of("code of one"));
+    EXPECT_FALSE(examiner.seen[1].executable);
+
+    EXPECT_FALSE(at(one)->entitlements()); // judged again, from the database alone
+    ASSERT_EQ(examiner.seen.size(), 3U);
+    EXPECT_EQ(examiner.seen[2].info, examiner.seen[0].info);
+    EXPECT_EQ(examiner.seen[2].executable->size, examiner.seen[0].executable->size);
+    EXPECT_EQ(examiner.seen[2].executable->digest, examiner.seen[0].executable->digest);
+    registry.reset();
+}
+
+TEST_F(Grants, ComeAndGoWithTheirKey) {
+    sign(one, "good");
+    letClockTick();
+    open();
+    const auto proxy = at(one);
+    const auto uuid = uuidOf(one);
+    EXPECT_EQ(proxy->entitlements(), some);
+    verified();
+
+    const std::string log = logOf([&] {
+        changeTrust("another key", {});
+        for (int i = 0; i < 3; ++i)
+            EXPECT_EQ(proxy->entitlements(), std::nullopt);
+        registry->rescan();
+    });
+    EXPECT_EQ(linesWith(log, complaint), 1U) << log;
+    EXPECT_EQ(verified(), 1);
+    changeTrust("the key", {});
+    EXPECT_EQ(proxy->entitlements(), some);
+    EXPECT_EQ(verified(), 0) << "it was verified with this key before";
+
+    const Dictionary others{{"com.example.other", 1}};
+    changeTrust("a third key", {{"good", others}});
+    EXPECT_EQ(proxy->entitlements(), others);
+    EXPECT_EQ(uuidOf(one), uuid);
+    EXPECT_EQ(verified(), 1);
+    open(); // which finds it stored
+    EXPECT_EQ(at(one)->entitlements(), others);
+    EXPECT_EQ(verified(), 0);
+}
+
+TEST_F(Grants, FiltersSeeThem) {
+    sign(one, "good");
+    open();
+    Strings asked;
+    const auto kept = registry->pluginsMatchingQuery(
+        {}, [&](std::string_view identifier, const auto& entitlements) {
+            asked.emplace_back(identifier);
+            return entitlements == some;
+        });
+    EXPECT_EQ(asked, (Strings{"one", "two"}));
+    EXPECT_EQ(kept, (ARApplicationWorkspace::PlugIns{at(one)}));
+}
+
+TEST_F(Grants, WhyASignatureDoesNotCountIsSaidOncePerState) {
+    const struct {
+        const char* what;
+        std::function<void()> change;
+        const char* said; // nothing for no line
+    } steps[] = {
+        {"unsigned", [] {}, nullptr},
+        {"wrong", [&] { sign(one, "bad"); }, "nobody granted this"},
+        {"touched", [&] { sign(one, "bad"); }, nullptr},
+        {"wrong in another way", [&] { sign(one, "worse"); }, "nobody granted this"},
+        {"too large", [&] { sign(one, std::string((256U << 10) + 1, 'x')); }, "it is too large"},
+        {"good", [&] { sign(one, "good"); }, nullptr},
+        {"for a huge program",
+         [&] {
+             std::filesystem::resize_file(home / (std::string(one) + "/program"),
+                                          (std::uintmax_t{256} << 20) + 1);
+         },
+         "the executable is too large to be hashed"},
+        {"an application's",
+         [&] {
+             sign("Applications/A.app", "bad");
+             remove(one);
+         },
+         nullptr},
+    };
+
+    open();
+    for (const auto& step : steps) {
+        SCOPED_TRACE(step.what);
+        step.change();
+        const std::string log = logOf([&] {
+            for (int i = 0; i < 2; ++i) {
+                registry->rescan();
+                registry->trustChanged();
+                EXPECT_EQ(at(one) && at(one)->entitlements(), step.what == std::string("good"));
+            }
+        });
+        EXPECT_EQ(linesWith(log, complaint), step.said ? 1U : 0U) << log;
+        const std::string line = home / one + " does not count: " + (step.said ? step.said : "");
+        EXPECT_EQ(linesWith(log, line), step.said ? 1U : 0U) << log;
+    }
+}
+
+TEST_F(Grants, AnOlderDatabaseIsUpgradedWithoutLoss) {
+    sign(one, "good");
+    makePlugIn(outside, "out");
+    sign(outside, "good");
+    letClockTick();
+    open();
+    ASSERT_FALSE(registry->registerPlugin(home / outside));
+    ASSERT_FALSE(registry->unregisterPlugin(home / two));
+    const std::vector before{uuidOf(one), uuidOf(outside)};
+    const auto knowledge = registry->knowledge();
+    execute("DROP TABLE signatures; PRAGMA user_version = 1");
+    verified();
+
+    EXPECT_EQ(open(), "");
+    EXPECT_EQ(verified(), 2);
+    EXPECT_EQ((std::vector{uuidOf(one), uuidOf(outside)}), before);
+    EXPECT_EQ(registry->knowledge().uuid, knowledge.uuid);
+    EXPECT_FALSE(at(two)) << "it was taken away";
+    EXPECT_EQ(at(one)->entitlements(), some);
+    EXPECT_EQ(open(), "");
+    EXPECT_EQ(at(outside)->entitlements(), some);
+    EXPECT_EQ(verified(), 0);
+}
+
+TEST_F(Grants, WhatTheDatabaseLostIsJudgedAgainOrAbsent) {
+    sign(one, "good");
+    letClockTick();
+
+    const struct {
+        const char* sql;
+        std::optional<Dictionary> entitlements;
+    } cases[] = {
+        {"UPDATE signatures SET entitlements = x'ff'", some},
+        {"UPDATE signatures SET key = x''", some},
+        {"UPDATE signatures SET content = 'bad', key = 'unknown'", std::nullopt},
+        {"DELETE FROM signatures", std::nullopt},
+        {"DELETE FROM details", std::nullopt},
+    };
+
+    for (const auto& c : cases) {
+        SCOPED_TRACE(c.sql);
+        open();
+        execute(c.sql);
+        open();
+        EXPECT_EQ(at(one)->entitlements(), c.entitlements);
+    }
+}
+
+TEST_F(Grants, ANewEntryInheritsNothing) {
+    sign(two, "good"); // the last entry, whose number the next one gets
+    open();
+    remove(two);
+    open();
+    makePlugIn(two, "new");
+    sign(two, std::string((256U << 10) + 1, 'x'));
+    open();
+    open();
+    EXPECT_EQ(at(two)->plugInIdentifier(), "new");
+    EXPECT_EQ(at(two)->entitlements(), std::nullopt);
+}
