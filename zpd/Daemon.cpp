@@ -3,6 +3,7 @@
 #include <csignal>
 #include <cstdlib>
 #include <fcntl.h>
+#include <functional>
 #include <unistd.h>
 #include <utility>
 
@@ -10,6 +11,7 @@
 #include "Zephrin/ZPDLog.h"
 #include "platform/container/FolderContainers.h"
 #include "platform/file/File.h"
+#include "platform/file/PathWatch.h"
 #include "platform/ipc/Loop.h"
 #include "platform/locale/SystemLocale.h"
 #include "platform/notify/FileNotifications.h"
@@ -41,7 +43,9 @@ void openStandardDescriptors() {
 // In the order in which they are made; what comes later uses what came before.
 struct Daemon::Parts {
     explicit Parts(platform::Places where);
-    void watchLocale();
+    [[nodiscard]] std::unique_ptr<platform::ipc::Watch> watch(int descriptor,
+                                                              std::function<void()> handler);
+    void watchFiles();
     [[nodiscard]] bool openRegistry();
     [[nodiscard]] bool makeServer(const ZPDOptions& options);
     [[noreturn]] void terminate();
@@ -56,9 +60,11 @@ struct Daemon::Parts {
     platform::FileNotifications notifications;
     platform::FolderContainers containers;
     platform::SystemLocale locale;
-    std::unique_ptr<platform::ipc::Watch> localeWatch;
+    platform::PathWatch trust; // noticing what changes there from here on
     std::unique_ptr<ARRegistry> registry;
     std::unique_ptr<ZPDServer> server;
+    std::unique_ptr<platform::ipc::Watch> localeWatch;
+    std::unique_ptr<platform::ipc::Watch> trustWatch;
 };
 
 Daemon::Parts::Parts(platform::Places where)
@@ -68,14 +74,21 @@ Daemon::Parts::Parts(platform::Places where)
       preferences(places.preferences),
       notifications(places.notify),
       containers(places.containers),
-      locale(places.locale) {}
+      locale(places.locale),
+      trust(places.trust) {}
 
-void Daemon::Parts::watchLocale() {
-    UniqueFd descriptor(::fcntl(locale.watchDescriptor(), F_DUPFD_CLOEXEC, 0));
-    if (descriptor) {
-        localeWatch =
-            mainLoop.watchDescriptor(std::move(descriptor), [this] { locale.handleEvents(); });
-    }
+std::unique_ptr<platform::ipc::Watch> Daemon::Parts::watch(int descriptor,
+                                                           std::function<void()> handler) {
+    UniqueFd own(::fcntl(descriptor, F_DUPFD_CLOEXEC, 0));
+    return own ? mainLoop.watchDescriptor(std::move(own), std::move(handler)) : nullptr;
+}
+
+void Daemon::Parts::watchFiles() {
+    localeWatch = watch(locale.watchDescriptor(), [this] { locale.handleEvents(); });
+    trustWatch = watch(trust.descriptor(), [this] {
+        if (trust.handleEvents())
+            server->trustChanged();
+    });
 }
 
 bool Daemon::Parts::openRegistry() {
@@ -125,9 +138,9 @@ std::unique_ptr<Daemon> Daemon::create(const ZPDOptions& options) {
     if (::geteuid() != 0)
         ZPDLogOps().standard("not running as root: only this user's programs can be recognized");
     auto parts = std::make_unique<Parts>(platform::Places::forThisProcess());
-    parts->watchLocale();
     if (!parts->openRegistry() || !parts->makeServer(options))
         return nullptr;
+    parts->watchFiles();
     parts->server->setVerbose(options.verbose);
     parts->server->setCacheLimit(options.cacheLimit);
     return std::unique_ptr<Daemon>(new Daemon(std::move(parts)));

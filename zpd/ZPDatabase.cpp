@@ -99,6 +99,16 @@ void ZPDatabase::localeChanged() {
     sync_.async([this] { purgeCachesToLimit(0); });
 }
 
+// The records carry what their signatures granted.
+void ZPDatabase::trustChanged() {
+    ZPDLogOps().standard("trust change detected; purging cache");
+    platform_.workspace.trustChanged();
+    sync_.async([this] {
+        purgeCachesToLimit(0);
+        recordsDropped(); // answers may depend on entitlements of plug-ins that have no record
+    });
+}
+
 std::size_t ZPDatabase::cacheSize() {
     return sync_.sync([this] { return cache_.size(); });
 }
@@ -205,10 +215,13 @@ ZPDatabase::candidates(const std::optional<Dictionary>& query) {
         return all;
     }
     const auto elections = ZPDElectionFilter::of(*query);
-    auto matching = platform_.workspace.pluginsMatchingQuery(
-        *query, [&](std::string_view identifier, const std::optional<Dictionary>& entitlements) {
-            return !elections || hasElection(*elections, identifier, entitlements);
-        });
+    ARApplicationWorkspace::Filter filter; // without one nobody looks entitlements up
+    if (elections) {
+        filter = [&](std::string_view identifier, const std::optional<Dictionary>& entitlements) {
+            return hasElection(*elections, identifier, entitlements);
+        };
+    }
+    auto matching = platform_.workspace.pluginsMatchingQuery(*query, filter);
     if (matching && debugging(ZPDLogAr())) {
         ZPDLogAr().debug("%d plugin(s) matching %@ = %@", matching->size(), *query,
                          describeAll(*matching));

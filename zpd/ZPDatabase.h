@@ -61,6 +61,9 @@ public:
 
     [[nodiscard]] ARApplicationWorkspace& workspace() const { return platform_.workspace; }
 
+    // The trusted keys may be others: every cached record is made anew on its next use. Any thread.
+    void trustChanged();
+
     // ---- Look-ups
 
     // The plug-ins that the rules could accept, each once, in the registry's order; empty when the

@@ -119,6 +119,24 @@ TEST_F(DatabaseTest, RebuildsRecordsInAnotherLanguage) {
     EXPECT_EQ(platform.workspace.schemaCachesCleared, 1);
 }
 
+TEST_F(DatabaseTest, RebuildsRecordsWhenTheTrustedKeysChange) {
+    const auto plugIn = install("a");
+    const Dictionary elected{{"HXUserElection", "1"}};
+    EXPECT_THAT(found(elected), IsEmpty()); // and no record is made
+    plugIn->granted = Dictionary{{autoElectKey, true}};
+    database->trustChanged();
+    EXPECT_THAT(found(elected), ElementsAre("a"));
+
+    const auto before = database->findPlugIn(plugIn->uuid);
+    plugIn->granted = Dictionary{{replaceKey, "b"}, {autoElectKey, true}};
+    database->trustChanged();
+    const auto after = database->findPlugIn(plugIn->uuid);
+    EXPECT_EQ(before->annotationKey(), "a");
+    EXPECT_EQ(after->annotationKey(), "b");
+    EXPECT_EQ(election(plugIn), Value(1));
+    EXPECT_EQ(platform.workspace.trustChanges, 2);
+}
+
 TEST_F(DatabaseTest, StopsObservingWhenItGoes) {
     EXPECT_TRUE(platform.workspace.observer && platform.locale.changed);
     database.reset();
