@@ -174,8 +174,11 @@ std::expected<SignatureFile, std::string> SignatureFile::decoded(std::string_vie
     const auto statement = dataIn(dictionary->find(FileKey::statement));
     if (!statement)
         return wrong(FileKey::statement);
-    return SignatureFile{std::string(*keyIdentifier), std::string(*signature),
-                         std::string(*statement)};
+    SignatureFile file{std::string(*keyIdentifier), std::string(*signature),
+                       std::string(*statement)};
+    if (file.encoded() != bytes)
+        return std::unexpected("not as a signer writes it");
+    return file;
 }
 
 std::string SignatureFile::signedBytes(std::string_view statement) {

@@ -156,8 +156,7 @@ TEST_F(VerifierTest, TakesNoFilesOfStrangers) {
     }
 }
 
-// A byte that does not matter, such as a blank, may change; what is granted may not.
-TEST_F(VerifierTest, NoByteOfASignatureFileCanBeTurnedIntoAnotherGrant) {
+TEST_F(VerifierTest, NoByteOfASignatureFileMayChange) {
     const auto files = sign({std::nullopt, program("lone")});
     const std::string sound = read(files.signature());
     const TrustedKeys keys = *verifier_.trust().keys();
@@ -165,9 +164,7 @@ TEST_F(VerifierTest, NoByteOfASignatureFileCanBeTurnedIntoAnotherGrant) {
         std::string damaged = sound;
         damaged[at] = static_cast<char>(damaged[at] ^ 1);
         Verification result;
-        if (result.checkSignature(damaged, keys)) {
-            EXPECT_EQ(result.grant().entitlements, (Dictionary{{"may", true}})) << at;
-        }
+        EXPECT_FALSE(result.checkSignature(damaged, keys)) << at;
     }
 }
 
