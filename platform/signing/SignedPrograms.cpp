@@ -21,7 +21,7 @@ std::optional<std::string> pathOf(int file) {
 }
 
 bool isUnchanged(const Verification::File& file) {
-    return file.settled && stampOf(file.path) == file.stamp;
+    return stampOf(file.path) == file.stamp;
 }
 
 } // namespace
@@ -65,9 +65,11 @@ private:
         std::vector<Verification::File> files; // that the grant rests on
     };
 
+    // A file that had only just changed may change once more without a trace: then what was found
+    // serves the request at hand, and is found out again for the next one.
     [[nodiscard]] bool isKnown() {
         const std::lock_guard lock(mutex_);
-        return found_.has_value();
+        return found_ && std::ranges::all_of(found_->files, &Verification::File::settled);
     }
 
     void learn(Found found) {
