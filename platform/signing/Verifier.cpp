@@ -65,6 +65,8 @@ private:
     }
 
     [[nodiscard]] bool signature(const std::string& path) {
+        if (!stampOf(path))
+            return result.check(signatureIsOwned, "not signed: there is no " + path, {});
         const auto opened = open(path, signatureIsOwned);
         if (!opened)
             return false;

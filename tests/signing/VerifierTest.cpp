@@ -69,7 +69,7 @@ TEST_F(VerifierTest, RefusesWhateverIsNotAsItWasSigned) {
     };
 
     const Case cases[] = {
-        {"unsigned", [](const auto& f) { fs::remove(f.signature()); }, "No such file"},
+        {"unsigned", [](const auto& f) { fs::remove(f.signature()); }, "not signed"},
         {"one byte of the executable", [&](const auto& f) { alter(*f.executable); },
          "the executable is not what it was"},
         {"a longer executable", [&](const auto& f) { alter(*f.executable, 1000); },
