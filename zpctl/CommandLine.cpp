@@ -23,7 +23,8 @@ are not ASCII as \uXXXX. With it an error is {"error": {"message": ..., "code": 
 
 Exit status:
   0  done
-  1  the daemon refused; its message and code are on standard error
+  1  the daemon refused; its message and code are on standard error. Of keygen and sign: not done;
+     of verify: no signature that counts
   2  wrong usage
   3  no daemon, or none that answered in time
 
@@ -36,6 +37,7 @@ Examples:
   zpctl match HXExtensionPointIdentifier=com.example.artwork
   zpctl match 'HXExtensionVersion=>=1.10'
   zpctl --json find /Applications/Cinema.app/PlugIns/Posters.appex
+  zpctl verify /Applications/Cinema.app
   zpctl VERB --help)";
 
 std::string whatIsWrong(const CLI::App& app, const CLI::Error& error) {

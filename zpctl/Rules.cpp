@@ -5,9 +5,6 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/file/File.h"
-#include "platform/plist/PropertyList.h"
-
 namespace zpctl {
 
 namespace {
@@ -15,8 +12,6 @@ namespace {
 using platform::Array;
 using platform::Dictionary;
 using platform::Value;
-
-constexpr std::size_t largestRulesFile = 1U << 20;
 
 using Alternatives = std::vector<std::string>;
 using Grouped = std::map<std::string, Alternatives, std::less<>>;
@@ -69,19 +64,6 @@ std::expected<Dictionary, std::string> rulesFromArguments(std::span<const std::s
         rules.set(key, std::move(*pattern));
     }
     return rules;
-}
-
-std::expected<Dictionary, std::string> rulesFromFile(const std::string& path) {
-    const auto content = platform::readRegularFile(path, largestRulesFile);
-    if (!content)
-        return std::unexpected(content.error().description.value_or("cannot read " + path));
-    const auto list = platform::plist::parse(content->bytes);
-    if (!list)
-        return std::unexpected(path + ": " +
-                               list.error().description.value_or("not a property list"));
-    if (!list->dictionary())
-        return std::unexpected(path + ": the rules are not a dictionary");
-    return *list->dictionary();
 }
 
 } // namespace zpctl

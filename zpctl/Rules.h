@@ -15,8 +15,4 @@ namespace zpctl {
 [[nodiscard]] std::expected<platform::Dictionary, std::string>
 rulesFromArguments(std::span<const std::string> arguments);
 
-// The dictionary in a property-list file of any format.
-[[nodiscard]] std::expected<platform::Dictionary, std::string>
-rulesFromFile(const std::string& path);
-
 } // namespace zpctl

@@ -27,6 +27,10 @@ Status Session::report(const nlohmann::ordered_json& json,
     return Status::done;
 }
 
+void Session::note(const std::string& text) const {
+    terminal_.err << "zpctl: note: " << printable(text) << '\n';
+}
+
 Status Session::fail(const Failure& failure) const {
     if (options_.json) {
         nlohmann::ordered_json error{{"message", failure.message}};

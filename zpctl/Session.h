@@ -50,6 +50,8 @@ public:
 
     // The result, in the one form that was asked for: as JSON, or as `write` puts it for people.
     Status report(const nlohmann::ordered_json& json, const std::function<void()>& write) const;
+    // What a person should know although it worked, on standard error.
+    void note(const std::string& text) const;
     // What went wrong, on standard error; the result is the failure's status.
     Status fail(const Failure& failure) const;
 

@@ -14,8 +14,8 @@ class Session;
 // The exit statuses of the tool.
 enum class Status {
     done = 0,
-    refused = 1,    // by the daemon
-    wrongUsage = 2, // also a rules file that cannot be read
+    refused = 1,    // by the daemon; of a verb that needs none: it was not done, or did not verify
+    wrongUsage = 2, // also a file given with an option that cannot be read
     noDaemon = 3,   // not there, gone while asked, or silent for too long
 };
 

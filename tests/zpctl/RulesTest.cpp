@@ -6,6 +6,7 @@
 #include <gtest/gtest.h>
 
 #include "tests/platform/TestFolder.h"
+#include "zpctl/DictionaryFile.h"
 
 using platform::Array;
 using platform::Dictionary;
@@ -45,7 +46,7 @@ class RulesFile : public testing::Test {
 protected:
     auto rulesOf(const std::string& content) {
         folder_.write("rules", "<plist version=\"1.0\">" + content + "</plist>");
-        return zpctl::rulesFromFile(path_);
+        return zpctl::dictionaryFromFile(path_);
     }
 
     TestFolder folder_;
@@ -59,10 +60,10 @@ TEST_F(RulesFile, HoldsOneDictionary) {
 }
 
 TEST_F(RulesFile, TellsWhichFileIsWrong) {
-    EXPECT_EQ(rulesOf("<array/>").error(), path_ + ": the rules are not a dictionary");
+    EXPECT_EQ(rulesOf("<array/>").error(), path_ + ": not a dictionary");
     EXPECT_TRUE(rulesOf("<dict>").error().starts_with(path_ + ": "));
     std::filesystem::remove(path_);
-    EXPECT_NE(zpctl::rulesFromFile(path_).error().find(path_), std::string::npos);
+    EXPECT_NE(zpctl::dictionaryFromFile(path_).error().find(path_), std::string::npos);
 }
 
 } // namespace

@@ -13,6 +13,7 @@
 #include <CLI/CLI.hpp>
 #include <nlohmann/json.hpp>
 
+#include "zpctl/DictionaryFile.h"
 #include "zpctl/Json.h"
 #include "zpctl/PlugIn.h"
 #include "zpctl/Rules.h"
@@ -78,7 +79,7 @@ std::expected<Dictionary, std::string> rulesOf(const Arguments& arguments) {
     auto given = rulesFromArguments(arguments.rules);
     if (!given || arguments.rulesFile.empty())
         return given;
-    auto rules = rulesFromFile(arguments.rulesFile);
+    auto rules = dictionaryFromFile(arguments.rulesFile);
     if (!rules)
         return rules;
     for (const auto& [key, pattern] : *given)

@@ -8,6 +8,10 @@ std::span<const Verb> verbs() {
          declareMatch},
         {"find", "Show one plug-in, by its UUID or by its path", declareFind},
         {"tree", "Show applications and the plug-ins in them", declareTree},
+        {"keygen", "Make a key to sign with", declareKeygen},
+        {"sign", "Sign a bundle or an executable, with entitlements", declareSign},
+        {"verify", "Tell what the signature of a bundle or an executable grants, and why",
+         declareVerify},
     };
     return table;
 }

@@ -8,5 +8,8 @@ namespace zpctl {
 Action declareMatch(CLI::App& command);
 Action declareFind(CLI::App& command);
 Action declareTree(CLI::App& command);
+Action declareKeygen(CLI::App& command);
+Action declareSign(CLI::App& command);
+Action declareVerify(CLI::App& command);
 
 } // namespace zpctl
