@@ -118,6 +118,17 @@ install_samples() {
     echo 'LANG=en_GB.UTF-8' >"$ZEPHRIN_HOME/etc/locale.conf"
 }
 
+write_entitlements() {
+    cat >"$1" <<'END'
+<plist version="1.0">
+<dict>
+    <key>com.tovana.private.zephrin.manager</key>
+    <true/>
+</dict>
+</plist>
+END
+}
+
 uuid_in_output() {
     sed -n 's/.*\([0-9A-F]\{8\}\(-[0-9A-F]\{4\}\)\{3\}-[0-9A-F]\{12\}\).*/\1/p' "$output" | head -n 1
 }
@@ -189,6 +200,33 @@ echo 'LANG=de_DE.UTF-8' >"$ZEPHRIN_HOME/etc/locale.conf"
 eventually tree_is_german || true
 run 0 zpctl tree
 shows Kino Untertitel-Versatz
+
+title "Some questions need an entitlement, which being root does not replace"
+run 1 zpctl match --flags 0x200
+shows 'code 11'
+
+title "Entitlements are signed: a key, which this box is made to trust, signs a copy of the tool"
+run 0 zpctl keygen "$home/keys"
+run 0 install -D -m 644 "$home/keys/zephrin.pub.pem" "$ZEPHRIN_HOME/etc/trust.d/demo.pem"
+write_entitlements "$home/manager.plist"
+run 0 cat "$home/manager.plist"
+# Not executable by everybody: who may run it could steer it.
+run 0 install -D -m 750 "$build/bin/zpctl" "$ZEPHRIN_HOME/bin/zpctl-manager"
+run 0 zpctl sign --key "$home/keys/zephrin.key.pem" --entitlements "$home/manager.plist" \
+    "$ZEPHRIN_HOME/bin/zpctl-manager"
+run 0 "$ZEPHRIN_HOME/bin/zpctl-manager" match --flags 0x200
+shows com.example.predict '4 plug-ins'
+
+title "Why the one may, and the other may not"
+run 0 zpctl verify "$ZEPHRIN_HOME/bin/zpctl-manager"
+shows com.tovana.private.zephrin.manager 'The signature counts.'
+run 1 zpctl verify "$build/bin/zpctl"
+shows 'Does not count'
+
+title "Without the key on the box the same program is one like any other"
+run 0 rm "$ZEPHRIN_HOME/etc/trust.d/demo.pem"
+run 1 "$ZEPHRIN_HOME/bin/zpctl-manager" match --flags 0x200
+shows 'code 11'
 
 title "After a restart everything is still known, under the same UUID"
 stop_daemon
