@@ -4,6 +4,7 @@
 #include <cstdlib>
 #include <fcntl.h>
 #include <fstream>
+#include <grp.h>
 #include <sstream>
 #include <stdexcept>
 #include <sys/prctl.h>
@@ -34,8 +35,8 @@ std::vector<char*> pointers(std::vector<std::string>& texts) {
     return result;
 }
 
-void redirect(const std::string& path, int flags, int fd) {
-    const int opened = open(path.c_str(), flags | O_CLOEXEC, 0644);
+void redirect(const std::string& path, int flags, int fd, int instead = -1) {
+    const int opened = instead >= 0 ? instead : open(path.c_str(), flags | O_CLOEXEC, 0644);
     if (opened < 0 || dup2(opened, fd) < 0)
         _exit(126);
 }
@@ -43,19 +44,26 @@ void redirect(const std::string& path, int flags, int fd) {
 // In the new process: only calls that are safe after fork.
 [[noreturn]] void become(const Program::Start& start, char* const* command, char* const* settings) {
     prctl(PR_SET_PDEATHSIG, SIGKILL);
-    redirect(start.inputFile, O_RDONLY, STDIN_FILENO);
-    redirect(start.outputFile, O_WRONLY | O_CREAT | O_TRUNC, STDOUT_FILENO);
+    redirect(start.inputFile, O_RDONLY, STDIN_FILENO, start.inputFd);
+    redirect(start.outputFile, O_WRONLY | O_CREAT | O_TRUNC, STDOUT_FILENO, start.outputFd);
     redirect(start.errorFile, O_WRONLY | O_CREAT | O_APPEND, STDERR_FILENO);
     if (start.descriptors) {
         const rlimit limit{*start.descriptors, *start.descriptors};
         setrlimit(RLIMIT_NOFILE, &limit);
+    }
+    if (start.user) {
+        const gid_t group = *start.user;
+        if (setgroups(0, nullptr) != 0 || setresgid(group, group, group) != 0 ||
+            setresuid(*start.user, *start.user, *start.user) != 0)
+            _exit(125);
+        prctl(PR_SET_PDEATHSIG, SIGKILL); // was lost with the user
     }
     execve(command[0], command, settings);
     _exit(127);
 }
 
 Program::Start daemonStart(const std::string& home, const Daemon::Options& options) {
-    std::vector<std::string> command = {builtProgram("zpd"), "-S", options.service, "-d",
+    std::vector<std::string> command = {options.program, "-S", options.service, "-d",
                                         home + "/annotations"};
     command.insert(command.end(), options.arguments.begin(), options.arguments.end());
     return {.command = command,
@@ -64,7 +72,8 @@ Program::Start daemonStart(const std::string& home, const Daemon::Options& optio
                          {"ZEPHRIN_LOG_PRIVATE", "1"},
                          {"LANG", "C"}},
             .errorFile = home + "/zpd.log",
-            .descriptors = options.descriptors};
+            .descriptors = options.descriptors,
+            .user = options.user};
 }
 
 } // namespace

@@ -22,6 +22,9 @@ public:
         std::string inputFile = "/dev/null";
         std::string outputFile = "/dev/null";
         std::optional<std::uint64_t> descriptors; // limit, soft and hard
+        std::optional<uid_t> user{};              // and group; without it that of the tests
+        int inputFd = -1;                         // in place of the files
+        int outputFd = -1;
     };
 
     explicit Program(const Start& start);
@@ -50,10 +53,12 @@ private:
 class Daemon {
 public:
     struct Options {
+        std::string program = builtProgram("zpd");
         std::string service = "e2e";
         std::vector<std::string> arguments;
         std::string logLevel = "debug";
         std::optional<std::uint64_t> descriptors;
+        std::optional<uid_t> user{};
         bool waitUntilReady = true;
     };
 

@@ -33,6 +33,18 @@ std::uint64_t little(std::string_view bytes) {
     throw std::system_error(errno, std::generic_category(), what);
 }
 
+int connectTo(const std::string& socketPath) {
+    const int fd = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    socketPath.copy(address.sun_path, sizeof address.sun_path - 1);
+    if (connect(fd, reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) {
+        close(fd);
+        fail("connect");
+    }
+    return fd;
+}
+
 bool peerIsGone() {
     return errno == EPIPE || errno == ECONNRESET;
 }
@@ -50,16 +62,12 @@ std::string Frame::bytes() const {
 }
 
 WireClient::WireClient(const std::string& socketPath, Greeting greeting)
-    : fd_(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    socketPath.copy(address.sun_path, sizeof address.sun_path - 1);
-    if (connect(fd_, reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) {
-        close(fd_);
-        fail("connect");
-    }
-    if (greeting == Greeting::leave)
-        return;
+    : WireClient(connectTo(socketPath)) {
+    if (greeting == Greeting::read)
+        readGreeting();
+}
+
+void WireClient::readGreeting() {
     const std::optional<Frame> first = receive();
     if (!first || first->kind != greetingFrame)
         throw std::runtime_error("the first frame is not the greeting");

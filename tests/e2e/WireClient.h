@@ -42,6 +42,10 @@ public:
     enum class Greeting { read, leave };
 
     explicit WireClient(const std::string& socketPath, Greeting greeting = Greeting::read);
+
+    // Takes over a connected socket.
+    explicit WireClient(int fd) : fd_(fd) {}
+
     WireClient(WireClient&& other) noexcept;
     WireClient& operator=(WireClient&&) = delete;
     ~WireClient();
@@ -51,6 +55,8 @@ public:
     // Of the greeting that was read.
     [[nodiscard]] const Item& greeting() const { return greeting_; }
 
+    // The first frame. Done by the constructor unless it was told to leave it.
+    void readGreeting();
     void answerGreeting();
 
     // False when the daemon has ended the connection.
