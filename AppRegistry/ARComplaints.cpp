@@ -1,11 +1,13 @@
 #include "AppRegistry/ARComplaints.h"
 
-bool ARComplaints::isNew(const std::string& path, const std::string& reason) {
+#include "AppRegistry/ARLog.h"
+
+void ARComplaints::report(const std::string& path, const std::string& reason) {
     std::string& last = reported_[path];
     if (last == reason)
-        return false;
+        return;
     last = reason;
-    return true;
+    ARLog().error("skipping %{public}@: %{public}@", path, reason);
 }
 
 void ARComplaints::forget(const std::string& path) {

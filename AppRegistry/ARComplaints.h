@@ -3,12 +3,12 @@
 #include <string>
 #include <unordered_map>
 
-// Remembers what was said about which bundle, so that each trouble is reported once and not
-// whenever it is met. Owned by whoever reports; one thread at a time.
+// Remembers which bundles were reported as unusable and why, so that each is reported once and
+// not with every pass. Owned by the registry, used on its queue.
 class ARComplaints {
 public:
-    // True unless this very trouble of this path was the last one reported.
-    [[nodiscard]] bool isNew(const std::string& path, const std::string& reason);
+    // Writes a line unless this very trouble of this path was the last one reported.
+    void report(const std::string& path, const std::string& reason);
     // The path is fine, or gone.
     void forget(const std::string& path);
 

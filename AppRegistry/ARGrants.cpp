@@ -47,11 +47,8 @@ ARGrants::Grant ARGrants::verify(const ARBundleRow& row, const ARDigests& digest
     Grant grant = executable.size > ARLargestHashed
                       ? std::unexpected("the executable is too large to be hashed")
                       : signing_.verifyBundle(bundle);
-    if (grant) {
-        forget(row.path.view());
-    } else {
+    if (!grant)
         complain(row, grant.error());
-    }
     return grant;
 }
 
@@ -131,12 +128,14 @@ std::vector<ARSignatureOfEntry> ARGrants::takeLearnt() {
 
 void ARGrants::complain(const ARBundleRow& row, const std::string& reason) {
     const std::lock_guard lock(lock_);
-    if (complaints_.isNew(std::string(row.path.view()), reason))
+    if (complaints_.emplace(row.path.view(), reason).second)
         ARLog().error("the signature of %{public}@ does not count: %{public}@", row.path.view(),
                       reason);
 }
 
 void ARGrants::forget(std::string_view path) {
     const std::lock_guard lock(lock_);
-    complaints_.forget(std::string(path));
+    auto said = complaints_.lower_bound({std::string(path), {}});
+    while (said != complaints_.end() && said->first == path)
+        said = complaints_.erase(said);
 }

@@ -10,9 +10,9 @@
 #include <set>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
-#include "AppRegistry/ARComplaints.h"
 #include "AppRegistry/ARSignature.h"
 #include "platform/value/TextPool.h"
 #include "platform/value/Value.h"
@@ -32,8 +32,8 @@ struct ARKnownGrant {
 };
 
 // What the signatures of plug-ins grant. A pass has every signature judged that it reads; what was
-// found is stored, so that asking later takes no calculation as long as the key is trusted. Why a
-// signature does not count is said once.
+// found is stored, so that asking later takes no calculation as long as the key is trusted. Each
+// reason why a signature does not count is said once, until the plug-in changes.
 //
 // Shared by the registry and its proxies as part of their context; the signing service must outlive
 // it. Any thread.
@@ -52,7 +52,7 @@ public:
     // The trusted keys may be others: everything is looked up anew.
     void trustChanged() { ++trust_; }
 
-    // The plug-in at a path has gone.
+    // The plug-in at a path has gone, or is another one now.
     void forget(std::string_view path);
 
     // Calls `handler` when there is something new to store: signatures that were judged again with
@@ -80,7 +80,7 @@ private:
     platform::TextPool keys_;
     std::set<std::string> trusted_; // keys that were asked for when `trust_` was ...
     std::uint64_t trustedAt_ = 0;   // ... this
-    ARComplaints complaints_;
+    std::set<std::pair<std::string, std::string>> complaints_; // path and reason
     std::vector<ARSignatureOfEntry> learnt_;
     std::function<void()> onLearnt_;
 };

@@ -4,7 +4,6 @@
 #include <cmath>
 
 #include "AppRegistry/ARGrants.h"
-#include "AppRegistry/ARLog.h"
 #include "platform/ipc/Cbor.h"
 
 namespace {
@@ -94,8 +93,7 @@ bool ARPass::found(const ARCandidate& candidate) {
 
 void ARPass::refused(const std::string& path, const std::string& reason) {
     lastRefusal_ = reason;
-    if (complaints_.isNew(path, reason))
-        ARLog().error("skipping %{public}@: %{public}@", path, reason);
+    complaints_.report(path, reason);
 }
 
 void ARPass::unreadable(const std::string& path, const std::string& reason) {
