@@ -1,10 +1,14 @@
 // Bytes as a signature file, and as the statement in a file that a known key signed.
 
+#include <expected>
+#include <optional>
 #include <string>
 
 #include "fuzz/Target.h"
 #include "platform/signing/Ed25519.h"
 #include "platform/signing/SignatureFile.h"
+#include "platform/signing/TrustFolder.h"
+#include "platform/signing/Verification.h"
 
 using namespace platform;
 
@@ -19,6 +23,7 @@ MC4CAQAwBQYDK2VwBCIEIItvqrON6DT5lI6MlENan9TwjfLNvbO46Z7IIiDEYqeI
 struct Keys {
     PrivateKey secret = PrivateKey::fromPem(keyOfTarget).value();
     PublicKey known = secret.publicKey().value();
+    TrustedKeys trusted{{known.identifier(), known}};
 };
 
 SignatureFile signedFile(const Keys& keys, std::string_view statement) {
@@ -26,39 +31,33 @@ SignatureFile signedFile(const Keys& keys, std::string_view statement) {
     return {keys.known.identifier(), signature, std::string(statement)};
 }
 
-void readStatement(std::string_view bytes) {
-    const auto statement = SignedStatement::decoded(bytes);
-    const auto text = statement ? statement->encoded() : std::unexpected(statement.error());
-    if (!text)
-        return; // binary lists hold text and dates that XML ones cannot
-    const auto again = SignedStatement::decoded(*text);
-    fuzz::require(again && again->encoded().value() == *text, "a statement can be written again");
-}
-
-bool isGenuine(const Keys& keys, const SignatureFile& file) {
-    return keys.known.verifies(SignatureFile::signedBytes(file.statement), file.signature);
-}
-
-void readFile(const Keys& keys, std::string_view bytes) {
-    const auto file = SignatureFile::decoded(bytes);
-    if (!file)
-        return;
-    const SignatureFile own = signedFile(keys, file->statement);
-    fuzz::require(isGenuine(keys, *file) == (file->signature == own.signature),
-                  "no signature verifies but the one that the key makes");
-    readStatement(file->statement);
+std::optional<SignedStatement> verified(const Keys& keys, std::string_view bytes) {
+    Verification verification;
+    const bool passed = verification.checkSignature(bytes, keys.trusted);
+    fuzz::require(passed == verification.statement().has_value() &&
+                      passed != verification.refusal().has_value(),
+                  "there is a statement, or the reason why not");
+    return verification.statement();
 }
 
 } // namespace
 
 void fuzz::run(std::string_view input) {
     static const Keys keys;
-    readFile(keys, input);
+    if (verified(keys, input)) {
+        const SignatureFile file = SignatureFile::decoded(input).value();
+        require(file.signature == signedFile(keys, file.statement).signature,
+                "no signature counts but the one that the key makes");
+    }
     const auto text = signedFile(keys, input).encoded();
     if (!text)
         return; // too large
-    const auto file = SignatureFile::decoded(*text);
-    require(file && isGenuine(keys, *file) && file->statement == input,
-            "a statement comes out as it was put in");
-    readStatement(file->statement);
+    const auto statement = verified(keys, *text);
+    require(statement.has_value() == SignedStatement::decoded(input).has_value(),
+            "what is signed counts when it can be read");
+    const auto again = statement ? statement->encoded() : std::unexpected("");
+    if (!again)
+        return; // binary lists hold text and dates that XML ones cannot
+    require(SignedStatement::decoded(*again).value().encoded() == again,
+            "a statement can be written again");
 }
