@@ -106,6 +106,15 @@ const DictionaryEntry* Dictionary::end() const noexcept {
 }
 
 const Value* Dictionary::find(std::string_view key) const noexcept {
+    // Among a handful, lengths tell most keys apart; a search by order would compare each in full.
+    constexpr std::size_t handful = 8;
+    if (size() <= handful) {
+        for (const DictionaryEntry& entry : *this) {
+            if (entry.key.view() == key)
+                return &entry.value;
+        }
+        return nullptr;
+    }
     const auto* found = std::lower_bound(begin(), end(), key, keyBefore);
     return found != end() && found->key.view() == key ? &found->value : nullptr;
 }
@@ -198,8 +207,7 @@ const Data* Value::data() const noexcept {
 }
 
 std::optional<Uuid> Value::uuid() const noexcept {
-    const auto* box = std::get_if<std::shared_ptr<const Uuid>>(&held_);
-    return box ? std::optional(**box) : std::nullopt;
+    return getCopy<Uuid>(held_);
 }
 
 const Url* Value::url() const noexcept {
@@ -295,8 +303,6 @@ bool operator==(const Value& a, const Value& b) noexcept {
         return equalNumbers(a, b);
     if (a.kind() != b.kind())
         return false;
-    if (const auto uuid = a.uuid())
-        return uuid == b.uuid();
     return a.held_ == b.held_;
 }
 

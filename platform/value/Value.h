@@ -148,7 +148,7 @@ public:
 
     Value(Data data) : held_(std::move(data)) {}
 
-    Value(const Uuid& uuid) : held_(std::make_shared<const Uuid>(uuid)) {}
+    Value(const Uuid& uuid) : held_(uuid) {}
 
     Value(Url url) : held_(std::move(url)) {}
 
@@ -208,7 +208,7 @@ private:
     };
 
     using Held = std::variant<std::nullptr_t, bool, std::int64_t, std::uint64_t, double, Text, Date,
-                              Data, std::shared_ptr<const Uuid>, Url, Array, Dictionary, Encoded>;
+                              Data, Uuid, Url, Array, Dictionary, Encoded>;
 
     explicit Value(Held held) : held_(std::move(held)) {}
 
