@@ -301,6 +301,11 @@ std::optional<Value> ZPPlugInCore::augmentInterface(const Value&) const {
 }
 
 std::string describe(const ZPPlugInCore& plugIn) {
-    return "<ZPPlugInCore " + plugIn.identifier() + "(" + plugIn.exportedVersion() + ") " +
-           plugIn.uuid().text() + ">";
+    constexpr std::size_t usualLength = 160;
+    std::string text;
+    text.reserve(usualLength);
+    text.append("<ZPPlugInCore ").append(plugIn.identifier());
+    text.append("(").append(plugIn.exportedVersion()).append(") ");
+    plugIn.uuid().appendTextTo(text);
+    return text.append(">");
 }

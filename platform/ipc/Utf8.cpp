@@ -8,7 +8,7 @@ namespace platform::ipc {
 
 namespace {
 
-// How many bytes of `text` are plain ASCII from its start on, in steps of eight.
+// How many bytes of `text` are plain ASCII from its start on.
 std::size_t asciiPrefix(std::string_view text) noexcept {
     constexpr std::uint64_t highBits = 0x8080808080808080;
     std::size_t at = 0;
@@ -18,6 +18,8 @@ std::size_t asciiPrefix(std::string_view text) noexcept {
         if (eight & highBits)
             break;
     }
+    while (at < text.size() && static_cast<std::uint8_t>(text[at]) < 0x80)
+        ++at;
     return at;
 }
 

@@ -1,6 +1,8 @@
 #include "platform/log/Render.h"
 
 #include <charconv>
+#include <cstdint>
+#include <cstring>
 #include <optional>
 #include <system_error>
 
@@ -77,6 +79,21 @@ void appendEscapedByte(std::string& out, char c) {
     }
 }
 
+// How many bytes at the start of `text` surely need no escape, in steps of eight: of plain ASCII
+// without controls. (Adding 1 sets the high bit of 0x7f; taking 0x20 away, that of what is less.)
+std::size_t plainPrefix(std::string_view text) {
+    constexpr std::uint64_t ones = 0x0101010101010101;
+    constexpr std::uint64_t highBits = 0x80 * ones;
+    std::size_t at = 0;
+    for (; at + sizeof(std::uint64_t) <= text.size(); at += sizeof(std::uint64_t)) {
+        std::uint64_t eight = 0;
+        std::memcpy(&eight, text.data() + at, sizeof eight);
+        if ((eight | (eight + ones) | (eight - 0x20 * ones)) & highBits)
+            break;
+    }
+    return at;
+}
+
 // True for U+0080 to U+009F, which a terminal may obey like escape sequences.
 bool isWideControl(std::string_view text, std::size_t at) {
     return text[at] == '\xc2' && at + 1 < text.size() &&
@@ -88,7 +105,7 @@ void appendEscaped(std::string& out, std::string_view text) {
     const auto appendPlain = [&](std::size_t end) {
         out.append(text.substr(plainStart, end - plainStart));
     };
-    for (std::size_t i = 0; i < text.size(); ++i) {
+    for (std::size_t i = plainPrefix(text); i < text.size(); ++i) {
         const char c = text[i];
         const bool wide = isWideControl(text, i);
         if (!wide && static_cast<unsigned char>(c) >= 0x20 && c != '\x7f')

@@ -15,7 +15,7 @@ namespace {
 
 // Lines are gathered for this long or up to this size, whichever is first.
 constexpr auto gatherTime = std::chrono::milliseconds(10);
-constexpr std::size_t gatheredSize = 64 * 1024;
+constexpr std::size_t gatheredSize = 256 * 1024;
 // How long the end of the process waits for a reader of standard error that does not read.
 constexpr auto flushPatience = std::chrono::seconds(2);
 // Room that is kept between batches; what a burst needed beyond it is given back.

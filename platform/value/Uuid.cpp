@@ -68,16 +68,21 @@ std::optional<Uuid> Uuid::fromBytes(std::span<const std::byte> raw) {
 }
 
 std::string Uuid::text() const {
-    static constexpr char digits[] = "0123456789ABCDEF";
     std::string out;
-    out.reserve(textLength);
-    for (const std::uint8_t byte : bytes) {
-        if (isDashPosition(out.size()))
-            out.push_back('-');
-        out.push_back(digits[byte >> 4]);
-        out.push_back(digits[byte & 0x0f]);
-    }
+    appendTextTo(out);
     return out;
+}
+
+void Uuid::appendTextTo(std::string& out) const {
+    static constexpr char digits[] = "0123456789ABCDEF";
+    static constexpr std::uint8_t places[] = {0,  2,  4,  6,  9,  11, 14, 16,
+                                              19, 21, 24, 26, 28, 30, 32, 34};
+    char text[] = "........-....-....-....-............";
+    for (std::size_t i = 0; i < bytes.size(); ++i) {
+        text[places[i]] = digits[bytes[i] >> 4];
+        text[places[i] + 1] = digits[bytes[i] & 0x0f];
+    }
+    out.append(text, textLength);
 }
 
 } // namespace platform

@@ -22,6 +22,7 @@ struct Uuid {
     // Nothing unless there are exactly 16 bytes.
     [[nodiscard]] static std::optional<Uuid> fromBytes(std::span<const std::byte> raw);
     [[nodiscard]] std::string text() const;
+    void appendTextTo(std::string& out) const;
 
     friend auto operator<=>(const Uuid&, const Uuid&) = default;
 };
