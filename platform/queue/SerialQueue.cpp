@@ -1,39 +1,60 @@
 #include "platform/queue/SerialQueue.h"
 
+#include <atomic>
 #include <cassert>
 #include <condition_variable>
 #include <deque>
 #include <mutex>
 #include <pthread.h>
 #include <thread>
+#include <utility>
 
 namespace platform {
 
 namespace {
 
-// What the calling thread holds, innermost first: a list through the frames of `enter`.
+// One queue that the calling thread holds.
 struct Held {
     const void* state;
     QueueRank rank;
+    std::shared_ptr<const void> keeper; // of the state, once the queue itself is gone
 };
 
 constexpr std::size_t deepestNesting = 8;
-thread_local Held heldQueues[deepestNesting];
+thread_local Held heldQueues[deepestNesting]; // the innermost is the last
 thread_local std::size_t heldCount = 0;
 
 void push(const void* state, QueueRank rank) {
     assert(heldCount < deepestNesting);
-    heldQueues[heldCount++] = {state, rank};
+    Held& held = heldQueues[heldCount++];
+    held.state = state;
+    held.rank = rank;
 }
 
-void pop([[maybe_unused]] const void* state) {
+// Answers with what keeps the state, if only this thread did.
+[[nodiscard]] std::shared_ptr<const void> pop([[maybe_unused]] const void* state) {
     assert(heldCount > 0 && heldQueues[heldCount - 1].state == state);
-    --heldCount;
+    return std::move(heldQueues[--heldCount].keeper);
+}
+
+Held* heldBy(const void* state) {
+    for (std::size_t i = 0; i < heldCount; ++i) {
+        if (heldQueues[i].state == state)
+            return &heldQueues[i];
+    }
+    return nullptr;
 }
 
 [[maybe_unused]] bool mayEnter(QueueRank rank) {
     return heldCount == 0 || heldQueues[heldCount - 1].rank < rank;
 }
+
+// What a queue's gate shows. A free gate is entered, and a held one left, without the mutex;
+// whoever finds it crowded asks the line.
+using Gate = unsigned;
+constexpr Gate gateFree = 0;
+constexpr Gate gateHeld = 1;    // someone holds the queue
+constexpr Gate gateCrowded = 2; // the line may not be empty; the gate changes under the mutex only
 
 } // namespace
 
@@ -61,20 +82,51 @@ struct SerialQueue::State {
     std::mutex mutex;
     std::condition_variable workerWake;
     std::deque<Place> line;
-    bool busy = false; // someone holds the queue
     bool closing = false;
     std::thread worker;
+    std::atomic<Gate> gate = gateFree;
 
+    [[nodiscard]] bool tryPass() {
+        Gate expected = gateFree;
+        return gate.compare_exchange_strong(expected, gateHeld, std::memory_order_acquire);
+    }
+
+    [[nodiscard]] bool tryLeave() {
+        Gate expected = gateHeld;
+        return gate.compare_exchange_strong(expected, gateFree, std::memory_order_release);
+    }
+
+    // From here on the gate stands still while the mutex is held. Tells whether it is held.
+    [[nodiscard]] bool crowd() {
+        return gate.fetch_or(gateCrowded, std::memory_order_acq_rel) & gateHeld;
+    }
+
+    void takeFront();
+    void waitInLine();
     void passOn();
     void work();
     static void runUnlocked(Block& block, std::unique_lock<std::mutex>& lock);
     void startWorker(const std::shared_ptr<State>& self);
 
-    bool workerTurn() const { return !busy && !line.empty() && !line.front().waiter; }
+    // REQUIRES: mutex held.
+    bool workerTurn() const { return !isHeld() && !line.empty() && !line.front().waiter; }
+
+    bool isDone() const { return closing && line.empty() && !isHeld(); }
+
+    bool isHeld() const { return gate.load() & gateHeld; }
 };
 
-// Hands a free queue to the front of the line. REQUIRES: mutex held, not busy.
+// The queue is held by the front of the line, which is taken off it. REQUIRES: mutex held, the
+// gate crowded and not held.
+void SerialQueue::State::takeFront() {
+    line.pop_front();
+    gate.store(line.empty() ? gateHeld : gateHeld | gateCrowded);
+}
+
+// Leaves the queue, or hands it to the front of the line. REQUIRES: mutex held, the gate
+// crowded.
 void SerialQueue::State::passOn() {
+    gate.store(line.empty() ? gateFree : gateCrowded);
     if (line.empty()) {
         if (closing)
             workerWake.notify_one();
@@ -85,10 +137,19 @@ void SerialQueue::State::passOn() {
         workerWake.notify_one();
         return;
     }
-    busy = true;
-    line.pop_front();
+    takeFront();
     next->granted = true;
     next->turn.notify_one();
+}
+
+// Answers when the calling thread's turn has come; it then holds the queue.
+void SerialQueue::State::waitInLine() {
+    std::unique_lock lock(mutex);
+    Waiter waiter;
+    line.push_back({{}, {}, &waiter});
+    if (!crowd() && line.size() == 1)
+        return takeFront(); // it was left meanwhile
+    waiter.turn.wait(lock, [&] { return waiter.granted; });
 }
 
 // The lock is held again afterwards.
@@ -104,21 +165,19 @@ void SerialQueue::State::runUnlocked(Block& block, std::unique_lock<std::mutex>&
 void SerialQueue::State::work() {
     std::unique_lock lock(mutex);
     for (;;) {
-        workerWake.wait(lock, [&] { return workerTurn() || (closing && line.empty() && !busy); });
+        workerWake.wait(lock, [&] { return workerTurn() || isDone(); });
         if (!workerTurn())
             return;
         Place place = std::move(line.front());
-        line.pop_front();
-        busy = true;
+        takeFront();
         lock.unlock();
         push(this, rank);
         place.block();
         place.block = nullptr; // what the block owns goes while the queue is held
-        pop(this);
+        const auto keeper = pop(this);
         lock.lock();
-        busy = false;
-        if (!workerTurn())
-            passOn();
+        (void)crowd();
+        passOn();
         runUnlocked(place.afterwards, lock);
     }
 }
@@ -140,12 +199,18 @@ SerialQueue::SerialQueue(std::string name, QueueRank rank)
 SerialQueue::~SerialQueue() {
     std::unique_lock lock(state_->mutex);
     state_->closing = true;
+    (void)state_->crowd(); // whoever holds the queue wakes the worker when it leaves
     state_->workerWake.notify_one();
     std::thread worker = std::move(state_->worker);
+    Held* const own = heldBy(state_.get());
+    if (!own && !worker.joinable())
+        state_->workerWake.wait(lock, [&] { return state_->isDone(); });
     lock.unlock();
+    if (own)
+        own->keeper = state_;
     if (!worker.joinable())
         return;
-    if (isCurrent() || worker.get_id() == std::this_thread::get_id()) {
+    if (own || worker.get_id() == std::this_thread::get_id()) {
         worker.detach(); // it owns the state, and ends with the block that lets the queue go
     } else {
         worker.join();
@@ -161,47 +226,34 @@ void SerialQueue::async(Block block, Block afterwards) {
     assert(!state_->closing);
     state_->line.push_back({std::move(block), std::move(afterwards), nullptr});
     state_->startWorker(state_);
-    if (state_->workerTurn() && state_->line.size() == 1)
+    if (!state_->crowd() && state_->line.size() == 1)
         state_->workerWake.notify_one();
 }
 
 void SerialQueue::enter() {
     assert(mayEnter(state_->rank));
-    std::unique_lock lock(state_->mutex);
-    if (state_->busy || !state_->line.empty()) {
-        State::Waiter waiter;
-        state_->line.push_back({{}, {}, &waiter});
-        waiter.turn.wait(lock, [&] { return waiter.granted; });
-    } else {
-        state_->busy = true;
-    }
+    if (!state_->tryPass())
+        state_->waitInLine();
     push(state_.get(), state_->rank);
 }
 
 bool SerialQueue::tryEnter() {
-    if (!mayEnter(state_->rank))
+    if (!mayEnter(state_->rank) || !state_->tryPass())
         return false;
-    const std::lock_guard lock(state_->mutex);
-    if (state_->busy || !state_->line.empty())
-        return false;
-    state_->busy = true;
     push(state_.get(), state_->rank);
     return true;
 }
 
 void SerialQueue::leave(State& state) {
-    pop(&state);
+    const auto keeper = pop(&state);
+    if (state.tryLeave())
+        return;
     const std::lock_guard lock(state.mutex);
-    state.busy = false;
     state.passOn();
 }
 
 bool SerialQueue::isCurrent() const noexcept {
-    for (std::size_t i = 0; i < heldCount; ++i) {
-        if (heldQueues[i].state == state_.get())
-            return true;
-    }
-    return false;
+    return heldBy(state_.get());
 }
 
 void SerialQueue::assertOnQueue() const {

@@ -66,17 +66,18 @@ public:
 private:
     struct State;
 
+    // The block may let the queue go: what it is made of then stays until it was left.
     class Holding {
     public:
-        explicit Holding(SerialQueue& queue) : state_(queue.state_) {}
+        explicit Holding(SerialQueue& queue) : state_(*queue.state_) {}
 
         Holding(const Holding&) = delete;
         Holding& operator=(const Holding&) = delete;
 
-        ~Holding() { leave(*state_); }
+        ~Holding() { leave(state_); }
 
     private:
-        std::shared_ptr<State> state_; // the block may let the queue go
+        State& state_;
     };
 
     void enter();
