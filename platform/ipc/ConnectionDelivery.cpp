@@ -12,6 +12,34 @@ namespace {
 // while others are served too, and twice as many each time that nobody else was, up to this.
 constexpr unsigned mostPerTurn = 32;
 
+// What becomes of a connection's requests while its handler runs on this thread: entered into the
+// books when the handler has returned, together. On the stack of who hands out.
+struct HandingOut {
+    explicit HandingOut(const Connection::Impl& from);
+    HandingOut(const HandingOut&) = delete;
+    HandingOut& operator=(const HandingOut&) = delete;
+    ~HandingOut();
+
+    const Connection::Impl& connection;
+    HandingOut* const outer;
+    bool taken = false;
+    std::size_t finished = 0;
+    std::size_t finishedCost = 0;
+};
+
+thread_local HandingOut* innermost = nullptr;
+
+HandingOut::HandingOut(const Connection::Impl& from)
+    : connection(from), outer(std::exchange(innermost, this)) {}
+
+HandingOut::~HandingOut() {
+    innermost = outer;
+}
+
+HandingOut* underWay(const Connection::Impl& connection) {
+    return innermost && &innermost->connection == &connection ? innermost : nullptr;
+}
+
 } // namespace
 
 Ticket::Ticket(std::shared_ptr<Connection> connection, std::size_t cost)
@@ -52,7 +80,7 @@ void Ticket::finish() {
     connection_.reset();
 }
 
-void Connection::Impl::enqueue(Message message, std::size_t cost) {
+void Connection::Impl::enqueue(Message&& message, std::size_t cost) {
     account->add(cost);
     const std::lock_guard lock(mutex);
     waiting.push_back({std::move(message), cost});
@@ -77,17 +105,27 @@ void Connection::Impl::deliver(std::unique_lock<std::mutex>& lock) {
                 post(&Impl::takeTurn);
             break;
         }
-        Waiting next = std::move(waiting.front());
-        waiting.pop_front();
-        untaken = true;
-        lock.unlock();
-        next.message.ticket = Ticket(owner->shared_from_this(), next.cost);
-        handler(Event(std::move(next.message)));
-        lock.lock();
+        handOut(lock);
     }
     delivering = false;
     if (invalidDue)
         post(&Impl::deliverInvalid);
+}
+
+// REQUIRES: mutex held, something waits.
+void Connection::Impl::handOut(std::unique_lock<std::mutex>& lock) {
+    Waiting next = std::move(waiting.front());
+    waiting.pop_front();
+    untaken = true;
+    lock.unlock();
+    HandingOut now(*this);
+    next.message.ticket = Ticket(owner->shared_from_this(), next.cost);
+    handler(Event(std::move(next.message)));
+    lock.lock();
+    if (now.taken)
+        untaken = false;
+    if (now.finished > 0)
+        strikeOff(now.finished, now.finishedCost);
 }
 
 // Replies to several requests that are answered within one turn go out together.
@@ -109,6 +147,10 @@ void Connection::Impl::takeTurn() {
 }
 
 void Connection::Impl::requestTaken() {
+    if (HandingOut* const now = underWay(*this)) {
+        now->taken = true;
+        return;
+    }
     std::unique_lock lock(mutex);
     untaken = false;
     deliver(lock);
@@ -122,23 +164,31 @@ void Connection::Impl::requestTakenOnLoop() {
 }
 
 void Connection::Impl::requestFinished(std::size_t cost) {
-    bool wake = false;
-    bool last = false;
-    {
-        const std::lock_guard lock(mutex);
-        --unfinished;
-        unfinishedCost -= cost;
-        wake = paused && unfinished <= limits.waitingRequests / 2 &&
-               unfinishedCost <= limits.waitingBytes / 2;
-        if (wake)
-            paused = false;
-        last = ended && unfinished == 0;
-    }
     account->release(cost);
-    if (last)
-        post(&Impl::settle);
-    else if (wake)
+    if (HandingOut* const now = underWay(*this)) {
+        ++now->finished;
+        now->finishedCost += cost;
+        return;
+    }
+    const std::lock_guard lock(mutex);
+    strikeOff(1, cost);
+}
+
+// Requests are done. REQUIRES: mutex held.
+void Connection::Impl::strikeOff(std::size_t requests, std::size_t cost) {
+    unfinished -= requests;
+    unfinishedCost -= cost;
+    if (ended) {
+        if (unfinished == 0)
+            post(&Impl::settle);
+        return;
+    }
+    const bool enough =
+        unfinished <= limits.waitingRequests / 2 && unfinishedCost <= limits.waitingBytes / 2;
+    if (paused && enough) {
+        paused = false;
         post(&Impl::goOn);
+    }
 }
 
 } // namespace platform::ipc

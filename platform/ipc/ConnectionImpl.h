@@ -48,7 +48,6 @@ struct Connection::Impl final : SocketWatch::Target {
     [[nodiscard]] bool admitBegun();
     void releaseReserved();
     [[nodiscard]] bool hasRoom() const;
-    [[nodiscard]] bool mayTake();
     [[nodiscard]] bool pauseUnless(bool admitted);
     void pause(bool admitted);
     void userHasRoom();
@@ -56,11 +55,13 @@ struct Connection::Impl final : SocketWatch::Target {
     void hungUp() override;
 
     // Delivery. Any thread.
-    void enqueue(Message message, std::size_t cost);
+    void enqueue(Message&& message, std::size_t cost);
     void requestTaken();
     void requestTakenOnLoop();
     void requestFinished(std::size_t cost);
     void deliver(std::unique_lock<std::mutex>& lock);
+    void handOut(std::unique_lock<std::mutex>& lock);
+    void strikeOff(std::size_t requests, std::size_t cost);
     [[nodiscard]] bool mayDeliver() const;
     void takeTurn(); // on the loop
 
@@ -95,6 +96,8 @@ struct Connection::Impl final : SocketWatch::Target {
     // On the loop.
     std::unique_ptr<SocketWatch> socket; // none once it is closed
     FrameReader reader{FrameReader::Side::daemon};
+    SocketWatch::Left left = SocketWatch::Left::unknown; // in the socket, by the last read
+    bool mixed = false; // what came was not all plain bytes of one process
     SharedBytes challenge;
     bool answered = false;
     bool greeted = false; // answered by the very process that connected
@@ -112,19 +115,20 @@ struct Connection::Impl final : SocketWatch::Target {
         std::size_t cost;
     };
 
-    // Guarded by the mutex. The handler is called without it, by who set `delivering`.
+    // Guarded by the mutex. The handler is called without it, by who set `delivering`. What is
+    // atomic is changed with the mutex held, and may be looked at without.
     std::mutex mutex;
     EventHandler handler;
     std::deque<Waiting> waiting;
-    std::size_t unfinished = 0; // requests that wait or are worked on, and what they cost
-    std::size_t unfinishedCost = 0;
+    std::atomic<std::size_t> unfinished = 0; // requests that wait or are worked on
+    std::atomic<std::size_t> unfinishedCost = 0;
     bool resumed = false;
     bool untaken = false; // a delivered request was not taken yet
     bool delivering = false;
     bool turnDue = false;    // a turn on the loop is posted
     unsigned leftOfTurn = 0; // requests that the loop may still hand out
     bool invalidDue = false;
-    bool paused = false;
+    std::atomic<bool> paused = false;
     bool ended = false;
 };
 

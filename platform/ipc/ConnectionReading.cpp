@@ -34,8 +34,15 @@ bool cameFrom(pid_t pid, msghdr& message) {
     return false;
 }
 
+// What one read brought.
+struct Arrived {
+    ssize_t count;
+    bool fromPeer;
+    bool plain; // nothing came along that ends a read before the socket is empty
+};
+
 // Reads once. Descriptors that a client sends along find no room and are closed by the kernel.
-ssize_t readOnce(int socket, std::array<iovec, 2> room, pid_t pid, bool& fromPeer) {
+Arrived readOnce(int socket, std::array<iovec, 2> room, pid_t pid) {
     alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(ucred))> control{};
     msghdr message{};
     const bool held = room[0].iov_len != 0;
@@ -44,8 +51,12 @@ ssize_t readOnce(int socket, std::array<iovec, 2> room, pid_t pid, bool& fromPee
     message.msg_control = control.data();
     message.msg_controllen = CMSG_LEN(sizeof(ucred));
     const ssize_t count = ::recvmsg(socket, &message, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
-    fromPeer = count > 0 && cameFrom(pid, message);
-    return count;
+    const bool fromPeer = count > 0 && cameFrom(pid, message);
+    return {count, fromPeer, fromPeer && !(message.msg_flags & MSG_CTRUNC)};
+}
+
+std::size_t sizeOf(const std::array<iovec, 2>& room) {
+    return room[0].iov_len + room[1].iov_len;
 }
 
 } // namespace
@@ -53,14 +64,19 @@ ssize_t readOnce(int socket, std::array<iovec, 2> room, pid_t pid, bool& fromPee
 void Connection::Impl::readable() {
     if (ended || !socket)
         return;
-    bool fromPeer = false;
-    const ssize_t count =
-        readOnce(socket->descriptor(), reader.room(scratch(), scratchSize), peer.pid, fromPeer);
-    if (count < 0 && (errno == EAGAIN || errno == EINTR))
-        return socket->waitReadable(target());
-    if (count <= 0)
+    const std::array<iovec, 2> room = reader.room(scratch(), scratchSize);
+    const Arrived arrived = readOnce(socket->descriptor(), room, peer.pid);
+    if (arrived.count < 0 && (errno == EAGAIN || errno == EINTR)) {
+        left = errno == EAGAIN ? SocketWatch::Left::nothing : SocketWatch::Left::unknown;
+        return socket->waitReadable(target(), left);
+    }
+    if (arrived.count <= 0)
         return end(Replies::flush);
-    reader.filled(static_cast<std::size_t>(count), fromPeer);
+    const auto count = static_cast<std::size_t>(arrived.count);
+    mixed = mixed || !arrived.plain;
+    left =
+        mixed || count == sizeOf(room) ? SocketWatch::Left::unknown : SocketWatch::Left::unlikely;
+    reader.filled(count, arrived.fromPeer);
     takeFrames();
 }
 
@@ -69,7 +85,7 @@ void Connection::Impl::readable() {
 void Connection::Impl::takeFrames() {
     bool took = false;
     bool emptied = false;
-    while (!emptied && mayTake()) {
+    while (!emptied && hasRoom()) {
         const auto frame = reader.next();
         if (!frame)
             return end(Replies::drop, frame.error());
@@ -90,7 +106,7 @@ void Connection::Impl::takeFrames() {
     if (pauseUnless(admitted))
         pause(admitted);
     else if (emptied)
-        socket->waitReadable(target());
+        socket->waitReadable(target(), left);
     else
         comeBack(); // requests were done meanwhile; no new byte may ever come
 }
@@ -154,18 +170,14 @@ void Connection::Impl::releaseReserved() {
         account->release(std::exchange(reserved, 0));
 }
 
-// REQUIRES: mutex held.
 bool Connection::Impl::hasRoom() const {
     return unfinished < limits.waitingRequests && unfinishedCost < limits.waitingBytes &&
            (unfinished == 0 || !account->full());
 }
 
-bool Connection::Impl::mayTake() {
-    const std::lock_guard lock(mutex);
-    return hasRoom();
-}
-
 bool Connection::Impl::pauseUnless(bool admitted) {
+    if (admitted && !paused && hasRoom())
+        return false;
     const std::lock_guard lock(mutex);
     paused = !admitted || !hasRoom();
     return paused;

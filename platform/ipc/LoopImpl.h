@@ -13,6 +13,7 @@
 #include <asio/steady_timer.hpp>
 
 #include "platform/ipc/Loop.h"
+#include "platform/ipc/SocketWatch.h"
 
 namespace platform::ipc {
 
@@ -42,6 +43,9 @@ struct Loop::Impl {
     std::vector<std::unique_ptr<Signal>> signals;
     std::atomic<std::thread::id> runner;
     const void* lastServed = nullptr; // whose requests had the last turn; on the loop
+    // Sockets that are looked at again soon, and when; on the loop.
+    std::vector<std::shared_ptr<SocketWatch::State>> unsure;
+    asio::steady_timer secondLook{context};
     std::thread thread;
 };
 

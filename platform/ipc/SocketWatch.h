@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstdint>
 #include <memory>
 
 #include "platform/file/File.h"
@@ -16,11 +17,19 @@ public:
     class Target {
     public:
         virtual ~Target() = default;
-        virtual void readable() = 0;
+        virtual void readable() = 0; // perhaps
 
         virtual void writable() {}
 
         virtual void hungUp() {} // the peer closed both directions
+    };
+
+    // What the last read may have left in the socket. It decides how much waiting costs: the kernel
+    // tells of what comes from now on by itself; of what is there already it must be asked.
+    enum class Left : std::uint8_t {
+        unknown,  // the kernel is asked
+        unlikely, // the target is told once more a moment later
+        nothing,
     };
 
     // REQUIRES: on the loop, or the loop not running.
@@ -33,14 +42,15 @@ public:
     [[nodiscard]] int descriptor() const noexcept;
 
     // Nothing happens when the wait is under way already.
-    void waitReadable(std::shared_ptr<Target> target);
+    void waitReadable(std::shared_ptr<Target> target, Left left = Left::unknown);
     void waitWritable(std::shared_ptr<Target> target);
     void waitHangUp(std::shared_ptr<Target> target);
     // Ends all waits and closes the socket.
     void close();
 
-private:
     struct State;
+
+private:
     std::shared_ptr<State> state_;
 };
 

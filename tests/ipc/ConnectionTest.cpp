@@ -259,6 +259,46 @@ TEST_F(ConnectionTest, WaitingRequestsOfAUserAreLimitedTogether) {
     EXPECT_TRUE(answered.reaches(60));
 }
 
+// Whether a child process could write with a client's socket.
+bool writeFromChild(RawClient& client, std::string_view bytes) {
+    const pid_t child = ::fork();
+    if (child == 0)
+        ::_exit(client.write(bytes) ? 0 : 1);
+    int status = 1;
+    ::waitpid(child, &status, 0);
+    return status == 0;
+}
+
+// One read ends where another process's bytes begin, and the socket tells of none of them again.
+TEST_F(ConnectionTest, FindsWhatOneReadLeftBehind) {
+    EchoServer server(path_);
+    RawClient client(path_);
+    const std::string text = request(1, Dictionary{});
+    client.write(text);
+    ASSERT_TRUE(client.read());
+    const auto whileTheLoopIsHeld = [&](auto&& act) {
+        std::promise<void> release;
+        server.loop().post([held = release.get_future()]() mutable { held.wait(); });
+        act();
+        release.set_value();
+    };
+    whileTheLoopIsHeld([&] {
+        client.write(text);
+        ASSERT_TRUE(writeFromChild(client, text));
+        client.write(text);
+    });
+    for (int i = 0; i < 3; ++i)
+        EXPECT_TRUE(client.read());
+    RawClient leaving(path_);
+    leaving.write(text);
+    ASSERT_TRUE(leaving.read());
+    whileTheLoopIsHeld([&] {
+        leaving.write(text);
+        leaving.endWriting();
+    });
+    EXPECT_TRUE(server.gone.reaches(1));
+}
+
 TEST_F(ConnectionTest, TellsWhoseBytesARequestIsMadeOf) {
     EchoServer server(path_, {}, [](Connection& connection, const Message& message) {
         Reply reply = createReply(message);
@@ -267,14 +307,7 @@ TEST_F(ConnectionTest, TellsWhoseBytesARequestIsMadeOf) {
     });
     RawClient client(path_);
     const std::string text = request(1, Dictionary{});
-    const auto fromChild = [&](std::string_view part) {
-        const pid_t child = ::fork();
-        if (child == 0)
-            ::_exit(client.write(part) ? 0 : 1);
-        int status = 1;
-        ::waitpid(child, &status, 0);
-        return status == 0;
-    };
+    const auto fromChild = [&](std::string_view part) { return writeFromChild(client, part); };
     client.write(text);
     EXPECT_EQ(client.read()->body, (Dictionary{{"fromPeer", true}}));
     ASSERT_TRUE(fromChild(text));
