@@ -28,7 +28,9 @@ Transaction::Transaction(platform::ipc::Message request, std::shared_ptr<ZPDIpcC
     : request_(std::move(request)),
       reply_(platform::ipc::createReply(request_)),
       client_(std::move(client)),
-      connection_(client_->connection()) {}
+      connection_(client_->connection()),
+      version_(unsignedFor("version")),
+      type_(stringFor("request")) {}
 
 Transaction::~Transaction() = default;
 
@@ -38,8 +40,6 @@ ZPDServer& Transaction::server() const {
 
 void Transaction::dispatch() {
     server().assertOnServiceQueue();
-    const auto type = stringFor("request");
-    version_ = unsignedFor("version");
     if (!supportsVersion(version_)) {
         return fail(ZPDErrorCode::version,
                     ZPDErrorMakeFormat(ZPDErrorCode::version,
@@ -48,9 +48,9 @@ void Transaction::dispatch() {
     }
     if (!client().acceptWork())
         return;
-    ZPDLogOps().debug("client %d requested %{public}s", client().pid(), type.value_or("(null)"));
-    platform::probe::request(client().pid(), type ? std::string(*type).c_str() : nullptr);
-    route(type);
+    ZPDLogOps().debug("client %d requested %{public}s", client().pid(), type_.value_or("(null)"));
+    platform::probe::request(client().pid(), type_ ? std::string(*type_).c_str() : nullptr);
+    route();
 }
 
 // The current version and the one before it.
@@ -63,10 +63,10 @@ const Transaction::RequestType* Transaction::known(std::string_view type) {
     return found == std::end(requestTypes) ? nullptr : found;
 }
 
-void Transaction::route(const std::optional<std::string_view>& type) {
-    if (!type)
+void Transaction::route() {
+    if (!type_)
         return fail(ZPDErrorCode::invalidRequest, "invalid request format (missing type)");
-    const RequestType* const row = known(*type);
+    const RequestType* const row = known(*type_);
     if (!row)
         return fail(ZPDErrorCode::invalidRequest, "unrecognized request");
     (this->*row->handler)();
@@ -75,10 +75,9 @@ void Transaction::route(const std::optional<std::string_view>& type) {
 // A request that fails in its envelope, or asks for a record that was made already. Everything
 // else may have to make records, or to read files.
 bool Transaction::isBrief() const {
-    const auto type = stringFor("request");
-    if (!supportsVersion(unsignedFor("version")) || !type || !known(*type))
+    if (!supportsVersion(version_) || !type_ || !known(*type_))
         return true;
-    if (*type != "find" || request().contains("paths"))
+    if (*type_ != "find" || request().contains("paths"))
         return false;
     const Value* const value = request().find("uuids");
     const auto uuid = value ? value->uuid() : std::nullopt;

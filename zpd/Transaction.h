@@ -39,7 +39,7 @@ public:
 
     [[nodiscard]] platform::Dictionary& reply() { return reply_.body; }
 
-    // The request's protocol version, once it was dispatched.
+    // The request's protocol version.
     [[nodiscard]] std::uint64_t version() const { return version_; }
 
     // True for requests that are answered at once from what the daemon has in memory.
@@ -91,7 +91,7 @@ private:
     [[nodiscard]] std::uint64_t unsignedFor(std::string_view key) const;
     // The row of a type; nothing for an unknown one.
     [[nodiscard]] static const RequestType* known(std::string_view type);
-    void route(const std::optional<std::string_view>& type);
+    void route();
     [[nodiscard]] bool marshalPath(const platform::Value& entry, const PathBlock& block);
 
     // ---- zpd/requests/Discovery.cpp
@@ -111,5 +111,6 @@ private:
     platform::ipc::Reply reply_;
     const std::shared_ptr<ZPDIpcClient> client_;
     const std::shared_ptr<platform::ipc::Connection> connection_;
-    std::uint64_t version_ = 0;
+    const std::uint64_t version_;
+    const std::optional<std::string_view> type_; // in the request
 };

@@ -7,8 +7,9 @@
 #include "zpd/ZPDIpcClient.h"
 
 void Transaction::setMatches(std::optional<platform::Value> matches) {
+    static const platform::SharedBytes key(std::string_view("matches"));
     if (matches)
-        reply().set("matches", std::move(*matches));
+        reply().set(key, std::move(*matches));
 }
 
 void Transaction::done() {

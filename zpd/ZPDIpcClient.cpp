@@ -50,7 +50,7 @@ void ZPDIpcClient::learnPath() {
 
 void ZPDIpcClient::resume() {
     const auto there = connection_.lock();
-    there->setEventHandler([client = shared_from_this()](platform::ipc::Event event) {
+    there->setEventHandler([client = shared_from_this()](platform::ipc::Event&& event) {
         client->handle(std::move(event));
     });
     there->resume();

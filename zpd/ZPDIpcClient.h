@@ -75,8 +75,8 @@ private:
     void learnPath();
     void resume();
 
-    void handle(platform::ipc::Event event);
-    void handleRequest(platform::ipc::Message message);
+    void handle(platform::ipc::Event&& event);
+    void handleRequest(platform::ipc::Message&& message);
     void prepare(std::shared_ptr<Transaction> transaction);
     void prepared(std::shared_ptr<Transaction> transaction);
     void submit(std::shared_ptr<Transaction> transaction);

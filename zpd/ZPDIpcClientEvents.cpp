@@ -30,7 +30,7 @@ void letNextIn(Transaction& transaction, bool wasBrief) {
 
 } // namespace
 
-void ZPDIpcClient::handle(Event event) {
+void ZPDIpcClient::handle(Event&& event) {
     if (auto* const message = std::get_if<Message>(&event))
         return handleRequest(std::move(*message));
     if (const auto* const value = std::get_if<Value>(&event))
@@ -45,7 +45,7 @@ void ZPDIpcClient::handle(Event event) {
     }
 }
 
-void ZPDIpcClient::handleRequest(Message message) {
+void ZPDIpcClient::handleRequest(Message&& message) {
     auto transaction = std::make_shared<Transaction>(std::move(message), shared_from_this());
     if (platform::probe::requestInputEnabled())
         platform::probe::requestInput(pid(), platform::describe(transaction->request()).c_str());
@@ -78,10 +78,10 @@ void ZPDIpcClient::prepared(std::shared_ptr<Transaction> transaction) {
 
 void ZPDIpcClient::submit(std::shared_ptr<Transaction> transaction) {
     const bool brief = transaction->isBrief();
-    server_.submitWork(
-        [client = shared_from_this(), transaction] { client->carryOut(*transaction); },
-        brief ? ZPDServer::Work::brief : ZPDServer::Work::any,
-        [transaction, brief] { letNextIn(*transaction, brief); });
+    if (brief && server_.tryWork([&] { carryOut(*transaction); }))
+        return transaction->taken();
+    server_.submitWork([transaction] { transaction->client().carryOut(*transaction); },
+                       [transaction, brief] { letNextIn(*transaction, brief); });
 }
 
 void ZPDIpcClient::carryOut(Transaction& transaction) {

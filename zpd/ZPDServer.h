@@ -1,10 +1,12 @@
 #pragma once
 
 #include <atomic>
+#include <concepts>
 #include <expected>
 #include <memory>
 #include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "platform/ipc/Listener.h"
@@ -63,15 +65,17 @@ public:
 
     // ---- Requests (ZPDServerWork.cpp)
 
-    enum class Work : std::uint8_t {
-        any,   // always on the queue's own thread
-        brief, // may run at once on the calling thread when the queue is idle
-    };
-
-    // Runs a block on the service queue, after all that came before, and then `afterwards` on the
-    // same thread, once the queue was let go. Any thread.
-    void submitWork(platform::SerialQueue::Block block, Work work = Work::any,
+    // Runs a block on the service queue's own thread, after all that came before, and then
+    // `afterwards`, once the queue was let go. Any thread.
+    void submitWork(platform::SerialQueue::Block block,
                     platform::SerialQueue::Block afterwards = {});
+
+    // Runs a brief block at once, holding the service queue, when that is idle and the caller is
+    // the IPC loop. Tells whether it did.
+    template <std::invocable F>
+    [[nodiscard]] bool tryWork(F&& block) {
+        return ipcLoop_.isCurrent() && mainQueue_.tryRun(std::forward<F>(block));
+    }
 
     // Requests of clients of whom it is not known yet what they may do. Any thread.
     [[nodiscard]] ZPDPreparations& preparations() { return preparations_; }

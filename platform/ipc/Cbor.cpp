@@ -14,12 +14,18 @@ std::unexpected<Error> corrupt(const char* reason) {
     return std::unexpected(Error{&formatErrorDomain, formatErrorCorrupt, reason});
 }
 
+// What stands before the content of a tag 24 item.
+std::string recordHead(std::size_t size) {
+    std::string head;
+    CborEncoder encoder(head);
+    encoder.head(cbor::Major::tag, cbor::tagEncoded);
+    encoder.head(cbor::Major::bytes, size);
+    return head;
+}
+
 // One tag 24 item of what is in `encoder`: its head, then the pieces.
 Encoded wrapped(const std::string& text, const CborEncoder& encoder) {
-    std::string head;
-    CborEncoder headEncoder(head);
-    headEncoder.head(cbor::Major::tag, cbor::tagEncoded);
-    headEncoder.head(cbor::Major::bytes, encoder.size());
+    std::string head = recordHead(encoder.size());
     std::vector<SharedBytes> pieces;
     // The first stretch goes into one piece with the head.
     encoder.forEachPiece(
@@ -87,10 +93,11 @@ Encoded encodeRecord(const Value& value) {
 }
 
 Encoded encodeRecord(const SharedBytes& item) {
-    std::string text;
-    CborEncoder encoder(text);
-    encoder.shared(item);
-    return wrapped(text, encoder);
+    std::vector<SharedBytes> pieces;
+    pieces.reserve(2);
+    pieces.emplace_back(std::string_view(recordHead(item.size())));
+    pieces.push_back(item);
+    return {std::make_shared<const std::vector<SharedBytes>>(std::move(pieces))};
 }
 
 Encoded encodeRecordArray(std::vector<SharedBytes> items) {
