@@ -100,7 +100,8 @@ struct Connection::Impl final : SocketWatch::Target {
     bool mixed = false; // what came was not all plain bytes of one process
     SharedBytes challenge;
     bool answered = false;
-    bool greeted = false; // answered by the very process that connected
+    bool greeted = false;   // answered by the very process that connected
+    bool entangled = false; // somebody else wrote within one of its frames
     bool awaitsUser = false;
     std::size_t reserved = 0;       // in the user's account, for the request that was begun
     std::unique_ptr<Watch> process; // while reading is paused

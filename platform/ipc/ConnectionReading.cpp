@@ -116,8 +116,14 @@ void Connection::Impl::comeBack() {
     loop.post([connection = owner->shared_from_this()] { connection->impl().goOn(); });
 }
 
-// Answers with what is malformed about the frame.
+// Answers with what is malformed about the frame. Whoever writes within a frame of the peer's moves
+// the place where the next one begins: from then on, what looks like a frame of the peer's may be
+// anything that it sends.
 Connection::Impl::Complaint Connection::Impl::take(const Frame& frame) {
+    if (frame.isMixed) {
+        entangled = true;
+        greeted = false;
+    }
     return frame.header.kind == FrameKind::greetingAnswer ? takeAnswer(frame) : takeRequest(frame);
 }
 
@@ -149,7 +155,7 @@ Connection::Impl::Complaint Connection::Impl::takeAnswer(const Frame& frame) {
     const Data* data = value ? value->data() : nullptr;
     if (!data || data->bytes != challenge)
         return "a wrong answer to the greeting";
-    greeted = frame.fromPeer;
+    greeted = frame.fromPeer && !entangled;
     return std::nullopt;
 }
 

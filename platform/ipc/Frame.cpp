@@ -118,6 +118,7 @@ void FrameReader::reserve(std::size_t more) {
 }
 
 void FrameReader::hold(std::string_view bytes) {
+    noteHeld(bytes.size(), freshFromPeer_);
     while (!bytes.empty()) {
         reserve(bytes.size());
         const std::size_t count = std::min(bytes.size(), heldCapacity_ - heldEnd_);
@@ -125,6 +126,32 @@ void FrameReader::hold(std::string_view bytes) {
         heldEnd_ += count;
         bytes.remove_prefix(count);
     }
+}
+
+void FrameReader::noteHeld(std::size_t count, bool fromPeer) {
+    if (count == 0)
+        return;
+    if (!heldRuns_.empty() && heldRuns_.back().fromPeer == fromPeer)
+        heldRuns_.back().size += count;
+    else
+        heldRuns_.push_back({count, fromPeer});
+}
+
+// Tells of the first `size` held bytes, which are the frame's, whose they are.
+void FrameReader::attribute(Frame& frame, std::size_t size) {
+    auto run = heldRuns_.begin();
+    frame.fromPeer = run->fromPeer;
+    while (size >= run->size) {
+        size -= run->size;
+        ++run;
+        if (size == 0)
+            break;
+        frame.isMixed = true;
+    }
+    if (size != 0)
+        run->size -= size;
+    frame.fromPeer = frame.fromPeer && !frame.isMixed;
+    heldRuns_.erase(heldRuns_.begin(), run);
 }
 
 std::array<iovec, 2> FrameReader::room(char* scratch, std::size_t size) {
@@ -143,8 +170,7 @@ std::array<iovec, 2> FrameReader::room(char* scratch, std::size_t size) {
 void FrameReader::filled(std::size_t count, bool fromPeer) {
     const std::size_t toHeld = std::min(count, roomOfHeld_);
     heldEnd_ += toHeld;
-    if (toHeld != 0 && !fromPeer)
-        heldFromPeer_ = false;
+    noteHeld(toHeld, fromPeer);
     fresh_ = {scratch_, count - toHeld};
     freshFromPeer_ = fromPeer;
 }
@@ -152,7 +178,6 @@ void FrameReader::filled(std::size_t count, bool fromPeer) {
 std::expected<std::optional<Frame>, const char*> FrameReader::next() {
     if (heldSize() == 0) {
         heldBegin_ = heldEnd_ = 0;
-        heldFromPeer_ = true;
         if (heldCapacity_ > keptRoom) {
             held_.reset();
             heldCapacity_ = 0;
@@ -170,7 +195,6 @@ std::expected<std::optional<Frame>, const char*> FrameReader::nextHeld() {
             continue;
         hold(fresh_.substr(0, count));
         fresh_.remove_prefix(count);
-        heldFromPeer_ = heldFromPeer_ && freshFromPeer_;
         const auto header = headerOf({held_.get() + heldBegin_, heldSize()});
         if (!header)
             return std::unexpected(header.error());
@@ -181,8 +205,11 @@ std::expected<std::optional<Frame>, const char*> FrameReader::nextHeld() {
         return std::unexpected(header.error());
     if (!*header || missingOfHeld() != 0)
         return std::nullopt;
-    heldBegin_ += frameHeaderSize + (*header)->bodySize;
-    return Frame{**header, held.substr(frameHeaderSize, (*header)->bodySize), heldFromPeer_};
+    Frame frame{**header, held.substr(frameHeaderSize, (*header)->bodySize)};
+    const std::size_t size = frameHeaderSize + (*header)->bodySize;
+    attribute(frame, size);
+    heldBegin_ += size;
+    return frame;
 }
 
 std::expected<std::optional<Frame>, const char*> FrameReader::nextFresh() {
@@ -200,7 +227,6 @@ std::expected<std::optional<Frame>, const char*> FrameReader::nextFresh() {
 void FrameReader::keep() {
     if (fresh_.empty())
         return;
-    heldFromPeer_ = heldSize() == 0 ? freshFromPeer_ : heldFromPeer_ && freshFromPeer_;
     hold(fresh_);
     fresh_ = {};
 }

@@ -8,6 +8,7 @@
 #include <optional>
 #include <string_view>
 #include <sys/uio.h>
+#include <vector>
 
 namespace platform::ipc {
 
@@ -43,6 +44,7 @@ struct Frame {
     FrameHeader header;
     std::string_view body; // in the reader's storage, until its next call
     bool fromPeer = true;  // every byte of it came with the flag of that name
+    bool isMixed = false;  // some did, and some did not
 };
 
 // Cuts a stream of bytes into frames. Keeps only what belongs to frames that are not complete yet,
@@ -82,6 +84,8 @@ private:
     [[nodiscard]] std::size_t missingOfHeld() const;
     void reserve(std::size_t more);
     void hold(std::string_view bytes);
+    void noteHeld(std::size_t count, bool fromPeer);
+    void attribute(Frame& frame, std::size_t size);
     [[nodiscard]] std::expected<std::optional<Frame>, const char*> nextHeld();
     [[nodiscard]] std::expected<std::optional<Frame>, const char*> nextFresh();
 
@@ -90,7 +94,14 @@ private:
     std::size_t heldCapacity_ = 0;
     std::size_t heldBegin_ = 0;
     std::size_t heldEnd_ = 0;
-    bool heldFromPeer_ = true;
+
+    // Whose the held bytes are, in their order; neighbours differ.
+    struct Run {
+        std::size_t size;
+        bool fromPeer;
+    };
+
+    std::vector<Run> heldRuns_;
     const char* scratch_ = nullptr;
     std::size_t roomOfHeld_ = 0;
     std::string_view fresh_; // in the scratch memory

@@ -303,22 +303,29 @@ TEST_F(ConnectionTest, TellsWhoseBytesARequestIsMadeOf) {
     EchoServer server(path_, {}, [](Connection& connection, const Message& message) {
         Reply reply = createReply(message);
         reply.body.set("fromPeer", message.fromPeer);
+        reply.body.set("greeted", message.greeted);
         connection.send(reply);
     });
     RawClient client(path_);
+    client.answerGreeting();
+    const auto expectRequest = [&](bool fromPeer, bool greeted) {
+        EXPECT_EQ(client.read()->body, (Dictionary{{"fromPeer", fromPeer}, {"greeted", greeted}}));
+    };
     const std::string text = request(1, Dictionary{});
     const auto fromChild = [&](std::string_view part) { return writeFromChild(client, part); };
     client.write(text);
-    EXPECT_EQ(client.read()->body, (Dictionary{{"fromPeer", true}}));
+    expectRequest(true, true);
     ASSERT_TRUE(fromChild(text));
-    EXPECT_EQ(client.read()->body, (Dictionary{{"fromPeer", false}}));
+    expectRequest(false, true);
+    client.write(text);
+    expectRequest(true, true);
     client.write(text.substr(0, 10));
     ASSERT_TRUE(fromChild(text.substr(10)));
-    EXPECT_EQ(client.read()->body, (Dictionary{{"fromPeer", false}}));
+    expectRequest(false, false);
     ASSERT_TRUE(fromChild(text.substr(0, 16)));
     client.write(text.substr(16) + text);
-    EXPECT_EQ(client.read()->body, (Dictionary{{"fromPeer", false}}));
-    EXPECT_EQ(client.read()->body, (Dictionary{{"fromPeer", true}}));
+    expectRequest(false, false);
+    expectRequest(true, false);
 }
 
 } // namespace

@@ -33,6 +33,7 @@ public:
     std::vector<platform::ipc::FrameHeader> headers;
     std::vector<std::string> bodies;
     std::vector<bool> fromPeer;
+    std::vector<bool> isMixed;
     std::string complaint;
 
 private:
@@ -48,6 +49,7 @@ private:
             headers.push_back((*frame)->header);
             bodies.emplace_back((*frame)->body);
             fromPeer.push_back((*frame)->fromPeer);
+            isMixed.push_back((*frame)->isMixed);
         }
         reader_.keep();
     }

@@ -37,7 +37,9 @@ TEST(FrameReaderTest, AFrameIsFromThePeerOnlyWhenAllOfItIs) {
         feed.bytes(one);
         feed.bytes(one.substr(0, cut), false);
         feed.bytes(one.substr(cut));
-        EXPECT_EQ(feed.fromPeer, (std::vector<bool>{true, false, true, false})) << cut;
+        feed.bytes(one, false);
+        EXPECT_EQ(feed.fromPeer, (std::vector<bool>{true, false, true, false, false})) << cut;
+        EXPECT_EQ(feed.isMixed, (std::vector<bool>{false, true, false, true, false})) << cut;
     }
 }
 
