@@ -66,9 +66,9 @@ TEST_F(Impostors, BecomeASignedProgramAfterConnecting) {
     const Command whole = command(unsignedProbe, {"exec-aside " + sleeper + " 60"});
     const Command half = command(unsignedProbe, {"exec-aside-half " + sleeper + " 60"});
     paced(whole, both);
-    burst(whole, both, false);
     burst(half, both, false);
     const std::size_t before = daemon->linesWith(" " + sleeper);
+    burst(whole, both, true);
     burst(half, both, true);
     EXPECT_GT(daemon->linesWith(" " + sleeper), before) << "taken for what they became";
 }
