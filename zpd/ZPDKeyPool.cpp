@@ -3,9 +3,12 @@
 #include <functional>
 #include <vector>
 
+#include "Zephrin/InfoKeys.h"
+
 using platform::Dictionary;
 using platform::DictionaryEntry;
 using platform::SharedBytes;
+using platform::Value;
 
 std::size_t ZPDKeyPool::Hash::operator()(std::string_view text) const {
     return std::hash<std::string_view>()(text);
@@ -23,19 +26,25 @@ Dictionary ZPDKeyPool::withSharedKeys(const Dictionary& dictionary) {
 Dictionary ZPDKeyPool::rebuilt(const Dictionary& dictionary) {
     std::vector<DictionaryEntry> entries;
     entries.reserve(dictionary.size());
-    for (const DictionaryEntry& entry : dictionary) {
-        const Dictionary* const nested = entry.value.dictionary();
-        entries.push_back(
-            {sharedKey(entry.key), nested ? platform::Value(rebuilt(*nested)) : entry.value});
-    }
+    for (const DictionaryEntry& entry : dictionary)
+        entries.push_back({sharedText(entry.key), rebuilt(entry)});
     return Dictionary(std::move(entries));
 }
 
-SharedBytes ZPDKeyPool::sharedKey(const SharedBytes& key) {
-    const auto found = keys_.find(key);
-    if (found != keys_.end())
+Value ZPDKeyPool::rebuilt(const DictionaryEntry& entry) {
+    if (const Dictionary* const nested = entry.value.dictionary())
+        return rebuilt(*nested);
+    const SharedBytes* const text = entry.value.sharedString();
+    if (text && entry.key.view() == InfoKey::extensionPoint)
+        return Value::text(sharedText(*text));
+    return entry.value;
+}
+
+SharedBytes ZPDKeyPool::sharedText(const SharedBytes& text) {
+    const auto found = texts_.find(text);
+    if (found != texts_.end())
         return *found;
-    if (key.size() <= longestKey && keys_.size() < mostKeys)
-        keys_.insert(key);
-    return key;
+    if (text.size() <= longestText && texts_.size() < mostTexts)
+        texts_.insert(text);
+    return text;
 }

@@ -8,20 +8,21 @@
 #include "platform/value/SharedBytes.h"
 #include "platform/value/Value.h"
 
-// The keys of information dictionaries. The same few stand in every bundle: with one copy of each,
-// a record takes less memory, and looking something up in many records touches less of it.
+// The keys of information dictionaries, and the names of extension points in them. The same few
+// stand in every bundle: with one copy of each, a record takes less memory, and looking something
+// up in many records touches less of it.
 //
 // Owned by the database, outlives its records. Any thread.
 class ZPDKeyPool {
 public:
-    // An equal dictionary with the pool's keys, at every level that is reached through
+    // An equal dictionary with the pool's texts, at every level that is reached through
     // dictionaries alone.
     [[nodiscard]] platform::Dictionary withSharedKeys(const platform::Dictionary& dictionary);
 
 private:
-    // What bundles can fill the pool with is bounded; further keys stay their own.
-    static constexpr std::size_t mostKeys = 4096;
-    static constexpr std::size_t longestKey = 64;
+    // What bundles can fill the pool with is bounded; further texts stay their own.
+    static constexpr std::size_t mostTexts = 4096;
+    static constexpr std::size_t longestText = 64;
 
     struct Hash {
         using is_transparent = void;
@@ -44,8 +45,9 @@ private:
 
     // REQUIRES: lock_ is held
     [[nodiscard]] platform::Dictionary rebuilt(const platform::Dictionary& dictionary);
-    [[nodiscard]] platform::SharedBytes sharedKey(const platform::SharedBytes& key);
+    [[nodiscard]] platform::Value rebuilt(const platform::DictionaryEntry& entry);
+    [[nodiscard]] platform::SharedBytes sharedText(const platform::SharedBytes& text);
 
     std::mutex lock_;
-    std::unordered_set<platform::SharedBytes, Hash, Equal> keys_;
+    std::unordered_set<platform::SharedBytes, Hash, Equal> texts_;
 };

@@ -71,6 +71,7 @@ ZPDPlugIn::Ptr ZPDPlugIn::create(const ARZephrinProxy::Ptr& proxy,
 bool ZPDPlugIn::setupWithProxy(const ARZephrinProxy::Ptr& proxy) {
     if (!setup(proxy->plugInIdentifier(), proxy->bundlePath(), std::nullopt, proxy->plugInUUID()))
         return false;
+    identifierHash_ = std::hash<std::string>()(identifier());
     setInfo(proxy->infoDictionary());
     known_ = proxy;
     const auto info = infoPlist();

@@ -29,6 +29,9 @@ public:
     [[nodiscard]] static Ptr create(const ARZephrinProxy::Ptr& proxy,
                                     const ZPDPlugInContext& context);
 
+    // Hash of the identifier, for who looks at many records.
+    [[nodiscard]] std::size_t identifierHash() const { return identifierHash_; }
+
     // ---- What the registry knows
 
     // A fresh view of the plug-in, by UUID, else by path; empty when it has gone.
@@ -168,6 +171,7 @@ private:
 
     const ZPDPlugInContext& context_;
     std::optional<std::string> dataContainerPath_;
+    std::size_t identifierHash_ = 0;
 
     // Guarded by the record's lock; refreshed behind const readers.
     mutable std::weak_ptr<const ARZephrinProxy> known_; // whose data this is

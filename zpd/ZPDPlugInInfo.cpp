@@ -31,12 +31,10 @@ ZPDPlugInInfo::ZPDPlugInInfo(Dictionary dictionary)
       plugIn_(dictionaryIn(infoKey(InfoKey::extension))),
       attributes_(dictionaryIn(pluginKey(InfoKey::attributes))),
       hostEntitlement_(pluginKey(InfoKey::hostEntitlement)),
-      extensionPoint_(nullptr),
       version_(textIn(attribute(InfoKey::version))),
       isDedicated_(isTrue(pluginKey(InfoKey::dedicated))) {
-    extensionPoint_ = attribute(InfoKey::extensionPoint);
-    if (!extensionPoint_)
-        extensionPoint_ = infoKey(InfoKey::extensionPoint);
+    if (const Value* const found = entryOf(InfoKey::extensionPoint))
+        extensionPoint_ = *found;
 }
 
 const Value* ZPDPlugInInfo::infoKey(std::string_view key) const {
@@ -53,7 +51,11 @@ const Value* ZPDPlugInInfo::attribute(std::string_view key) const {
 
 const Value* ZPDPlugInInfo::property(std::string_view key) const {
     if (key == InfoKey::extensionPoint)
-        return extensionPoint_;
+        return extensionPoint_ ? &*extensionPoint_ : nullptr;
+    return entryOf(key);
+}
+
+const Value* ZPDPlugInInfo::entryOf(std::string_view key) const {
     const Value* const found = attribute(key);
     return found ? found : infoKey(key);
 }

@@ -31,11 +31,13 @@ public:
     [[nodiscard]] const platform::Value* hostEntitlement() const { return hostEntitlement_; }
 
 private:
+    [[nodiscard]] const platform::Value* entryOf(std::string_view property) const;
+
     const platform::Dictionary dictionary_;
     const platform::Dictionary* plugIn_;     // within dictionary_; or none
     const platform::Dictionary* attributes_; // within plugIn_; or none
     const platform::Value* hostEntitlement_;
-    const platform::Value* extensionPoint_; // nearly every rule dictionary asks for this property
+    std::optional<platform::Value> extensionPoint_; // nearly every rule dictionary asks for it
     std::optional<std::string> version_;
     bool isDedicated_;
 };

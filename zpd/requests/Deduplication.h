@@ -19,7 +19,7 @@
 // The rule is that of a scan over all kept matches, which decides at the first one of the same
 // identifier (and, with all versions, the same version). At most one such match is ever kept, so
 // a hash index finds it. Lives for one request, on the service queue; what it is offered outlives
-// it. A Registration tells identifier() (a string that stays where it is), exportedVersion(),
+// it. A Registration tells identifier() and its identifierHash(), exportedVersion(),
 // onSystemVolume() and lastModified().
 template <class Registration>
 class Deduplication {
@@ -61,15 +61,16 @@ private:
     }
 
     [[nodiscard]] std::size_t hashOf(const Registration& registration) const {
-        const std::hash<std::string> hash;
         if (!allVersions_)
-            return hash(registration.identifier());
-        return hash(registration.identifier()) ^
-               hash(platform::numericEqualityKey(registration.exportedVersion()));
+            return registration.identifierHash();
+        return registration.identifierHash() ^
+               std::hash<std::string>()(
+                   platform::numericEqualityKey(registration.exportedVersion()));
     }
 
     [[nodiscard]] bool areRivals(const Registration& a, const Registration& b) const {
-        return a.identifier() == b.identifier() && (!allVersions_ || orderOf(a, b) == 0);
+        return a.identifierHash() == b.identifierHash() && a.identifier() == b.identifier() &&
+               (!allVersions_ || orderOf(a, b) == 0);
     }
 
     [[nodiscard]] static std::weak_ordering orderOf(const Registration& a, const Registration& b) {
