@@ -6,6 +6,7 @@
 #include "AppRegistry/ARStoreImpl.h"
 #include "AppRegistry/ARStoreRow.h"
 #include "platform/file/File.h"
+#include "platform/file/OwnershipTest.h"
 
 // Opening, checking, reading and setting aside the registry's database.
 
@@ -136,6 +137,18 @@ std::optional<std::string> setAside(const std::string& path) {
     return std::nullopt;
 }
 
+// What stands in the database is believed, entitlements above all: nobody else may have written it.
+std::optional<std::string> writableByOthers(const std::string& path) {
+    platform::OwnershipTest ownership;
+    for (const std::string& part : {folderOf(path), path, path + "-wal"}) {
+        const auto canonical = platform::canonicalPath(part);
+        auto refusal = canonical ? ownership.refusal(*canonical) : std::nullopt;
+        if (refusal)
+            return refusal;
+    }
+    return std::nullopt;
+}
+
 using OpenedStore = std::pair<std::unique_ptr<ARStore>, ARStore::Content>;
 
 std::expected<OpenedStore, ARStoreFailure> openAndLoad(const std::string& path) {
@@ -146,6 +159,12 @@ std::expected<OpenedStore, ARStoreFailure> openAndLoad(const std::string& path) 
     if (!content)
         return std::unexpected(content.error());
     return OpenedStore(std::move(*store), std::move(*content));
+}
+
+std::expected<OpenedStore, ARStoreFailure> openExisting(const std::string& path) {
+    if (auto refusal = writableByOthers(path))
+        return std::unexpected(ARStoreFailure{true, std::move(*refusal)});
+    return openAndLoad(path);
 }
 
 } // namespace
@@ -195,7 +214,7 @@ std::string ARDamagedStorePath(const std::string& path) {
 std::expected<OpenedStore, platform::Error> AROpenStore(const std::string& path) {
     if (auto error = platform::makeFolders(folderOf(path), 0755))
         return std::unexpected(std::move(*error));
-    auto opened = openAndLoad(path);
+    auto opened = ::access(path.c_str(), F_OK) == 0 ? openExisting(path) : openAndLoad(path);
     if (!opened && opened.error().damaged) {
         const std::string reason = opened.error().reason;
         if (const auto trouble = setAside(path)) {

@@ -14,7 +14,7 @@ namespace platform {
 // `descriptor` to become readable and then calls `handleEvents`; one thread at a time.
 class PathWatch {
 public:
-    // Symbolic links in the path are followed.
+    // Symbolic links in the path are followed; above what they lead to nothing is watched.
     explicit PathWatch(std::string path);
 
     // Non-blocking; -1 when this box has no descriptor to spare: then changes are not seen.

@@ -76,6 +76,20 @@ TEST_F(Damage, AnotherVersionIsSetAside) {
     expectRebuilt(open());
 }
 
+TEST_F(Damage, WhatOthersCouldHaveWrittenIsSetAside) {
+    const std::string folder = std::filesystem::path(database()).parent_path();
+    for (const std::string& part : {database(), folder}) {
+        SCOPED_TRACE(part);
+        closedDatabase();
+        const auto before = std::filesystem::status(part).permissions();
+        std::filesystem::permissions(part, std::filesystem::perms(0777));
+        const std::string log = open();
+        EXPECT_NE(log.find(part + " can be written by others"), std::string::npos) << log;
+        std::filesystem::permissions(part, before);
+        expectRebuilt(log);
+    }
+}
+
 TEST_F(Damage, MissingTablesAreNoticed) {
     closedDatabase();
     execute("DROP TABLE details");
