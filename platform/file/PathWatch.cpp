@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <string_view>
 #include <sys/inotify.h>
 #include <unistd.h>
 #include <utility>
@@ -58,14 +57,12 @@ void PathWatch::watch(const std::string& folder, const std::string& name) {
         known->second.clear(); // one folder by two ways
 }
 
-bool PathWatch::matters(const struct ::inotify_event& event) const {
-    if ((event.mask & IN_Q_OVERFLOW) != 0)
-        return true;
-    const auto watch = watches_.find(event.wd);
-    if (watch == watches_.end())
-        return false;
-    const std::string_view name = event.len > 0 ? event.name : ""; // none: the folder itself
-    return name.empty() || watch->second.empty() || name == watch->second;
+// An event without a name concerns the folder itself; one without a watch says that some were lost.
+bool PathWatch::matters(int watch, std::string_view name) const {
+    const auto watched = watches_.find(watch);
+    if (watched == watches_.end())
+        return watch < 0;
+    return name.empty() || watched->second.empty() || name == watched->second;
 }
 
 bool PathWatch::readEvents() {
@@ -74,7 +71,7 @@ bool PathWatch::readEvents() {
     for (ssize_t got; (got = ::read(inotify_.get(), room.data(), room.size())) > 0;) {
         for (std::size_t at = 0; at < static_cast<std::size_t>(got);) {
             const auto& event = *reinterpret_cast<const struct ::inotify_event*>(&room.at(at));
-            mattered = mattered || matters(event);
+            mattered = mattered || matters(event.wd, event.len > 0 ? event.name : "");
             at += sizeof event + event.len;
         }
     }

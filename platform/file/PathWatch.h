@@ -2,10 +2,9 @@
 
 #include <map>
 #include <string>
+#include <string_view>
 
 #include "platform/file/File.h"
-
-struct inotify_event;
 
 namespace platform {
 
@@ -29,7 +28,7 @@ private:
     void watchAll();
     void watch(const std::string& folder, const std::string& name);
     [[nodiscard]] bool readEvents();
-    [[nodiscard]] bool matters(const struct ::inotify_event& event) const;
+    [[nodiscard]] bool matters(int watch, std::string_view name) const;
 
     const std::string path_;
     UniqueFd inotify_;
