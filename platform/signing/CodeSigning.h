@@ -59,7 +59,7 @@ public:
     virtual ~CodeSigning() = default;
     [[nodiscard]] virtual std::unique_ptr<SigningTask>
     taskFor(std::shared_ptr<const ipc::Peer> peer) = 0;
-    // What the signature of a bundle grants, or why it grants nothing: about 0.1 ms of calculation,
+    // What the signature of a bundle grants, or why it grants nothing: about 0.2 ms of calculation,
     // and no file but the trusted keys. Any thread.
     [[nodiscard]] virtual std::expected<SignatureGrant, std::string>
     verifyBundle(const SignedBundle& bundle) = 0;
