@@ -8,6 +8,7 @@
 #include "Zephrin/ZPDLog.h"
 #include "Zephrin/ZPDaemonClient.h"
 #include "platform/probe/Probes.h"
+#include "platform/types/Types.h"
 #include "zpd/ZPDIpcClient.h"
 #include "zpd/ZPDServer.h"
 
@@ -48,6 +49,7 @@ void Transaction::dispatch() {
     }
     if (!client().acceptWork())
         return;
+    server().services().types.mayHaveChanged();
     ZPDLogOps().debug("client %d requested %{public}s", client().pid(), type_.value_or("(null)"));
     platform::probe::request(client().pid(), type_ ? std::string(*type_).c_str() : nullptr);
     route();

@@ -11,7 +11,7 @@ void DeclaredTypes::setBundleDeclarations(std::vector<Value> declarations) {
 }
 
 void DeclaredTypes::refresh() {
-    if (file_.refresh())
+    if (lookDue_.exchange(false) && file_.refresh())
         rebuild();
 }
 
@@ -31,7 +31,7 @@ bool DeclaredTypes::conforms(std::string_view type, std::string_view target) {
 }
 
 // True when a key that the type conforms to allows as many of it.
-bool DeclaredTypes::accepts(const Dictionary& rule, const DictionaryEntry& offered) const {
+bool DeclaredTypes::accepts(const Dictionary& rule, const DictionaryEntry& offered) {
     const auto count = offered.value.integerValue();
     if (!count || *count < 0)
         return false;

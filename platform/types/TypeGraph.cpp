@@ -1,6 +1,6 @@
 #include "platform/types/TypeGraph.h"
 
-#include <set>
+#include <utility>
 
 namespace platform {
 
@@ -31,6 +31,8 @@ void TypeGraph::addType(std::string_view type, const Value& declaration) {
     const Value* conformsTo = entry(declaration, "ConformsTo");
     if (!conformsTo)
         return;
+    reachable_.clear(); // its texts may move
+    remembered_ = 0;
     auto& parents = parents_[std::string(type)];
     const auto addParent = [&](const Value& parent) {
         if (const auto name = parent.string())
@@ -43,23 +45,35 @@ void TypeGraph::addType(std::string_view type, const Value& declaration) {
         addParent(parent);
 }
 
-bool TypeGraph::conforms(std::string_view type, std::string_view target) const {
-    std::set<std::string_view> seen{type};
+bool TypeGraph::conforms(std::string_view type, std::string_view target) {
+    if (type == target)
+        return true;
+    const auto declared = parents_.find(type);
+    return declared != parents_.end() && reachableFrom(declared->first).contains(target);
+}
+
+// The walk is made once for each type: rules may ask for thousands of targets.
+const TypeGraph::Types& TypeGraph::reachableFrom(std::string_view type) {
+    if (const auto known = reachable_.find(type); known != reachable_.end())
+        return known->second;
+    if (remembered_ > mostRemembered) {
+        reachable_.clear();
+        remembered_ = 0;
+    }
+    Types reached;
     std::vector<std::string_view> open{type};
     while (!open.empty()) {
-        const std::string_view next = open.back();
+        const auto found = parents_.find(open.back());
         open.pop_back();
-        if (next == target)
-            return true;
-        const auto found = parents_.find(next);
         if (found == parents_.end())
             continue;
         for (const std::string& parent : found->second) {
-            if (seen.insert(parent).second)
+            if (reached.insert(parent).second)
                 open.push_back(parent);
         }
     }
-    return false;
+    remembered_ += reached.size() + 1;
+    return reachable_.emplace(type, std::move(reached)).first->second;
 }
 
 } // namespace platform

@@ -17,6 +17,10 @@ public:
     // that bundles have no say in ignore them.
     virtual void setBundleDeclarations(std::vector<Value> /*declarations*/) {}
 
+    // Says that declarations may have changed by now: the next question looks. Until then answers
+    // are those of the last look, so that one request may compare with thousands of types.
+    virtual void mayHaveChanged() {}
+
     // True when `type` is `target` or conforms to it, directly or through others.
     [[nodiscard]] virtual bool conforms(std::string_view type, std::string_view target) = 0;
 

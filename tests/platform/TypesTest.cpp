@@ -61,11 +61,14 @@ TEST(DeclaredTypes, ComeFromTheFileAndFromBundles) {
                  *plist::writeXml(Dictionary{
                      {"TypeDeclarations",
                       Array{Dictionary{{"TypeIdentifier", "c"}, {"ConformsTo", Array{"d"}}}}}}));
+    EXPECT_FALSE(types.conforms("a", "d")) << "for the question at hand the file is as it was";
+    types.mayHaveChanged();
     EXPECT_TRUE(types.conforms("a", "d")) << "through both";
     types.setBundleDeclarations({});
     EXPECT_FALSE(types.conforms("a", "d"));
     EXPECT_TRUE(types.conforms("c", "d"));
     ASSERT_EQ(::chmod(file.c_str(), 0666), 0);
+    types.mayHaveChanged();
     EXPECT_FALSE(types.conforms("c", "d")) << "others could have written it";
 }
 
