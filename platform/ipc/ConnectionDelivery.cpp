@@ -12,6 +12,11 @@ namespace {
 // while others are served too, and twice as many each time that nobody else was, up to this.
 constexpr unsigned mostPerTurn = 32;
 
+// A client that was answered, and has nothing else waiting, may need this very processor to ask
+// again. One that has plenty waiting lets it: for so long, and then hands out so many.
+constexpr std::chrono::microseconds courtesyTime{50};
+constexpr unsigned leastAfterCourtesy = 8;
+
 // What becomes of a connection's requests while its handler runs on this thread: entered into the
 // books when the handler has returned, together. On the stack of who hands out.
 struct HandingOut {
@@ -102,7 +107,7 @@ void Connection::Impl::deliver(std::unique_lock<std::mutex>& lock) {
         if (onLoop && leftOfTurn-- == 0) {
             leftOfTurn = 0;
             if (!std::exchange(turnDue, true))
-                post(&Impl::takeTurn);
+                post(&Impl::nextTurn);
             break;
         }
         handOut(lock);
@@ -129,9 +134,9 @@ void Connection::Impl::handOut(std::unique_lock<std::mutex>& lock) {
 }
 
 // Replies to several requests that are answered within one turn go out together.
-void Connection::Impl::takeTurn() {
+void Connection::Impl::takeTurn(unsigned least) {
     const void* const before = std::exchange(loop.impl().lastServed, this);
-    perTurn = before == this ? std::min(perTurn * 2, mostPerTurn) : 1;
+    perTurn = before == this ? std::min(perTurn * 2, mostPerTurn) : least;
     bool together = false;
     {
         std::unique_lock lock(mutex);
@@ -141,9 +146,28 @@ void Connection::Impl::takeTurn() {
         if (together)
             outbox.gather();
         deliver(lock);
+        loop.impl().lastIsIdle = waiting.empty();
     }
     if (together && outbox.release() == Outbox::Outcome::waiting)
         writeRest();
+}
+
+void Connection::Impl::nextTurn() {
+    Loop::Impl& l = loop.impl();
+    if (l.lastServed == this || !l.lastIsIdle)
+        return takeTurn();
+    l.courteous.push_back(owner->weak_from_this());
+    if (l.courteous.size() > 1)
+        return;
+    l.courtesy.expires_after(courtesyTime);
+    l.courtesy.async_wait([&l](const asio::error_code& error) {
+        if (error)
+            return;
+        for (const auto& one : std::exchange(l.courteous, {})) {
+            if (const auto there = one.lock())
+                there->impl().takeTurn(leastAfterCourtesy);
+        }
+    });
 }
 
 void Connection::Impl::requestTaken() {

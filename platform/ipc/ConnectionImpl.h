@@ -63,7 +63,8 @@ struct Connection::Impl final : SocketWatch::Target {
     void handOut(std::unique_lock<std::mutex>& lock);
     void strikeOff(std::size_t requests, std::size_t cost);
     [[nodiscard]] bool mayDeliver() const;
-    void takeTurn(); // on the loop
+    void takeTurn(unsigned least = 1); // on the loop
+    void nextTurn();
 
     // Writing. `write` on any thread, the rest on the loop.
     void greet();

@@ -98,7 +98,7 @@ void Connection::Impl::takeFrames() {
         }
     }
     reader.keep();
-    if (took)
+    if (took && !turnDue) // else its turn comes
         takeTurn();
     if (ended || !socket)
         return;

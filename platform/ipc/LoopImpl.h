@@ -17,6 +17,8 @@
 
 namespace platform::ipc {
 
+class Connection;
+
 // What a loop is made of. For the sources that stand on Asio; owned by its Loop.
 //
 // Descriptors, timers and signals are touched on the loop's thread only (before it runs, on any
@@ -42,7 +44,12 @@ struct Loop::Impl {
     asio::steady_timer first{context};
     std::vector<std::unique_ptr<Signal>> signals;
     std::atomic<std::thread::id> runner;
-    const void* lastServed = nullptr; // whose requests had the last turn; on the loop
+    // Whose requests had the last turn, and whether all were handed out; on the loop.
+    const void* lastServed = nullptr;
+    bool lastIsIdle = false;
+    // Connections that let the last one go on first, and for how long; on the loop.
+    std::vector<std::weak_ptr<Connection>> courteous;
+    asio::steady_timer courtesy{context};
     // Sockets that are looked at again soon, and when; on the loop.
     std::vector<std::shared_ptr<SocketWatch::State>> unsure;
     asio::steady_timer secondLook{context};
