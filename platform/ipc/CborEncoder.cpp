@@ -33,6 +33,9 @@ void CborEncoder::head(Major major, std::uint64_t argument) {
 }
 
 void CborEncoder::shared(const SharedBytes& piece) {
+    constexpr std::size_t usualCuts = 4;
+    if (cuts_.empty())
+        cuts_.reserve(usualCuts);
     cuts_.push_back({out_.size(), &piece});
     sharedSize_ += piece.size();
 }

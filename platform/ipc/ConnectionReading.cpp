@@ -1,6 +1,8 @@
 #include <cerrno>
 #include <fcntl.h>
 #include <sys/socket.h>
+#include <sys/syscall.h>
+#include <unistd.h>
 #include <utility>
 
 #include "platform/ipc/Cbor.h"
@@ -50,7 +52,8 @@ Arrived readOnce(int socket, std::array<iovec, 2> room, pid_t pid) {
     message.msg_iovlen = held ? 2 : 1;
     message.msg_control = control.data();
     message.msg_controllen = CMSG_LEN(sizeof(ucred));
-    const ssize_t count = ::recvmsg(socket, &message, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
+    // Not the library's function: that one is made to be cancelled, at a price.
+    const ssize_t count = ::syscall(SYS_recvmsg, socket, &message, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
     const bool fromPeer = count > 0 && cameFrom(pid, message);
     return {count, fromPeer, fromPeer && !(message.msg_flags & MSG_CTRUNC)};
 }

@@ -4,6 +4,8 @@
 #include <cerrno>
 #include <climits>
 #include <sys/socket.h>
+#include <sys/syscall.h>
+#include <unistd.h>
 
 #include "platform/ipc/CborEncoder.h"
 
@@ -65,7 +67,8 @@ bool Outbox::write(std::span<iovec> parts, std::size_t& count) {
     message.msg_iovlen = parts.size();
     ssize_t sent = 0;
     do {
-        sent = ::sendmsg(descriptor_, &message, MSG_NOSIGNAL | MSG_DONTWAIT);
+        // Not the library's function: that one is made to be cancelled, at a price.
+        sent = ::syscall(SYS_sendmsg, descriptor_, &message, MSG_NOSIGNAL | MSG_DONTWAIT);
     } while (sent < 0 && errno == EINTR);
     if (sent < 0)
         return errno == EAGAIN || errno == ENOBUFS || errno == ENOMEM;

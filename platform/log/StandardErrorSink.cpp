@@ -1,5 +1,4 @@
 #include <cerrno>
-#include <cstdio>
 #include <ctime>
 #include <poll.h>
 #include <string>
@@ -52,11 +51,13 @@ private:
             const auto size = std::strftime(secondText_, sizeof secondText_, "%FT%T", &parts);
             secondText_[size] = '\0';
         }
-        const auto milliseconds = time % nanosecondsPerSecond / nanosecondsPerMillisecond;
-        char fraction[8];
-        std::snprintf(fraction, sizeof fraction, ".%03dZ", static_cast<int>(milliseconds));
+        const auto milliseconds =
+            static_cast<int>(time % nanosecondsPerSecond / nanosecondsPerMillisecond);
+        const auto digit = [](int number) { return static_cast<char>('0' + number % 10); };
+        const char fraction[] = {'.', digit(milliseconds / 100), digit(milliseconds / 10),
+                                 digit(milliseconds), 'Z'};
         text_ += secondText_;
-        text_ += fraction;
+        text_.append(fraction, sizeof fraction);
     }
 
     // Waits for a slow reader. What cannot be written at all is gone: there is nowhere to tell.
