@@ -45,6 +45,8 @@ public:
             executable = open(*files.executable, executableIsOwned);
         if (executable || !files.executable)
             all(files, executable);
+        if (executable && !result.refusal())
+            belonging(files);
     }
 
     Verification result;
@@ -62,6 +64,15 @@ private:
             return;
         if (info)
             result.checkInfo(hash(*info, BundleReader::largestInfo));
+    }
+
+    // A bundle may name an executable that lies elsewhere, behind a link.
+    void belonging(const SignedFiles& files) {
+        const bool same = SignedFiles::ofProgram(*files.executable).bundle == files.bundle;
+        result.check("A program that runs from the executable belongs to the bundle",
+                     same ? std::nullopt
+                          : std::optional(*files.executable + " does not belong to the bundle"),
+                     *files.bundle);
     }
 
     [[nodiscard]] bool signature(const std::string& path) {

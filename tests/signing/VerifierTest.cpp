@@ -143,6 +143,16 @@ TEST_F(VerifierTest, RefusesWhateverIsNotAsItWasSigned) {
     }
 }
 
+TEST_F(VerifierTest, RefusesABundleWhoseExecutableLiesElsewhere) {
+    const std::string tool = program("bin/tool");
+    fs::create_symlink(tool, bundle("Main.app", false) + "/Main");
+    const auto files = sign(SignedFiles::ofBundle(home_ / "Main.app").value());
+    ASSERT_EQ(files.executable, tool);
+    EXPECT_THAT(verifier_.bundle(files).refusal().value_or("granted"),
+                HasSubstr("does not belong"));
+    EXPECT_THAT(verifier_.program(tool).refusal().value_or("granted"), HasSubstr("not signed"));
+}
+
 TEST_F(VerifierTest, TakesNoFilesOfStrangers) {
     if (::geteuid() != 0)
         GTEST_SKIP() << "only root can give files away";
