@@ -1,12 +1,18 @@
 #include "platform/file/OwnershipTest.h"
 
 #include <cerrno>
+#include <fcntl.h>
 #include <system_error>
 #include <unistd.h>
+
+#include "platform/file/Mounts.h"
 
 namespace platform {
 
 namespace {
+
+// What the kernel knows by itself: no file system is asked before it is known whose it is.
+constexpr int withoutAsking = AT_SYMLINK_NOFOLLOW | AT_NO_AUTOMOUNT | AT_STATX_DONT_SYNC;
 
 std::string folderAbove(const std::string& path) {
     const auto slash = path.rfind('/');
@@ -14,9 +20,16 @@ std::string folderAbove(const std::string& path) {
 }
 
 std::optional<std::string> ownRefusal(const std::string& path) {
-    struct ::stat status = {};
-    if (::lstat(path.c_str(), &status) != 0)
+    struct ::statx seen = {};
+    if (::statx(AT_FDCWD, path.c_str(), withoutAsking, STATX_BASIC_STATS | STATX_MNT_ID, &seen) !=
+        0)
         return path + ": " + std::generic_category().message(errno);
+    const bool mounted = (seen.stx_attributes & STATX_ATTR_MOUNT_ROOT) != 0 && path != "/";
+    if (mounted && isServedByProgram(seen.stx_mnt_id))
+        return path + " is a file system that a program serves";
+    struct ::stat status = {};
+    status.st_uid = seen.stx_uid;
+    status.st_mode = seen.stx_mode;
     return OwnershipTest::refusalOf(status, path);
 }
 

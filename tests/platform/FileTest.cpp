@@ -9,6 +9,7 @@
 
 #include <gtest/gtest.h>
 
+#include "platform/file/Mounts.h"
 #include "platform/file/OwnershipTest.h"
 #include "tests/platform/TestFolder.h"
 
@@ -144,6 +145,16 @@ TEST(OwnershipTest, RefusesWhatOthersCanChange) {
     }
     EXPECT_TRUE(OwnershipTest().refusal(folder / "missing"));
     EXPECT_TRUE(OwnershipTest().refusal("relative"));
+}
+
+TEST(Mounts, ThatProgramsServeAreToldByTheirType) {
+    const std::string_view info = "27 1 254:0 / / rw - ext4 /dev/vda rw\n"
+                                  "270 27 0:40 / /tmp/a\\040-\\040x rw,nosuid shared:3 - fuse.sshfs a rw\n"
+                                  "28 27 0:41 / /b rw - tmpfs fuse rw\n";
+    const std::pair<std::uint64_t, bool> cases[] = {
+        {27, false}, {270, true}, {28, false}, {2, true}, {29, true}};
+    for (const auto& [mount, served] : cases)
+        EXPECT_EQ(isServedByProgram(mount, info), served) << mount;
 }
 
 TEST(OwnershipTest, RefusesWhatBelongsToAnotherUser) {
