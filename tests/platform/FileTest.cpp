@@ -148,9 +148,10 @@ TEST(OwnershipTest, RefusesWhatOthersCanChange) {
 }
 
 TEST(Mounts, ThatProgramsServeAreToldByTheirType) {
-    const std::string_view info = "27 1 254:0 / / rw - ext4 /dev/vda rw\n"
-                                  "270 27 0:40 / /tmp/a\\040-\\040x rw,nosuid shared:3 - fuse.sshfs a rw\n"
-                                  "28 27 0:41 / /b rw - tmpfs fuse rw\n";
+    const std::string_view info =
+        "27 1 254:0 / / rw - ext4 /dev/vda rw\n"
+        "270 27 0:40 / /tmp/a\\040-\\040x rw,nosuid shared:3 - fuse.sshfs a rw\n"
+        "28 27 0:41 / /b rw - tmpfs fuse rw\n";
     const std::pair<std::uint64_t, bool> cases[] = {
         {27, false}, {270, true}, {28, false}, {2, true}, {29, true}};
     for (const auto& [mount, served] : cases)
