@@ -2,9 +2,13 @@
 
 include(GNUInstallDirs)
 
-set(CMAKE_INSTALL_RPATH "$ORIGIN/../${CMAKE_INSTALL_LIBDIR}")
-
+# Programs find the library from where they lie themselves, also in the build tree. A path that is
+# edited when it is installed would end in an empty element until then, which the loader takes for
+# the working directory.
 function(zephrin_install_program target)
+  set_target_properties(${target} PROPERTIES
+    BUILD_WITH_INSTALL_RPATH ON
+    INSTALL_RPATH "$ORIGIN/../${CMAKE_INSTALL_LIBDIR};$ORIGIN/../lib")
   install(TARGETS ${target} RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
 endfunction()
 

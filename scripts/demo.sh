@@ -212,6 +212,7 @@ write_entitlements "$home/manager.plist"
 run 0 cat "$home/manager.plist"
 # Not executable by everybody: who may run it could steer it.
 run 0 install -D -m 750 "$build/bin/zpctl" "$ZEPHRIN_HOME/bin/zpctl-manager"
+run 0 install -D -m 644 "$build"/lib/libZephrin.so.0 "$ZEPHRIN_HOME/lib/libZephrin.so.0"
 run 0 zpctl sign --key "$home/keys/zephrin.key.pem" --entitlements "$home/manager.plist" \
     "$ZEPHRIN_HOME/bin/zpctl-manager"
 run 0 "$ZEPHRIN_HOME/bin/zpctl-manager" match --flags 0x200
