@@ -132,8 +132,8 @@ bool ARPass::readAgain(const ARCandidate& candidate, const ARBundleRow* known) {
     }
     complaints_.forget(std::string(candidate.path));
     if (known && ARHasSameContent(before, {content->row.stamps, content->digests})) {
-        refresh(*known, candidate, content->row.stamps);
         keepSignature(known->id, *content);
+        refresh(*known, candidate, content->row.stamps); // which may free what was known
         return true;
     }
     enlist(std::move(*content), candidate, known);
