@@ -1,13 +1,12 @@
 #include <cerrno>
 #include <fcntl.h>
 #include <sys/socket.h>
-#include <sys/syscall.h>
-#include <unistd.h>
 #include <utility>
 
 #include "platform/ipc/Cbor.h"
 #include "platform/ipc/ConnectionImpl.h"
 #include "platform/ipc/IpcLog.h"
+#include "platform/ipc/SocketCalls.h"
 
 namespace platform::ipc {
 
@@ -52,8 +51,7 @@ Arrived readOnce(int socket, std::array<iovec, 2> room, pid_t pid) {
     message.msg_iovlen = held ? 2 : 1;
     message.msg_control = control.data();
     message.msg_controllen = CMSG_LEN(sizeof(ucred));
-    // Not the library's function: that one is made to be cancelled, at a price.
-    const ssize_t count = ::syscall(SYS_recvmsg, socket, &message, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
+    const ssize_t count = receiveMessage(socket, message, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
     const bool fromPeer = count > 0 && cameFrom(pid, message);
     return {count, fromPeer, fromPeer && !(message.msg_flags & MSG_CTRUNC)};
 }

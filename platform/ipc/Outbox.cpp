@@ -4,10 +4,9 @@
 #include <cerrno>
 #include <climits>
 #include <sys/socket.h>
-#include <sys/syscall.h>
-#include <unistd.h>
 
 #include "platform/ipc/CborEncoder.h"
+#include "platform/ipc/SocketCalls.h"
 
 namespace platform::ipc {
 
@@ -67,8 +66,7 @@ bool Outbox::write(std::span<iovec> parts, std::size_t& count) {
     message.msg_iovlen = parts.size();
     ssize_t sent = 0;
     do {
-        // Not the library's function: that one is made to be cancelled, at a price.
-        sent = ::syscall(SYS_sendmsg, descriptor_, &message, MSG_NOSIGNAL | MSG_DONTWAIT);
+        sent = sendMessage(descriptor_, message, MSG_NOSIGNAL | MSG_DONTWAIT);
     } while (sent < 0 && errno == EINTR);
     if (sent < 0)
         return errno == EAGAIN || errno == ENOBUFS || errno == ENOMEM;
