@@ -6,12 +6,13 @@
 #include <optional>
 #include <system_error>
 
+#include "platform/value/Hex.h"
+
 namespace platform::log {
 
 namespace {
 
 constexpr std::string_view privateText = "<private>";
-constexpr char hexDigits[] = "0123456789abcdef";
 
 struct Directive {
     std::string_view text; // from "%" to the conversion
@@ -74,8 +75,7 @@ void appendEscapedByte(std::string& out, char c) {
         return;
     default:
         out += "\\x";
-        out += hexDigits[static_cast<unsigned char>(c) >> 4];
-        out += hexDigits[c & 0x0f];
+        appendHex(out, static_cast<unsigned char>(c));
     }
 }
 

@@ -12,22 +12,17 @@
 
 #include "platform/file/File.h"
 #include "platform/sandbox/Confinement.h"
+#include "platform/value/Hex.h"
 
 namespace platform {
 
 namespace {
 
 constexpr std::string_view tokenVersion = "zsx1";
-constexpr char hexDigits[] = "0123456789abcdef";
 
 bool standsForItself(char c) {
     return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') ||
            std::string_view("-._~/").find(c) != std::string_view::npos;
-}
-
-void appendHex(std::string& out, unsigned char byte) {
-    out += hexDigits[byte >> 4];
-    out += hexDigits[byte & 0x0f];
 }
 
 void appendEncoded(std::string& out, std::string_view text) {

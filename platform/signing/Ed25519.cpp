@@ -10,6 +10,7 @@
 #include <openssl/x509.h>
 
 #include "platform/digest/Sha256.h"
+#include "platform/value/Hex.h"
 
 namespace platform {
 
@@ -57,12 +58,9 @@ const unsigned char* bytesOf(std::string_view text) {
 }
 
 std::string hexadecimal(const Sha256Digest& digest) {
-    constexpr char digits[] = "0123456789abcdef";
     std::string text;
-    for (const std::uint8_t byte : digest) {
-        text += digits[byte >> 4];
-        text += digits[byte & 0x0f];
-    }
+    for (const std::uint8_t byte : digest)
+        appendHex(text, byte);
     return text;
 }
 

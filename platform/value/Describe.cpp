@@ -1,5 +1,6 @@
 #include <cstdio>
 
+#include "platform/value/Hex.h"
 #include "platform/value/Value.h"
 
 namespace platform {
@@ -27,16 +28,13 @@ void appendReal(std::string& out, double number) {
 }
 
 void appendData(std::string& out, const Data& data) {
-    static constexpr char digits[] = "0123456789abcdef";
     const std::string_view bytes = data.bytes.view();
     out += "<data ";
     out += std::to_string(bytes.size());
     out += " bytes:";
     for (const char c : bytes.substr(0, shownDataBytes)) {
-        const auto byte = static_cast<unsigned char>(c);
         out += ' ';
-        out += digits[byte >> 4];
-        out += digits[byte & 0x0f];
+        appendHex(out, static_cast<unsigned char>(c));
     }
     if (bytes.size() > shownDataBytes)
         out += " ...";
