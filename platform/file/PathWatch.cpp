@@ -29,6 +29,7 @@ PathWatch::PathWatch(std::string path)
 // missed.
 void PathWatch::watchAll() {
     const auto before = std::exchange(watches_, {});
+    complete_ = static_cast<bool>(inotify_);
     std::string folder = path_.starts_with('/') ? "/" : ".";
     for (std::size_t begin = 0, end = 0; end < path_.size(); begin = end + 1) {
         end = std::min(path_.find('/', begin), path_.size());
@@ -48,6 +49,7 @@ void PathWatch::watchAll() {
 void PathWatch::watch(const std::string& folder, const std::string& name) {
     const int number = ::inotify_add_watch(inotify_.get(), folder.c_str(), changes | IN_ONLYDIR);
     if (number < 0) {
+        complete_ = complete_ && (errno == ENOENT || errno == ENOTDIR);
         if (errno == ENOSPC)
             log::defaultLog().error("cannot watch %{public}s: %{errno}d", folder, errno);
         return;

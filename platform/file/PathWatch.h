@@ -19,6 +19,9 @@ public:
     // Non-blocking; -1 when this box has no descriptor to spare: then changes are not seen.
     [[nodiscard]] int descriptor() const { return inotify_.get(); }
 
+    // False when the box refused a watch: then not all changes are seen.
+    [[nodiscard]] bool complete() const { return complete_; }
+
     // Takes up what happened since the last call. Tells whether the path, a folder above it or
     // what lies in it may be another one now, or belong to somebody else: perhaps so without need,
     // but never not when it is.
@@ -34,7 +37,8 @@ private:
     UniqueFd inotify_;
     // By number of the watch the one name that matters in its folder; empty where all do.
     std::map<int, std::string> watches_;
-    bool present_ = false; // whether there was anything at the path
+    bool present_ = false;  // whether there was anything at the path
+    bool complete_ = false; // whether there is a watch on all that is there
 };
 
 } // namespace platform
