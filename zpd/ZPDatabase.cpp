@@ -5,6 +5,7 @@
 #include "Zephrin/Collections.h"
 #include "Zephrin/ZPDError.h"
 #include "Zephrin/ZPDLog.h"
+#include "Zephrin/ZPNotificationObserver.h"
 #include "platform/locale/Locale.h"
 #include "platform/notify/Notifications.h"
 #include "zpd/AnnotationKeys.h"
@@ -305,7 +306,7 @@ std::optional<Error> ZPDatabase::setAnnotation(const std::optional<Dictionary>& 
 }
 
 void ZPDatabase::notifyAnnotationChange() {
-    platform_.notifications.post(annotationChangeNotification);
+    platform_.notifications.post(ZPNotificationObserver::annotationChange);
 }
 
 // Any election but 0 stands, a negative one too; 0 is no choice.

@@ -43,8 +43,6 @@ public:
     using PlugIns = ZPDKnownAnswers::PlugIns;
 
     static constexpr std::uint32_t defaultCacheLimit = 1'000'000;
-    static constexpr const char* annotationChangeNotification =
-        "com.tovana.zephrin.annotation-change";
 
     // `databasePath` is the annotation store's; without one it is at its usual place.
     ZPDatabase(const Platform& platform, const std::optional<std::string>& databasePath);
