@@ -21,7 +21,8 @@ struct Transaction::RequestType {
 };
 
 const Transaction::RequestType Transaction::requestTypes[] = {
-    {"match", &Transaction::matchPlugIns},
+    {"add", &Transaction::addPlugIns},   {"remove", &Transaction::removePlugIns},
+    {"bulk", &Transaction::bulkPlugIns}, {"match", &Transaction::matchPlugIns},
     {"find", &Transaction::findPlugIn},
 };
 
@@ -33,10 +34,18 @@ Transaction::Transaction(platform::ipc::Message request, std::shared_ptr<ZPDIpcC
       version_(unsignedFor("version")),
       type_(stringFor("request")) {}
 
-Transaction::~Transaction() = default;
+Transaction::~Transaction() {
+    if (leftOpen_)
+        request_.ticket.takenOnLoop();
+}
 
 ZPDServer& Transaction::server() const {
     return client_->server();
+}
+
+void Transaction::leaveOpen() {
+    server().assertOnServiceQueue();
+    leftOpen_ = true;
 }
 
 void Transaction::dispatch() {

@@ -6,6 +6,7 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <sys/types.h>
 
 #include "platform/ipc/Message.h"
 #include "platform/value/Error.h"
@@ -23,7 +24,7 @@ struct ReplyForm;
 // handler may finish it on another one.
 //
 // Each handler ends its transaction once, with `done` or one of the `fail` operations, and does not
-// touch the reply afterwards.
+// touch the reply afterwards. One that is not done when it returns has left it open (leaveOpen).
 class Transaction : public std::enable_shared_from_this<Transaction> {
 public:
     Transaction(platform::ipc::Message request, std::shared_ptr<ZPDIpcClient> client);
@@ -57,6 +58,15 @@ public:
 
     // The same, but the next one comes in on the loop.
     void takenOnLoop() { request_.ticket.takenOnLoop(); }
+
+    // For a handler that finishes its work elsewhere, as nothing that may take long runs on the
+    // service queue: the connection's next request is taken up only when nobody holds this
+    // transaction any more. So each client's requests are carried out in its order, and nobody
+    // else waits.
+    // REQUIRES: on the service queue
+    void leaveOpen();
+
+    [[nodiscard]] bool isLeftOpen() const { return leftOpen_; }
 
     // Gets each path with whether it could be resolved (then it is canonical, else as received),
     // and tells whether to go on; when not, it has failed the transaction.
@@ -94,6 +104,21 @@ private:
     void route();
     [[nodiscard]] bool marshalPath(const platform::Value& entry, const PathBlock& block);
 
+    // ---- zpd/requests/Registration.cpp
+    void addPlugIns();
+    void removePlugIns();
+    void bulkPlugIns();
+    [[nodiscard]] bool addPlugIn(const std::string& path, bool resolved);
+
+    struct RemovalRight {
+        bool granted = false;
+        pid_t pid = 0; // of the client when it asked
+    };
+
+    [[nodiscard]] bool removePlugIn(const RemovalRight& right, const std::string& path,
+                                    bool resolved);
+    [[nodiscard]] bool hasPathToWalk() const;
+
     // ---- zpd/requests/Discovery.cpp
     void matchPlugIns();
     [[nodiscard]] bool mayDiscoverAll() const;
@@ -113,4 +138,5 @@ private:
     const std::shared_ptr<platform::ipc::Connection> connection_;
     const std::uint64_t version_;
     const std::optional<std::string_view> type_; // in the request
+    bool leftOpen_ = false;
 };

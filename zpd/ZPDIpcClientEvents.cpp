@@ -22,6 +22,8 @@ namespace {
 // A client that sends one brief request after the other goes on upon the loop, where all clients
 // take turns, also when one of them had to wait for the queue's own thread.
 void letNextIn(Transaction& transaction, bool wasBrief) {
+    if (transaction.isLeftOpen())
+        return;
     if (wasBrief)
         transaction.takenOnLoop();
     else
@@ -79,7 +81,7 @@ void ZPDIpcClient::prepared(std::shared_ptr<Transaction> transaction) {
 void ZPDIpcClient::submit(std::shared_ptr<Transaction> transaction) {
     const bool brief = transaction->isBrief();
     if (brief && server_.tryWork([&] { carryOut(*transaction); }))
-        return transaction->taken();
+        return letNextIn(*transaction, false);
     server_.submitWork([transaction] { transaction->client().carryOut(*transaction); },
                        [transaction, brief] { letNextIn(*transaction, brief); });
 }

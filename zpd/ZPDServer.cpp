@@ -21,6 +21,7 @@ ZPDServer::ZPDServer(const Platform& platform, const Settings& settings)
       userPrefs_(platform.preferences),
       syncQueue_("serverSync", platform::QueueRank::leaf),
       ipcLoop_("ipc"),
+      registrationQueue_("registration", platform::QueueRank::service),
       mainQueue_("service", platform::QueueRank::service) {
     theServer = this;
     setDelegate(this);

@@ -28,6 +28,8 @@ class ZPDIpcClient;
 //   "ipc"         the loop (a thread of its own) of the listener and all connections; it makes
 //                 clients and transactions and never waits
 //   "service"     every request of every client, one at a time, in the order of arrival
+//   "registration"  what "add" and "remove" take long for; of the rank of "service", and neither
+//                 waits for the other
 //   "serverSync"  a leaf: every access to the holds, always entered synchronously
 //
 // Made and destroyed on the main thread. The platform's services outlive it; it outlives its
@@ -82,6 +84,9 @@ public:
 
     void assertOnServiceQueue() const { mainQueue_.assertOnQueue(); }
 
+    // Where "add" and "remove" go on after they left the service queue. Any thread.
+    [[nodiscard]] platform::SerialQueue& registrationQueue() { return registrationQueue_; }
+
     // ---- Holds (ZPDServerHolds.cpp). Any thread.
 
     [[nodiscard]] bool holdOnPlugIn(const ZPDPlugIn& plugIn);
@@ -112,6 +117,7 @@ private:
     ZPDPreparations preparations_;
     platform::SerialQueue syncQueue_;
     platform::ipc::Loop ipcLoop_;
+    platform::SerialQueue registrationQueue_; // the next one hands on to it
     platform::SerialQueue mainQueue_;
     std::unique_ptr<platform::ipc::Listener> service_;
 };
