@@ -65,3 +65,8 @@ struct ARBundleRow {
     ARStamps stamps;
     std::vector<platform::SharedBytes> points; // keys for the extension point index
 };
+
+// True for what the folders do not tell: a plug-in that was registered or unregistered by path.
+[[nodiscard]] inline bool ARIsRegisteredByPath(const ARBundleRow& row) {
+    return row.kind == ARKind::plugIn && row.presence != ARPresence::found;
+}

@@ -29,45 +29,69 @@ ARPass::ARPass(ARStore& store, ARModel& model, ARComplaints& complaints, ARGrant
       number_(model.beginPass()),
       batchBegan_(std::chrono::steady_clock::now()) {}
 
-void ARPass::run(const platform::Places& places) {
+void ARPass::run(const platform::Places& places, const ARKeptPaths::Paths& kept) {
+    keptAway_.insert(kept.withdrawn.begin(), kept.withdrawn.end());
     scanner_.scan(places);
     presence_ = ARPresence::added;
     const auto elsewhere = model_.pick([&](const ARModel::Entry& entry) {
-        return entry.seen != number_ && entry.row->presence == ARPresence::added;
+        return entry.seen != number_ && entry.row->kind == ARKind::plugIn &&
+               entry.row->presence == ARPresence::added;
     });
     for (const ARRowPtr& row : elsewhere)
-        scanner_.scanBundle(row->kind, std::string(row->path.view()));
+        bring(std::string(row->path.view()));
+    for (const std::string& path : kept.added)
+        bring(path);
     removeUnseen();
+    removeIdleApplications();
     flush();
 }
 
-std::optional<std::string> ARPass::add(const std::string& path) {
-    presence_ = ARPresence::added;
+// ---- Registration by path
+
+std::optional<std::string> ARPass::add(const std::string& path, const platform::Places& places) {
+    asked_ = true;
+    presence_ = scanner_.reaches(path, places) ? ARPresence::found : ARPresence::added;
     lastRefusal_ = "it is not a plug-in";
-    const std::string_view application = ARApplicationPathOf(path);
-    if (!application.empty())
-        scanner_.scanBundle(ARKind::application, std::string(application));
-    const ARModel::Entry* known = model_.find(path);
-    if (known && known->row->presence == ARPresence::withdrawn)
-        remove(known->row);
-    scanner_.scanBundle(ARKind::plugIn, path);
-    flush();
-    const ARModel::Entry* entry = model_.find(path);
-    if (entry && entry->seen == number_)
-        return std::nullopt;
+    if (bring(path))
+        return flushAsked();
+    batch_ = {};
+    takeBack();
     return lastRefusal_;
 }
 
-bool ARPass::withdraw(const std::string& path) {
+bool ARPass::bring(const std::string& path) {
+    const std::string application(ARApplicationPathOf(path));
+    if (!application.empty() && !meet(ARKind::application, application))
+        return false;
+    return meet(ARKind::plugIn, path);
+}
+
+bool ARPass::meet(ARKind kind, const std::string& path) {
+    scanner_.scanBundle(kind, path);
+    const ARModel::Entry* entry = model_.find(path);
+    return entry && entry->seen == number_;
+}
+
+std::optional<std::string> ARPass::withdraw(const std::string& path) {
     const ARModel::Entry* entry = model_.find(path);
     if (!entry || entry->row->kind != ARKind::plugIn ||
         entry->row->presence == ARPresence::withdrawn)
-        return false;
-    ARBundleRow row = *entry->row;
-    row.presence = ARPresence::withdrawn;
-    replace(std::move(row));
-    flush();
-    return true;
+        return "not registered";
+    if (entry->row->presence == ARPresence::found) {
+        ARBundleRow row = *entry->row;
+        row.presence = ARPresence::withdrawn;
+        replace(std::move(row));
+    } else {
+        remove(entry->row);
+    }
+    removeIdleApplications();
+    return flushAsked();
+}
+
+std::optional<std::string> ARPass::flushAsked() {
+    if (flush())
+        return std::nullopt;
+    return "it could not be stored";
 }
 
 // ---- What the scanner comes upon
@@ -81,24 +105,30 @@ bool ARPass::found(const ARCandidate& candidate) {
         return false;
     }
     bool there = true;
-    if (entry && unchanged(candidate, *entry->row)) {
+    if (entry && unchanged(candidate, *entry->row) && !comesBack(*entry->row)) {
         keep(candidate, *entry);
     } else {
         there = readAgain(candidate, entry ? entry->row.get() : nullptr);
     }
     flushWhenDue();
     // Of an application that was added for one plug-in the others stay unknown.
-    return there && presence_ == ARPresence::found;
+    return there && presence_ == ARPresence::found && !asked_;
 }
 
+// Clients can ask for any number of paths: what became of those is not remembered.
 void ARPass::refused(const std::string& path, const std::string& reason) {
     lastRefusal_ = reason;
-    complaints_.report(path, reason);
+    if (!asked_)
+        complaints_.report(path, reason);
 }
 
 void ARPass::unreadable(const std::string& path, const std::string& reason) {
     unreadable_.push_back(path);
     refused(path, reason);
+}
+
+bool ARPass::comesBack(const ARBundleRow& row) const {
+    return asked_ && row.presence == ARPresence::withdrawn;
 }
 
 bool ARPass::unchanged(const ARCandidate& candidate, const ARBundleRow& row) const {
@@ -115,7 +145,9 @@ void ARPass::keep(const ARCandidate& candidate, ARModel::Entry& entry) {
     entry.seen = number_;
     const bool placeholder =
         candidate.kind == ARKind::application && files_.isPlaceholder(candidate);
-    if (placeholder != entry.row->placeholder)
+    const bool cameUpon =
+        presence_ == ARPresence::found && entry.row->presence == ARPresence::added;
+    if (placeholder != entry.row->placeholder || cameUpon)
         refresh(*entry.row, candidate, entry.row->stamps);
 }
 
@@ -131,7 +163,8 @@ bool ARPass::readAgain(const ARCandidate& candidate, const ARBundleRow* known) {
         return false;
     }
     complaints_.forget(std::string(candidate.path));
-    if (known && ARHasSameContent(before, {content->row.stamps, content->digests})) {
+    if (known && !comesBack(*known) &&
+        ARHasSameContent(before, {content->row.stamps, content->digests})) {
         keepSignature(known->id, *content);
         refresh(*known, candidate, content->row.stamps); // which may free what was known
         return true;
@@ -142,13 +175,21 @@ bool ARPass::readAgain(const ARCandidate& candidate, const ARBundleRow* known) {
 
 // ---- Changes
 
+ARPresence ARPass::presenceOf(const ARCandidate& candidate, const ARBundleRow* old) {
+    if (old && old->presence == ARPresence::found)
+        return ARPresence::found; // what the folders lead to stays theirs
+    const bool isKeptAway = !asked_ && candidate.kind == ARKind::plugIn && !old &&
+                            keptAway_.erase(std::string(candidate.path)) > 0;
+    return isKeptAway ? ARPresence::withdrawn : presence_;
+}
+
 void ARPass::enlist(ARBundleContent&& content, const ARCandidate& candidate,
                     const ARBundleRow* old) {
     ARBundleRow& row = content.row;
     row.id = model_.takeId();
     row.uuid = platform::Uuid::random();
     row.registered = now();
-    row.presence = presence_;
+    row.presence = presenceOf(candidate, old);
     row.placeholder = row.kind == ARKind::application && files_.isPlaceholder(candidate);
     if (old) {
         row.originalIdentifier = old->originalIdentifier;
@@ -156,7 +197,9 @@ void ARPass::enlist(ARBundleContent&& content, const ARCandidate& candidate,
     }
     keepSignature(row.id, content);
     const auto shared = std::make_shared<const ARBundleRow>(std::move(row));
+    remember(shared->path.view());
     model_.put(shared).seen = number_;
+    batch_.pathsChanged |= ARIsRegisteredByPath(*shared);
     batch_.changes.added.push_back({*shared, content.digests, platform::ipc::encode(content.info)});
     batch_.added.push_back(shared);
     batch_.visible = true;
@@ -165,6 +208,8 @@ void ARPass::enlist(ARBundleContent&& content, const ARCandidate& candidate,
 void ARPass::refresh(const ARBundleRow& old, const ARCandidate& candidate, const ARStamps& stamps) {
     ARBundleRow row = old;
     row.stamps = stamps;
+    if (presence_ == ARPresence::found && row.presence == ARPresence::added)
+        row.presence = ARPresence::found;
     row.placeholder = row.kind == ARKind::application && files_.isPlaceholder(candidate);
     replace(std::move(row));
 }
@@ -179,7 +224,11 @@ void ARPass::keepSignature(std::int64_t id, const ARBundleContent& content) {
 void ARPass::replace(ARBundleRow&& row) {
     const auto shared = std::make_shared<const ARBundleRow>(std::move(row));
     const ARBundleRow& old = *model_.find(shared->path.view())->row;
-    const bool visible = old.placeholder != shared->placeholder || old.presence != shared->presence;
+    const bool visible =
+        old.placeholder != shared->placeholder ||
+        (old.presence == ARPresence::withdrawn) != (shared->presence == ARPresence::withdrawn);
+    batch_.pathsChanged |= old.kind == ARKind::plugIn && old.presence != shared->presence;
+    remember(shared->path.view());
     model_.put(shared).seen = number_;
     batch_.changes.updated.push_back(*shared);
     if (!visible)
@@ -189,7 +238,9 @@ void ARPass::replace(ARBundleRow&& row) {
 }
 
 void ARPass::remove(ARRowPtr row) {
+    remember(row->path.view());
     model_.remove(row->path.view());
+    batch_.pathsChanged |= ARIsRegisteredByPath(*row);
     grants_.forget(row->path.view());
     batch_.changes.removed.push_back(row->id);
     batch_.removed.push_back(std::move(row));
@@ -206,6 +257,25 @@ void ARPass::removeUnseen() {
     }
 }
 
+// An application that no folder leads to is there for its plug-ins.
+void ARPass::removeIdleApplications() {
+    const auto added = model_.pick([](const ARModel::Entry& entry) {
+        return entry.row->kind == ARKind::application && entry.row->presence == ARPresence::added;
+    });
+    for (const ARRowPtr& row : added) {
+        if (!hasPlugIns(row->path.view()))
+            remove(row);
+    }
+}
+
+bool ARPass::hasPlugIns(std::string_view application) const {
+    const auto within = model_.pick([&](const ARModel::Entry& entry) {
+        return entry.row->kind == ARKind::plugIn && entry.row->presence != ARPresence::withdrawn &&
+               ARApplicationPathOf(entry.row->path.view()) == application;
+    });
+    return !within.empty();
+}
+
 bool ARPass::maybeThere(std::string_view path) const {
     return std::ranges::any_of(unreadable_, [&](const std::string& folder) {
         return path == folder || liesBelow(path, folder);
@@ -213,12 +283,30 @@ bool ARPass::maybeThere(std::string_view path) const {
 }
 
 void ARPass::flushWhenDue() {
-    if (std::chrono::steady_clock::now() - batchBegan_ >= longestBatch)
+    if (!asked_ && std::chrono::steady_clock::now() - batchBegan_ >= longestBatch)
         flush();
 }
 
-void ARPass::flush() {
-    if (!batch_.empty())
-        apply_(std::exchange(batch_, {}));
+bool ARPass::flush() {
+    const bool accepted = batch_.empty() || apply_(std::exchange(batch_, {}));
+    if (!accepted)
+        takeBack();
+    before_.clear();
     batchBegan_ = std::chrono::steady_clock::now();
+    return accepted;
+}
+
+void ARPass::remember(std::string_view path) {
+    const ARModel::Entry* const entry = model_.find(path);
+    before_.push_back({std::string(path), entry ? std::optional(*entry) : std::nullopt});
+}
+
+void ARPass::takeBack() {
+    for (auto before = before_.rbegin(); before != before_.rend(); ++before) {
+        if (before->entry)
+            model_.put(before->entry->row).seen = before->entry->seen;
+        else
+            model_.remove(before->path);
+    }
+    before_.clear();
 }

@@ -22,11 +22,12 @@ ARRegistry::open(platform::Places places, platform::Locale& locale,
     if (!opened)
         return std::unexpected(std::move(opened.error()));
     const std::shared_ptr<ARStore> store = std::move(opened->first);
+    const bool isComplete = opened->second.complete;
     const std::shared_ptr<ARProxyContext> context(
         new ARProxyContext{locale, containers, ARInfoCache(store), ARGrants(store, signing), {}});
     std::unique_ptr<ARRegistry> registry(
         new ARRegistry(std::move(places), store, std::move(opened->second), context, types));
-    registry->queue_.sync([&] { registry->firstPass(); });
+    registry->queue_.sync([&] { registry->firstPass(isComplete); });
     registry->queue_.async([store] { store->checkpoint(); });
     return registry;
 }
@@ -38,6 +39,8 @@ ARRegistry::ARRegistry(platform::Places places, std::shared_ptr<ARStore> store,
       store_(std::move(store)),
       context_(std::move(context)),
       types_(types),
+      committer_(store_),
+      keptPaths_(ARKeptPathsFile(places_.registryDatabase)),
       editor_(places_, context_),
       knowledge_(content.knowledge) {
     model_.fill(std::move(content.rows));
@@ -52,22 +55,45 @@ ARRegistry::~ARRegistry() {
 
 // ---- On the queue
 
-void ARRegistry::firstPass() {
-    ARPass pass(*store_, model_, complaints_, context_->grants,
-                [this](ARBatch&& batch) { store(batch); });
-    pass.run(places_);
+template <class Act, class Apply>
+auto ARRegistry::pass(Act&& act, Apply&& apply) {
+    ARPass pass(*store_, model_, complaints_, context_->grants, std::forward<Apply>(apply));
+    return act(pass);
+}
+
+// A new database learns from the file beside it what the folders do not tell, and is complete only
+// then: what a crash left behind half made counts as new again.
+void ARRegistry::firstPass(bool isComplete) {
+    const ARKeptPaths::Paths kept = keptPaths_.read();
+    pass([&](ARPass& pass) { pass.run(places_, isComplete ? ARKeptPaths::Paths() : kept); },
+         [this](ARBatch&& batch) {
+             store(batch);
+             return true;
+         });
+    keptPaths_.keep(model_);
+    if (!isComplete)
+        committer_.markComplete();
     publish(editor_.build(model_.pick([](const ARModel::Entry&) { return true; })));
     declareTypes();
 }
 
+ARKnowledge ARRegistry::knowledgeAfter(const ARBatch& batch) const {
+    if (!batch.visible)
+        return knowledge_;
+    return {platform::Uuid::random(), knowledge_.sequence + 1};
+}
+
 void ARRegistry::store(ARBatch& batch) {
-    if (batch.visible) {
-        knowledge_.uuid = platform::Uuid::random();
-        ++knowledge_.sequence;
-    }
-    batch.changes.knowledge = knowledge_;
-    if (const auto error = store_->commit(batch.changes))
-        ARLog().error("the registry database cannot be written: %{public}@", *error);
+    knowledge_ = batch.changes.knowledge = knowledgeAfter(batch);
+    committer_.commit(std::move(batch.changes));
+}
+
+bool ARRegistry::storeNow(ARBatch& batch) {
+    const ARKnowledge next = batch.changes.knowledge = knowledgeAfter(batch);
+    if (committer_.commitNow(std::move(batch.changes)))
+        return false;
+    knowledge_ = next;
+    return true;
 }
 
 void ARRegistry::storeLearntGrants() {
@@ -76,8 +102,10 @@ void ARRegistry::storeLearntGrants() {
     store(batch);
 }
 
-void ARRegistry::applyLive(ARBatch&& batch) {
-    store(batch);
+// What is stored is shown to readers, and then to the observer.
+void ARRegistry::show(const ARBatch& batch) {
+    if (batch.pathsChanged)
+        keptPaths_.keep(model_);
     auto next = std::make_shared<ARSnapshot>(*context_->published.get());
     const auto outcome = editor_.apply(*next, batch);
     publish(std::move(next));
@@ -112,37 +140,41 @@ void ARRegistry::declareTypes() {
 
 void ARRegistry::rescan() {
     queue_.sync([this] {
-        ARPass pass(*store_, model_, complaints_, context_->grants,
-                    [this](ARBatch&& batch) { applyLive(std::move(batch)); });
-        pass.run(places_);
+        pass([this](ARPass& pass) { pass.run(places_); },
+             [this](ARBatch&& batch) {
+                 store(batch);
+                 show(batch);
+                 return true;
+             });
     });
+}
+
+template <class Act>
+std::optional<platform::Error> ARRegistry::carryOut(const std::string& path, Act&& act) {
+    const std::optional<std::string> refusal = queue_.sync([&] {
+        return pass(std::forward<Act>(act), [this](ARBatch&& batch) {
+            if (!storeNow(batch))
+                return false;
+            show(batch);
+            return true;
+        });
+    });
+    if (!refusal)
+        return std::nullopt;
+    return platform::Error{&ARErrorDomain, registrationRefused, path + ": " + *refusal};
 }
 
 std::optional<platform::Error> ARRegistry::registerPlugin(std::string_view path) {
     const auto canonical = platform::canonicalPath(path);
     if (!canonical)
         return platform::posixError(canonical.error(), std::string(path));
-    const auto reason = queue_.sync([&] {
-        ARPass pass(*store_, model_, complaints_, context_->grants,
-                    [this](ARBatch&& batch) { applyLive(std::move(batch)); });
-        return pass.add(*canonical);
-    });
-    if (!reason)
-        return std::nullopt;
-    return platform::Error{&ARErrorDomain, registrationRefused, *canonical + ": " + *reason};
+    return carryOut(*canonical, [&](ARPass& pass) { return pass.add(*canonical, places_); });
 }
 
 std::optional<platform::Error> ARRegistry::unregisterPlugin(std::string_view path) {
     // A bundle that vanished goes by the path that it had.
     const std::string known = platform::canonicalPath(path).value_or(std::string(path));
-    const bool done = queue_.sync([&] {
-        ARPass pass(*store_, model_, complaints_, context_->grants,
-                    [this](ARBatch&& batch) { applyLive(std::move(batch)); });
-        return pass.withdraw(known);
-    });
-    if (done)
-        return std::nullopt;
-    return platform::Error{&ARErrorDomain, registrationRefused, known + ": not registered"};
+    return carryOut(known, [&](ARPass& pass) { return pass.withdraw(known); });
 }
 
 void ARRegistry::setObserver(ARWorkspaceObserver* observer) {

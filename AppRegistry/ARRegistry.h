@@ -6,7 +6,9 @@
 #include <string>
 
 #include "AppRegistry/ARApplicationWorkspace.h"
+#include "AppRegistry/ARCommitter.h"
 #include "AppRegistry/ARComplaints.h"
+#include "AppRegistry/ARKeptPaths.h"
 #include "AppRegistry/ARModel.h"
 #include "AppRegistry/ARProxyContext.h"
 #include "AppRegistry/ARSnapshotEditor.h"
@@ -62,10 +64,20 @@ private:
     ARRegistry(platform::Places places, std::shared_ptr<ARStore> store, ARStore::Content content,
                std::shared_ptr<ARProxyContext> context, platform::Types& types);
 
-    void firstPass();
+    // What one pass does on the queue, with its batches handed to `apply`.
+    template <class Act, class Apply>
+    auto pass(Act&& act, Apply&& apply);
+
+    void firstPass(bool isComplete);
+    // The batch with the knowledge after it.
+    [[nodiscard]] ARKnowledge knowledgeAfter(const ARBatch& batch) const;
     void store(ARBatch& batch);
+    [[nodiscard]] bool storeNow(ARBatch& batch);
     void storeLearntGrants();
-    void applyLive(ARBatch&& batch);
+    void show(const ARBatch& batch);
+    // Registers or unregisters: what was asked for is stored before anybody sees it.
+    template <class Act>
+    [[nodiscard]] std::optional<platform::Error> carryOut(const std::string& path, Act&& act);
     void publish(std::shared_ptr<ARSnapshot> snapshot);
     void declareTypes();
 
@@ -77,6 +89,8 @@ private:
     std::atomic<std::uint64_t> publishedSequence_ = 0; // of the snapshot that is published
 
     // On the queue.
+    ARCommitter committer_;
+    ARKeptPaths keptPaths_;
     ARModel model_;
     ARComplaints complaints_;
     ARSnapshotEditor editor_;

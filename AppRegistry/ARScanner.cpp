@@ -1,5 +1,6 @@
 #include "AppRegistry/ARScanner.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <system_error>
 
@@ -32,6 +33,15 @@ void ARScanner::scan(const platform::Places& places) {
         scanFolder(ARKind::application, folder);
     for (const std::string& folder : places.plugInFolders)
         scanFolder(ARKind::plugIn, folder);
+}
+
+bool ARScanner::reaches(std::string_view plugInPath, const platform::Places& places) const {
+    const std::string_view application = ARApplicationPathOf(plugInPath);
+    const bool alone = application.empty();
+    const std::string_view folder = ARFolderOf(alone ? plugInPath : application);
+    return std::ranges::any_of(
+        alone ? places.plugInFolders : places.applicationFolders,
+        [&](const std::string& watched) { return platform::canonicalPath(watched) == folder; });
 }
 
 void ARScanner::scanFolder(ARKind kind, const std::string& folder) {

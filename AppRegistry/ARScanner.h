@@ -30,6 +30,9 @@ public:
 
     void scan(const platform::Places& places);
     void scanFolder(ARKind kind, const std::string& folder);
+    // True when scanning comes upon the plug-in with this canonical path, unless only links lead
+    // there.
+    [[nodiscard]] bool reaches(std::string_view plugInPath, const platform::Places& places) const;
     // One bundle, and the plug-ins in it.
     void scanBundle(ARKind kind, const std::string& path);
 

@@ -9,6 +9,8 @@ namespace {
 
 const platform::ErrorDomain databaseErrorDomain{"SQLite"}; // codes are SQLite's
 
+constexpr int longLog = 256; // pages
+
 constexpr const char* insertEntrySql =
     "INSERT INTO entries (id, kind, presence, placeholder, types, uuid, path, identifier, original,"
     " bundle, version, executable, registered, stamps, points)"
@@ -34,6 +36,12 @@ std::optional<ARDigests> digestsIn(std::string_view bytes) {
 template <class E>
 std::int64_t number(E e) {
     return static_cast<std::int64_t>(e);
+}
+
+std::optional<platform::Error> errorOf(int code) {
+    if (code == SQLITE_OK)
+        return std::nullopt;
+    return platform::Error{&databaseErrorDomain, code, sqlite3_errstr(code)};
 }
 
 } // namespace
@@ -141,18 +149,33 @@ ARStore::ARStore(std::unique_ptr<Impl> impl) : impl_(std::move(impl)) {}
 
 ARStore::~ARStore() = default;
 
-std::optional<platform::Error> ARStore::commit(const ARStoreChanges& changes) {
-    int code = impl_->begin.run();
-    if (code == SQLITE_OK) {
-        code = impl_->write(changes);
-        if (code == SQLITE_OK)
-            code = impl_->end.run();
-        if (code != SQLITE_OK)
-            static_cast<void>(impl_->rollback.run());
-    }
+int ARStore::Impl::write(std::span<const ARStoreChanges> changes) {
+    int code = begin.run();
+    if (code != SQLITE_OK)
+        return code;
+    for (auto each = changes.begin(); each != changes.end() && code == SQLITE_OK; ++each)
+        code = write(*each);
     if (code == SQLITE_OK)
-        return std::nullopt;
-    return platform::Error{&databaseErrorDomain, code, sqlite3_errstr(code)};
+        code = end.run();
+    if (code != SQLITE_OK)
+        static_cast<void>(rollback.run());
+    return code;
+}
+
+std::optional<platform::Error> ARStore::commit(std::span<const ARStoreChanges> changes,
+                                               ARDurability durability) {
+    const bool synced = durability == ARDurability::box;
+    int code = synced ? impl_->writer.execute(ARSyncedCommits) : SQLITE_OK;
+    if (code == SQLITE_OK)
+        code = impl_->write(changes);
+    if (synced)
+        static_cast<void>(impl_->writer.execute(ARUnsyncedCommits));
+    return errorOf(code);
+}
+
+std::optional<platform::Error> ARStore::markComplete() {
+    static const std::string sql = "PRAGMA application_id = " + std::to_string(ARCompleteMark);
+    return errorOf(impl_->writer.execute(sql.c_str()));
 }
 
 std::optional<ARDigests> ARStore::digests(std::int64_t id) {
@@ -169,6 +192,7 @@ void ARStore::checkpoint() {
     sqlite3_wal_checkpoint_v2(impl_->writer.handle(), nullptr, SQLITE_CHECKPOINT_PASSIVE, nullptr,
                               nullptr);
     sqlite3_db_release_memory(impl_->writer.handle());
+    sqlite3_wal_autocheckpoint(impl_->writer.handle(), longLog);
 }
 
 std::optional<std::string> ARStore::info(std::int64_t id) const {

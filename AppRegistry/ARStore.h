@@ -4,6 +4,7 @@
 #include <expected>
 #include <memory>
 #include <optional>
+#include <span>
 #include <string>
 #include <utility>
 #include <vector>
@@ -39,6 +40,9 @@ struct ARStoreChanges {
     }
 };
 
+// What a commit that has returned has withstood: the end of the process, or also that of the box.
+enum class ARDurability : std::uint8_t { process, box };
+
 // Why a database could not be used. Damage (also a database of another version) is healed by
 // setting it aside; anything else is not the database's fault.
 struct ARStoreFailure {
@@ -55,6 +59,7 @@ public:
     struct Content {
         std::vector<ARBundleRow> rows; // in order of registration
         ARKnowledge knowledge;
+        bool complete = false; // see markComplete
     };
 
     // Opens or makes the database, checks that it is whole, and prepares everything.
@@ -63,10 +68,16 @@ public:
     ~ARStore();
 
     [[nodiscard]] std::expected<Content, ARStoreFailure> load();
-    [[nodiscard]] std::optional<platform::Error> commit(const ARStoreChanges& changes);
+    // All of them, in this order, or none.
+    [[nodiscard]] std::optional<platform::Error> commit(std::span<const ARStoreChanges> changes,
+                                                        ARDurability durability);
+    // Everything is in it that the folders and the file beside it tell: a pass over a new database
+    // came to its end.
+    [[nodiscard]] std::optional<platform::Error> markComplete();
     // What the files of an entry hashed to when they were read.
     [[nodiscard]] std::optional<ARDigests> digests(std::int64_t id);
-    // Brings what was committed from the log into the database file.
+    // Brings what was committed from the log into the database file, as does from here on every
+    // commit that finds the log long.
     void checkpoint();
 
     // The encoded info dictionary of an entry; nothing when it is gone or cannot be read.

@@ -5,6 +5,14 @@
 #include "AppRegistry/ARSql.h"
 #include "AppRegistry/ARStore.h"
 
+// Commits in the log need no sync to be whole after a crash. A synced one brings those before it to
+// the disk as well.
+inline constexpr const char* ARUnsyncedCommits = "PRAGMA synchronous = NORMAL";
+inline constexpr const char* ARSyncedCommits = "PRAGMA synchronous = FULL";
+
+// In the header of a database that is complete, where it is told that it is this system's ("zprc").
+inline constexpr std::int64_t ARCompleteMark = 0x7a707263;
+
 // The database's connections and statements, for the sources of ARStore alone. Statements are
 // declared after the connection that they belong to, so that they go first.
 struct ARStore::Impl {
@@ -14,6 +22,7 @@ struct ARStore::Impl {
     [[nodiscard]] int prepared() const;
 
     // Parts of one transaction. Each gives SQLite's result code.
+    [[nodiscard]] int write(std::span<const ARStoreChanges> changes);
     [[nodiscard]] int write(const ARStoreChanges& changes);
     [[nodiscard]] int insert(const ARNewEntry& entry);
     [[nodiscard]] int update(const ARBundleRow& row);

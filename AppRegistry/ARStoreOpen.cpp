@@ -42,7 +42,7 @@ constexpr const char* version2 =
     "COMMIT;";
 constexpr const char* upgrades[schemaVersion] = {version1, version2}; // each from the one before
 
-// In the log, commits need no sync to be whole after a crash; checkpoints are made by the registry.
+// The first checkpoint is made by the registry, once it has looked at everything.
 constexpr const char* writerSettings =
     "PRAGMA page_size = 8192; PRAGMA journal_mode = WAL; PRAGMA synchronous = NORMAL;"
     "PRAGMA wal_autocheckpoint = 0; PRAGMA journal_size_limit = 1048576;";
@@ -197,6 +197,8 @@ std::expected<ARStore::Content, ARStoreFailure> ARStore::load() {
     }
     if (code != SQLITE_DONE)
         return std::unexpected(failure(code));
+    const auto mark = firstNumber(impl_->writer, "PRAGMA application_id");
+    content.complete = mark && *mark == ARCompleteMark;
     ARSqlStatement known(impl_->writer, "SELECT sequence, uuid FROM knowledge WHERE id = 1");
     if (known.step() != SQLITE_ROW)
         return std::unexpected(ARStoreFailure{true, "its state is missing"});
