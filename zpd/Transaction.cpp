@@ -21,8 +21,12 @@ struct Transaction::RequestType {
 };
 
 const Transaction::RequestType Transaction::requestTypes[] = {
-    {"add", &Transaction::addPlugIns},   {"remove", &Transaction::removePlugIns},
-    {"bulk", &Transaction::bulkPlugIns}, {"match", &Transaction::matchPlugIns},
+    {"add", &Transaction::addPlugIns},
+    {"remove", &Transaction::removePlugIns},
+    {"bulk", &Transaction::bulkPlugIns},
+    {"match", &Transaction::matchPlugIns},
+    {"annotate", &Transaction::annotatePlugIns},
+    {"bulk-annotate", &Transaction::bulkAnnotatePlugIns},
     {"find", &Transaction::findPlugIn},
 };
 
@@ -50,6 +54,7 @@ void Transaction::leaveOpen() {
 
 void Transaction::dispatch() {
     server().assertOnServiceQueue();
+    changesBefore_ = server().annotationChanges();
     if (!supportsVersion(version_)) {
         return fail(ZPDErrorCode::version,
                     ZPDErrorMakeFormat(ZPDErrorCode::version,

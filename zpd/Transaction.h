@@ -76,8 +76,15 @@ public:
     // The same, and then done.
     bool processPaths(const PathBlock& block);
 
+    // Gets each plug-in and tells whether to go on; when not, it has failed the transaction.
+    using PlugInBlock = std::function<bool(const std::shared_ptr<ZPDPlugIn>& plugIn)>;
+    // Walks "uuids", with "paths" for what is not found. False when the transaction has failed;
+    // what the block did before stands. REQUIRES: on the service queue
+    [[nodiscard]] bool processUuidList(const PlugInBlock& block);
+
     // Puts a converted result under "matches"; without one the key is left out.
     void setMatches(std::optional<platform::Value> matches);
+    // Sends the reply; once they are on disk when the request changed annotations.
     void done();
     void fail(std::uint64_t code, std::string_view message);
     // One of our own errors goes out as it is; another's text goes out with `code`.
@@ -103,6 +110,7 @@ private:
     [[nodiscard]] static const RequestType* known(std::string_view type);
     void route();
     [[nodiscard]] bool marshalPath(const platform::Value& entry, const PathBlock& block);
+    void send(const platform::ipc::Reply& reply);
 
     // ---- zpd/requests/Registration.cpp
     void addPlugIns();
@@ -128,8 +136,24 @@ private:
     [[nodiscard]] std::shared_ptr<ZPDPlugIn> requestedPlugIn() const;
     [[nodiscard]] std::shared_ptr<ZPDPlugIn> findPlugInByUUID(const platform::Uuid& uuid) const;
     [[nodiscard]] std::shared_ptr<ZPDPlugIn> findPlugInByPathURL(std::string_view url) const;
+    [[nodiscard]] std::shared_ptr<ZPDPlugIn> findPlugInByPath(const std::string& path) const;
+
+    // ---- zpd/requests/UuidList.cpp
+    [[nodiscard]] std::shared_ptr<ZPDPlugIn> listedPlugIn(const platform::Uuid& uuid,
+                                                          const platform::Value* path) const;
 
     // ---- zpd/requests/Annotation.cpp
+    void annotatePlugIns();
+    void bulkAnnotatePlugIns();
+    // These fail the transaction when they answer nothing, or false.
+    [[nodiscard]] const platform::Dictionary* requestedAnnotations();
+    [[nodiscard]] std::optional<platform::Dictionary>
+    annotationChange(const platform::Dictionary& requested);
+    [[nodiscard]] bool annotate(const ZPDPlugIn& plugIn, const platform::Dictionary& change);
+    [[nodiscard]] bool mayAllBeStored(const platform::Dictionary& extensions);
+    [[nodiscard]] bool bulkAnnotate(std::string_view uuidText, const platform::Value& extension);
+    // False when the annotation would grow too large.
+    [[nodiscard]] bool store(const ZPDPlugIn& plugIn, const platform::Dictionary& annotation);
     [[nodiscard]] bool pluginShouldBeAutoEnabled(const ZPDPlugIn& plugIn) const;
 
     platform::ipc::Message request_;
@@ -139,4 +163,6 @@ private:
     const std::uint64_t version_;
     const std::optional<std::string_view> type_; // in the request
     bool leftOpen_ = false;
+    std::uint64_t changesBefore_ = 0; // of the annotations, when it was dispatched
+    bool annotates_ = false;          // also when it stores what is stored already
 };

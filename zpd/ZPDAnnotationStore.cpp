@@ -1,5 +1,6 @@
 #include "zpd/ZPDAnnotationStore.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <unistd.h>
 
@@ -31,10 +32,12 @@ constexpr const char* storeFile = "/Zephrin-Annotations";
 constexpr const char* olderContainer = "com.tovana.zpd";
 constexpr unsigned globalFolderMode = 0755;
 
-// All annotations together are at most 16 MiB in their compact encoding; XML takes more.
-constexpr std::size_t largestStore = 128U << 20;
-// An annotation came over the wire, which nests this deep, and stands three levels down.
-constexpr std::size_t deepestStore = 64 + 3;
+// XML may take so many bytes for one of the wire's encoding: arrays within arrays do, or an exact
+// date very near to 1970. What was accepted must be read again, whatever it was.
+constexpr std::size_t mostXmlPerByte = 40;
+constexpr std::size_t largestStore = ZPDAnnotationStore::mostTogether * mostXmlPerByte;
+// An annotation stands two levels down.
+constexpr std::size_t deepestStore = ZPDAnnotationStore::deepestAnnotation + 2;
 
 std::expected<Dictionary, Error> readStore(const std::string& path) {
     auto content = platform::readRegularFile(path, largestStore);
@@ -69,6 +72,53 @@ std::optional<Error> probed(const std::string& path, std::optional<Error> failur
 bool isMissingFile(const Error& error) {
     return error.domain == &platform::fileErrorDomain &&
            error.code == platform::fileErrorNoSuchFile;
+}
+
+std::size_t encodedSize(const Dictionary& annotation) {
+    return platform::ipc::encode(annotation).size();
+}
+
+std::size_t sizeOf(std::string_view key, const Dictionary& annotation) {
+    return key.size() + encodedSize(annotation);
+}
+
+bool isAtMostSoDeep(const Value& value, std::size_t levels) {
+    if (!value.array() && !value.dictionary())
+        return true;
+    if (levels == 0)
+        return false;
+    if (const platform::Array* const array = value.array()) {
+        return std::ranges::all_of(
+            *array, [&](const Value& item) { return isAtMostSoDeep(item, levels - 1); });
+    }
+    return std::ranges::all_of(*value.dictionary(), [&](const DictionaryEntry& entry) {
+        return isAtMostSoDeep(entry.value, levels - 1);
+    });
+}
+
+// Equal in every kind, too: 1, 1.0 and true are equal numbers, but each is stored as it came.
+bool isSame(const Value& a, const Value& b) {
+    if (a.kind() != b.kind())
+        return false;
+    if (const platform::Array* const array = a.array()) {
+        return array->begin() == b.array()->begin() ||
+               std::ranges::equal(*array, *b.array(), isSame);
+    }
+    if (const Dictionary* const dictionary = a.dictionary()) {
+        return dictionary->sameObject(*b.dictionary()) ||
+               std::ranges::equal(*dictionary, *b.dictionary(),
+                                  [](const DictionaryEntry& x, const DictionaryEntry& y) {
+                                      return x.key == y.key && isSame(x.value, y.value);
+                                  });
+    }
+    return a == b;
+}
+
+bool holds(const Dictionary& stored, const Dictionary& changes) {
+    return std::ranges::all_of(changes, [&](const DictionaryEntry& change) {
+        const Value* const there = stored.find(change.key.view());
+        return there && isSame(*there, change.value);
+    });
 }
 
 template <class Keep>
@@ -148,7 +198,7 @@ void ZPDAnnotationStore::migrate() {
     if (!older || probed(*older, loadDb(*older)))
         return;
     ZPDLogOps().info("migrating shared annotations");
-    if (const auto failure = saveDb()) {
+    if (const auto failure = saveDb(path_, annotations_)) {
         ZPDLogOps().error("unable to save migrated annotations to %{public}@ error:%{public}@",
                           fileURLFromPath(path_), *failure);
     }
@@ -159,6 +209,9 @@ std::optional<Error> ZPDAnnotationStore::loadDb(const std::string& path) {
     if (!loaded)
         return loaded.error();
     annotations_ = entriesThat(*loaded, [](const Value& entry) { return entry.dictionary(); });
+    size_ = 0;
+    for (const DictionaryEntry& entry : annotations_)
+        size_ += sizeOf(entry.key.view(), *entry.value.dictionary());
     ++changes_;
     return std::nullopt;
 }
@@ -182,21 +235,26 @@ void ZPDAnnotationStore::prepareFolder(bool usualPlace) const {
 
 // One annotation that a property list cannot hold must not keep all the others from the disk: it
 // alone is left out, and reported.
-std::optional<Error> ZPDAnnotationStore::saveDb() {
+std::optional<Error> ZPDAnnotationStore::saveDb(const std::string& path,
+                                                const Dictionary& annotations) {
     std::optional<Error> failure;
-    auto text = storeText(annotations_);
+    auto text = storeText(annotations);
     if (!text) {
         failure = text.error();
-        text = storeText(entriesThat(annotations_, [](const Value& entry) {
+        text = storeText(entriesThat(annotations, [](const Value& entry) {
             return platform::plist::writeXml(entry).has_value();
         }));
         if (!text)
             return text.error();
     }
-    if (auto unwritten = platform::writeFileAtomically(path_, *text))
+    if (auto unwritten = platform::writeFileAtomically(path, *text))
         return unwritten;
-    unsaved_ = false;
     return failure;
+}
+
+ZPDAnnotationStore::Snapshot ZPDAnnotationStore::snapshot() {
+    handedOut_ = annotations_;
+    return {annotations_, changes_};
 }
 
 // ---- Annotations
@@ -210,36 +268,46 @@ std::optional<Dictionary> ZPDAnnotationStore::annotationForPlugIn(const ZPDPlugI
     return annotationForIdentifier(plugIn.annotationKey());
 }
 
-void ZPDAnnotationStore::setAnnotation(const std::optional<Dictionary>& annotation,
-                                       const ZPDPlugIn& plugIn) {
-    const std::string_view key = plugIn.annotationKey();
-    if (annotation) {
-        add(key, *annotation);
-    } else if (annotations_.contains(key)) {
-        annotations_.remove(key);
-        changed();
-    }
-    if (!unsaved_)
-        return;
-    if (const auto failure = saveDb()) {
-        ZPDLogOps().error("unable to save annotations:%{public}@ error:%{public}@",
-                          fileURLFromPath(path_), *failure);
-    }
+std::optional<Error> ZPDAnnotationStore::setAnnotation(const std::optional<Dictionary>& annotation,
+                                                       const ZPDPlugIn& plugIn) {
+    if (annotation)
+        return add(plugIn.annotationKey(), *annotation);
+    remove(plugIn.annotationKey());
+    return std::nullopt;
 }
 
 // An annotation that does not change stays the same object, so that forms made with it stand.
-void ZPDAnnotationStore::add(std::string_view key, const Dictionary& changes) {
+std::optional<Error> ZPDAnnotationStore::add(std::string_view key, const Dictionary& changes) {
     const auto stored = annotationForIdentifier(key);
+    if (stored && holds(*stored, changes))
+        return std::nullopt;
     Dictionary merged = stored.value_or(Dictionary());
     for (const DictionaryEntry& change : changes)
         merged.set(change.key, change.value);
-    if (stored == merged)
-        return;
+    const std::size_t before = stored ? sizeOf(key, *stored) : 0;
+    const std::size_t size = encodedSize(merged);
+    if (size > largestAnnotation)
+        return ZPDErrorMake(ZPDErrorCode::badAnnotation, "the annotation would be too large");
+    const std::size_t together = size_ - before + key.size() + size;
+    if (together > mostTogether && together > size_)
+        return ZPDErrorMake(ZPDErrorCode::badAnnotation, "all annotations would be too large");
     annotations_.set(key, std::move(merged));
-    changed();
+    size_ = together;
+    ++changes_;
+    return std::nullopt;
 }
 
-void ZPDAnnotationStore::changed() {
+void ZPDAnnotationStore::remove(std::string_view key) {
+    const auto stored = annotationForIdentifier(key);
+    if (!stored)
+        return;
+    annotations_.remove(key);
+    size_ -= sizeOf(key, *stored);
     ++changes_;
-    unsaved_ = true;
+}
+
+bool ZPDAnnotationStore::canHold(const Dictionary& annotation) {
+    return encodedSize(annotation) <= largestAnnotation &&
+           isAtMostSoDeep(annotation, deepestAnnotation) &&
+           platform::plist::writeXml(annotation).has_value();
 }

@@ -39,6 +39,9 @@ ZPDServer::~ZPDServer() {
     service_.reset();
     ipcLoop_.stop(); // from here on no client calls in
     preparations_.close();
+    mainQueue_.sync([] {});
+    registrationQueue_.sync([] {});
+    closeAnnotations(); // the last requests are answered while the loop is still there
     setDelegate(nullptr);
     theServer = nullptr;
 }
@@ -65,6 +68,7 @@ void ZPDServer::resume() {
 void ZPDServer::stop() {
     service_->cancel();
     releaseAllHolds();
+    closeAnnotations();
 }
 
 // Runs on the IPC loop.

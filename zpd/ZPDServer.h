@@ -62,7 +62,8 @@ public:
 
     // Begins to accept clients.
     void resume();
-    // Accepts no more clients and releases all holds. Any thread.
+    // Accepts no more clients, releases all holds and waits for what is being saved. From then on
+    // nothing is saved, and no request that would need it is answered. REQUIRES: no queue is held
     void stop();
 
     // ---- Requests (ZPDServerWork.cpp)

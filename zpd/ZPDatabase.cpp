@@ -35,7 +35,9 @@ ZPDatabase::ZPDatabase(const Platform& platform, const std::optional<std::string
     : platform_(platform),
       context_{platform.workspace, platform.sandbox, platform.types, *this, keys_},
       annotations_(databasePath, platform.containers),
-      sync_("ZPDatabase", platform::QueueRank::leaf) {
+      sync_("ZPDatabase", platform::QueueRank::leaf),
+      saver_(annotations_.annotationsPath(), annotations_.changes(),
+             [this] { return sync_.sync([this] { return annotations_.snapshot(); }); }) {
     platform_.workspace.setObserver(this);
     platform_.locale.observeChanges([this] { localeChanged(); });
 }
@@ -301,8 +303,7 @@ std::optional<Dictionary> ZPDatabase::annotationForPlugIn(const ZPDPlugIn& plugI
 
 std::optional<Error> ZPDatabase::setAnnotation(const std::optional<Dictionary>& annotation,
                                                const ZPDPlugIn& plugIn) {
-    sync_.sync([&] { annotations_.setAnnotation(annotation, plugIn); });
-    return std::nullopt;
+    return sync_.sync([&] { return annotations_.setAnnotation(annotation, plugIn); });
 }
 
 void ZPDatabase::notifyAnnotationChange() {
@@ -316,6 +317,7 @@ void ZPDatabase::autoElect(const ZPDPlugIn& plugIn) {
     const Value* const election = stored.find(AnnotationKey::election);
     if (election && election->integerValue().value_or(0) != 0)
         return;
-    annotations_.setAnnotation(dictionaryChanging(stored, AnnotationKey::election, elected),
-                               plugIn);
+    if (const auto failure = annotations_.setAnnotation(
+            dictionaryChanging(stored, AnnotationKey::election, elected), plugIn))
+        ZPDLogOps().error("cannot elect %{public}@: %{public}@", plugIn, *failure);
 }

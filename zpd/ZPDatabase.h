@@ -7,6 +7,7 @@
 #include <string>
 #include <string_view>
 #include <unordered_map>
+#include <utility>
 #include <vector>
 
 #include "AppRegistry/ARApplicationWorkspace.h"
@@ -15,6 +16,7 @@
 #include "platform/value/Uuid.h"
 #include "platform/value/Value.h"
 #include "zpd/Platform.h"
+#include "zpd/ZPDAnnotationSaver.h"
 #include "zpd/ZPDAnnotationStore.h"
 #include "zpd/ZPDKeyPool.h"
 #include "zpd/ZPDKnownAnswers.h"
@@ -87,13 +89,24 @@ public:
 
     [[nodiscard]] std::optional<platform::Dictionary>
     annotationForPlugIn(const ZPDPlugIn& plugIn) override;
-    // Merges and saves; never an error. Tells nobody: see notifyAnnotationChange.
+    // Merges, in memory; an error when the annotation would grow too large, never one of saving.
+    // Saves nothing by itself, and tells nobody: see whenAnnotationsSaved, notifyAnnotationChange.
     std::optional<platform::Error>
     setAnnotation(const std::optional<platform::Dictionary>& annotation, const ZPDPlugIn& plugIn);
     void notifyAnnotationChange();
 
-    // A number that is another one after each change of an annotation. Any thread.
+    // A number that grows with each change of an annotation. Any thread.
     [[nodiscard]] std::uint64_t annotationChanges() const { return annotations_.changes(); }
+
+    // Whether all changes up to this one are on disk, or saving them has failed. Any thread.
+    [[nodiscard]] bool areAnnotationsSaved(std::uint64_t change) const {
+        return saver_.isSettled(change);
+    }
+
+    // Runs the block when that is so, on the queue "annotations", and sees to it. Any thread.
+    void whenAnnotationsSaved(std::uint64_t change, platform::SerialQueue::Block block) {
+        saver_.whenSaved(change, std::move(block));
+    }
 
     // Elects a plug-in that has no election yet.
     // REQUIRES: on the database queue
@@ -101,6 +114,9 @@ public:
 
 protected:
     [[nodiscard]] const Platform& platformServices() const { return platform_; }
+
+    // Saves what is left of the annotations; from then on nothing. REQUIRES: no queue is held
+    void closeAnnotations() { saver_.close(); }
 
 private:
     void pluginsDidInstall(const std::vector<ARZephrinProxy::Ptr>& plugIns) override;
@@ -138,5 +154,6 @@ private:
     std::unordered_map<platform::Uuid, ZPDPlugIn::Ptr> cache_;
     ZPDKnownAnswers answers_;
     std::uint64_t dropped_ = 0;  // how often records left the cache
-    platform::SerialQueue sync_; // last: its blocks use all of the above
+    platform::SerialQueue sync_; // its blocks use all of the above
+    ZPDAnnotationSaver saver_;   // last: it enters the queue
 };

@@ -50,6 +50,11 @@ struct StoreTest : testing::Test {
         return ZPDAnnotationStore(path, world.platform.containers);
     }
 
+    // What whoever owns a store does after changes.
+    void save(ZPDAnnotationStore& store) {
+        ASSERT_EQ(ZPDAnnotationStore::saveDb(path, store.snapshot().annotations), std::nullopt);
+    }
+
     void write(std::string_view content) { folder.write("annotations", content); }
 
     void writeOlder(std::string_view content) {
@@ -86,23 +91,55 @@ TEST_F(StoreTest, MergesAndSavesWhatIsSet) {
     store.setAnnotation(Dictionary{{"election", 0}, {"more", Array{1}}}, *plugIn);
     const Dictionary merged{{"election", 0}, {"note", "x"}, {"more", Array{1}}};
     EXPECT_EQ(store.annotationForPlugIn(*plugIn), merged);
+    save(store);
     EXPECT_EQ(saved(), savedWith({{sampleKey, merged},
                                   {"com.example.other", Dictionary{{"election", -1}}}}));
     EXPECT_EQ(open().annotationForPlugIn(*plugIn), merged);
 
     store.setAnnotation(std::nullopt, *plugIn);
     EXPECT_EQ(store.annotationForPlugIn(*plugIn), std::nullopt);
+    save(store);
     EXPECT_EQ(saved(), savedWith({{"com.example.other", Dictionary{{"election", -1}}}}));
 }
 
-TEST_F(StoreTest, LeavesTheFileAloneWhenNothingChanges) {
+TEST_F(StoreTest, CountsOnlyWhatChanges) {
     write(storeText(16, someAnnotations));
     auto store = open();
-    const auto before = platform::stampOf(path);
     const auto annotation = store.annotationForPlugIn(*plugIn);
+    const auto loaded = store.snapshot();
     store.setAnnotation(Dictionary{{"election", 1}}, *plugIn);
-    EXPECT_EQ(platform::stampOf(path), before);
+    EXPECT_EQ(store.changes(), loaded.change);
     EXPECT_TRUE(store.annotationForPlugIn(*plugIn)->sameObject(*annotation));
+    store.setAnnotation(Dictionary{{"election", true}}, *plugIn); // an equal number
+    EXPECT_EQ(store.annotationForPlugIn(*plugIn)->find("election")->boolean(), true);
+    EXPECT_GT(store.changes(), loaded.change);
+    EXPECT_EQ(loaded.annotations, someAnnotations) << "what was handed out stays";
+}
+
+TEST_F(StoreTest, RefusesWhatGrowsTooLarge) {
+    const auto text = [](std::size_t size) { return std::string(size, 'x'); };
+    auto store = open();
+    const std::size_t half = ZPDAnnotationStore::largestAnnotation / 2;
+    EXPECT_EQ(store.setAnnotation(Dictionary{{"a", text(half)}}, *plugIn), std::nullopt);
+    EXPECT_TRUE(store.setAnnotation(Dictionary{{"b", text(half)}}, *plugIn));
+    EXPECT_EQ(store.annotationForPlugIn(*plugIn)->size(), 1U);
+
+    const std::string large = text(ZPDAnnotationStore::largestAnnotation - 100);
+    std::vector<ZPDPlugIn::Ptr> accepted;
+    for (int i = 0; i < 300; ++i) {
+        auto sample = samplePlugIn();
+        sample->identifier = "com.example." + std::to_string(i);
+        auto other = world.record(sample);
+        if (!store.setAnnotation(Dictionary{{"a", large}}, *other))
+            accepted.push_back(std::move(other));
+    }
+    EXPECT_EQ(accepted.size(), 255U);
+    EXPECT_FALSE(store.setAnnotation(Dictionary{{"a", text(9)}}, *accepted.front()));
+    EXPECT_FALSE(store.setAnnotation(Dictionary{{"a", large}}, *accepted.front()));
+    store.setAnnotation(std::nullopt, *accepted.front());
+    EXPECT_FALSE(store.setAnnotation(Dictionary{{"b", text(half)}}, *accepted.front()));
+    save(store);
+    EXPECT_TRUE(open().annotationForPlugIn(*accepted.back()));
 }
 
 // ---- Damage
@@ -118,6 +155,7 @@ TEST_F(StoreTest, CutAnywhereStartsEmptyAndIsMendedByTheNextChange) {
     }
     auto store = open();
     store.setAnnotation(Dictionary{{"election", 1}}, *plugIn);
+    save(store);
     EXPECT_EQ(saved(), savedWith({{sampleKey, Dictionary{{"election", 1}}}}));
 }
 
@@ -151,32 +189,31 @@ TEST_F(StoreTest, RefusesWhatIsNoStore) {
     EXPECT_EQ(open().loadDb(path)->description, "found database version 15 needed version 16");
 }
 
-TEST_F(StoreTest, KeepsChangesThatCannotBeSavedAndSavesThemLater) {
-    path = folder / "missing/annotations";
-    auto store = open();
-    store.setAnnotation(Dictionary{{"election", 1}}, *plugIn);
-    EXPECT_EQ(store.annotationForPlugIn(*plugIn), (Dictionary{{"election", 1}}));
-
-    std::filesystem::create_directory(folder / "missing");
-    store.setAnnotation(Dictionary{{"election", 1}}, *plugIn); // changes nothing more
-    EXPECT_EQ(saved(), savedWith({{sampleKey, Dictionary{{"election", 1}}}}));
-}
-
 TEST_F(StoreTest, SavesTheOthersWhereOneCannotBeWritten) {
     write(storeText(16, someAnnotations));
     auto store = open();
     store.setAnnotation(Dictionary{{"odd", nullptr}}, *plugIn);
+    EXPECT_TRUE(ZPDAnnotationStore::saveDb(path, store.snapshot().annotations));
     EXPECT_EQ(saved(), savedWith({{"com.example.other", Dictionary{{"election", -1}}}}));
-    EXPECT_TRUE(store.annotationForPlugIn(*plugIn)->contains("odd"));
 }
 
-TEST_F(StoreTest, ReadsBackWhatIsAsDeepAsTheWireAllows) {
-    Value deep = 1;
-    for (int level = 0; level < 62; ++level)
-        deep = Dictionary{{"d", deep}};
-    auto store = open();
-    store.setAnnotation(Dictionary{{"extension", deep}}, *plugIn);
-    EXPECT_EQ(open().annotationForPlugIn(*plugIn), (Dictionary{{"extension", deep}}));
+// What costs most in XML, and stands as deep as can be.
+TEST_F(StoreTest, ReadsBackWhatCanBeHeld) {
+    const auto nested = [](std::size_t levels, Value innermost) {
+        for (; levels > 0; --levels)
+            innermost = Array{std::move(innermost)};
+        return Dictionary{{"extension", std::move(innermost)}};
+    };
+    const std::vector<Value> many(60'000, Value(platform::Array()));
+    const Dictionary most = nested(59, Array(many));
+    EXPECT_FALSE(ZPDAnnotationStore::canHold(nested(62, 1)));
+    for (const Dictionary& annotation : {most, nested(61, 1)}) {
+        EXPECT_TRUE(ZPDAnnotationStore::canHold(annotation));
+        auto store = open();
+        EXPECT_EQ(store.setAnnotation(annotation, *plugIn), std::nullopt);
+        save(store);
+        EXPECT_EQ(open().annotationForPlugIn(*plugIn), annotation);
+    }
 }
 
 // ---- The older place
@@ -218,7 +255,7 @@ TEST_F(StoreTest, GoesOnWithoutAnOlderStore) {
     world.platform.containers.failure = platform::posixError(EACCES, "container");
     auto store = open();
     store.setAnnotation(Dictionary{{"election", 1}}, *plugIn);
-    EXPECT_EQ(saved(), savedWith({{sampleKey, Dictionary{{"election", 1}}}}));
+    EXPECT_EQ(store.annotationForPlugIn(*plugIn), (Dictionary{{"election", 1}}));
 
     std::filesystem::remove(path);
     world.platform.containers.failure.reset();

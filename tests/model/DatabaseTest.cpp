@@ -71,6 +71,7 @@ struct DatabaseTest : testing::Test {
     // What would be there had someone elected before.
     void elect(const std::string& key, int election) {
         const Dictionary data{{key, Dictionary{{"election", election}, {"note", "kept"}}}};
+        database.reset(); // saves
         folder.write(
             "annotations",
             platform::plist::writeXml(Dictionary{{"version", 16}, {"data", data}}).value());

@@ -41,8 +41,10 @@ ZPDPlugIn::Ptr Transaction::findPlugInByUUID(const platform::Uuid& uuid) const {
 
 ZPDPlugIn::Ptr Transaction::findPlugInByPathURL(std::string_view url) const {
     const auto path = pathFromFileURL(url);
-    if (!path)
-        return nullptr;
-    const auto canonical = platform::canonicalPath(*path);
-    return server().findPlugInAtPath(canonical ? *canonical : *path);
+    return path ? findPlugInByPath(*path) : nullptr;
+}
+
+ZPDPlugIn::Ptr Transaction::findPlugInByPath(const std::string& path) const {
+    const auto canonical = platform::canonicalPath(path);
+    return server().findPlugInAtPath(canonical ? *canonical : path);
 }
