@@ -69,6 +69,11 @@ std::expected<Dictionary, Failure> Daemon::ask(const Request& request) {
     return *std::move(reply);
 }
 
+std::optional<Failure> Daemon::tell(const Request& request) {
+    auto reply = ask(request);
+    return reply ? std::nullopt : std::optional(std::move(reply.error()));
+}
+
 std::expected<Value, Failure> Daemon::askForMatches(const Request& request) {
     const auto reply = ask(request);
     if (!reply)
@@ -119,6 +124,22 @@ std::expected<Dictionary, Failure> Daemon::findAtPath(const std::string& path) {
         const platform::Url url{platform::SharedBytes(std::string_view(fileURLFromPath(path)))};
         client.findPlugInByPathURL(url, std::move(reply));
     });
+}
+
+std::optional<Failure> Daemon::annotate(const platform::Uuid& uuid, const Dictionary& annotation) {
+    return tell([&](ZPDaemonClient& client, auto reply) {
+        client.setPluginAnnotations({uuid}, annotation, std::move(reply));
+    });
+}
+
+std::optional<Failure> Daemon::add(const std::vector<std::string>& paths) {
+    return tell(
+        [&](ZPDaemonClient& client, auto reply) { client.addPlugIns(paths, std::move(reply)); });
+}
+
+std::optional<Failure> Daemon::remove(const std::vector<std::string>& paths) {
+    return tell(
+        [&](ZPDaemonClient& client, auto reply) { client.removePlugIns(paths, std::move(reply)); });
 }
 
 } // namespace zpctl

@@ -37,10 +37,17 @@ public:
     [[nodiscard]] std::expected<platform::Dictionary, Failure> find(const platform::Uuid& uuid);
     [[nodiscard]] std::expected<platform::Dictionary, Failure> findAtPath(const std::string& path);
 
+    // What changes something. Nothing when it was done.
+    [[nodiscard]] std::optional<Failure> annotate(const platform::Uuid& uuid,
+                                                  const platform::Dictionary& annotation);
+    [[nodiscard]] std::optional<Failure> add(const std::vector<std::string>& paths);
+    [[nodiscard]] std::optional<Failure> remove(const std::vector<std::string>& paths);
+
 private:
     using Request = std::function<void(ZPDaemonClient&, ZPDaemonClient::ReplyBlock)>;
 
     [[nodiscard]] std::expected<platform::Dictionary, Failure> ask(const Request& request);
+    [[nodiscard]] std::optional<Failure> tell(const Request& request);
     // What stands under "matches" in the answer to a request.
     [[nodiscard]] std::expected<platform::Value, Failure> askForMatches(const Request& request);
     [[nodiscard]] std::expected<platform::Dictionary, Failure> askForForm(const Request& request);

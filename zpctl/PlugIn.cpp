@@ -1,5 +1,6 @@
 #include "zpctl/PlugIn.h"
 
+#include <cstdint>
 #include <string_view>
 
 namespace zpctl {
@@ -20,12 +21,21 @@ Dictionary dictionaryAt(const Dictionary& dictionary, std::string_view key) {
     return value && value->dictionary() ? *value->dictionary() : Dictionary();
 }
 
+// In the words of "elect". The second 8 bits say nothing about the choice.
 std::string electionIn(const Dictionary& annotations) {
+    constexpr std::int64_t unusedBits = 0xff00;
     const Value* election = annotations.find("election");
-    const auto number = election ? election->integerValue() : std::nullopt;
-    if (!number || *number == 0)
+    const std::int64_t number = election ? election->integerValue().value_or(0) : 0;
+    switch (number & ~unusedBits) {
+    case 0:
         return {};
-    return *number == 1 ? "elected" : "election " + std::to_string(*number);
+    case 1:
+        return "elected";
+    case 2:
+        return "not elected";
+    default:
+        return "election " + std::to_string(number);
+    }
 }
 
 // "Cinema" of "/Applications/Cinema.app".

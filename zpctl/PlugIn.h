@@ -16,7 +16,7 @@ struct PlugIn {
     std::string extensionPoint;
     std::string uuid;
     std::string path;
-    std::string election; // empty: the user made no choice
+    std::string election; // "elected", "not elected"; empty: the user made no choice
     bool onSystemVolume = false;
     std::optional<std::string> applicationPath;
     std::optional<std::string> applicationName;

@@ -1,6 +1,7 @@
 #include "zpctl/Session.h"
 
 #include <ostream>
+#include <poll.h>
 
 #include <nlohmann/json.hpp>
 
@@ -8,6 +9,11 @@
 #include "zpctl/Printable.h"
 
 namespace zpctl {
+
+bool Terminal::readerIsGone() const {
+    ::pollfd watched = {descriptor, 0, 0};
+    return ::poll(&watched, 1, 0) > 0;
+}
 
 Daemon& Session::daemon() {
     if (!daemon_) {

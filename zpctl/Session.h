@@ -30,6 +30,10 @@ struct Terminal {
     std::ostream& err;
     bool inColour = false; // of `out`
     bool inUtf8 = false;
+    int descriptor = -1; // of `out`, where it has one
+
+    // Whether nobody can read any more what is written to `out`.
+    [[nodiscard]] bool readerIsGone() const;
 };
 
 // One run of the tool: what a verb gets to work with. Made by the command line; the terminal's
@@ -43,6 +47,11 @@ public:
     [[nodiscard]] Daemon& daemon();
 
     [[nodiscard]] std::ostream& out() const { return terminal_.out; }
+
+    // To wait for its reader to go; -1 when there is none.
+    [[nodiscard]] int outDescriptor() const { return terminal_.descriptor; }
+
+    [[nodiscard]] bool inJson() const { return options_.json; }
 
     [[nodiscard]] const Paint& paint() const { return paint_; }
 

@@ -38,11 +38,12 @@ int main(int argc, char** argv) {
     const zpctl::Terminal terminal{.out = std::cout,
                                    .err = std::cerr,
                                    .inColour = wantsColour(),
-                                   .inUtf8 = std::strcmp(nl_langinfo(CODESET), "UTF-8") == 0};
+                                   .inUtf8 = std::strcmp(nl_langinfo(CODESET), "UTF-8") == 0,
+                                   .descriptor = STDOUT_FILENO};
     try {
         const std::vector<std::string> arguments(argv + 1, argv + argc);
         const zpctl::Status status = zpctl::run(arguments, terminal);
-        if (!std::cout.flush()) {
+        if (!std::cout.flush() && !terminal.readerIsGone()) {
             std::perror("zpctl: standard output");
             return EXIT_FAILURE;
         }

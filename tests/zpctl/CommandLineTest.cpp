@@ -2,6 +2,7 @@
 
 #include <cstdlib>
 #include <filesystem>
+#include <fstream>
 #include <sstream>
 #include <string>
 #include <sys/socket.h>
@@ -19,6 +20,8 @@ namespace {
 
 using testing::HasSubstr;
 using zpctl::Status;
+
+constexpr const char* uuid = "2B4F0C52-5B8B-4C5B-9B0B-0F6C1B7C9E11";
 
 // Runs the tool where there is no daemon.
 class CommandLine : public testing::Test {
@@ -71,6 +74,12 @@ TEST_F(CommandLine, RefusesWrongUsage) {
         {"--service", "../else", "tree"},
         {"--service", "", "tree"},
         {"tree", "up"},
+        {"elect", "x", "on"},
+        {"elect", uuid, "maybe"},
+        {"annotate", uuid, "/does/not/exist"},
+        {"add"},
+        {"remove"},
+        {"monitor", "--count", "0"},
     };
     for (const auto& arguments : cases) {
         EXPECT_EQ(run(arguments), Status::wrongUsage) << testing::PrintToString(arguments);
@@ -79,9 +88,29 @@ TEST_F(CommandLine, RefusesWrongUsage) {
     }
 }
 
+TEST_F(CommandLine, SendsNoAnnotationThatWouldBeDropped) {
+    const std::string file = home_ / "annotation.plist";
+    const std::pair<const char*, Status> cases[] = {
+        {"", Status::wrongUsage},
+        {"<key>elected</key><integer>1</integer>", Status::wrongUsage},
+        {"<key>election</key><integer>1</integer><key>x</key><true/>", Status::wrongUsage},
+        {"<key>election</key><string>for the daemon to refuse</string>", Status::noDaemon},
+        {"<key>extension</key><dict/>", Status::noDaemon},
+    };
+    for (const auto& [content, status] : cases) {
+        std::ofstream(file) << "<plist><dict>" << content << "</dict></plist>";
+        EXPECT_EQ(run({"annotate", uuid, file}), status) << content;
+    }
+}
+
 TEST_F(CommandLine, TellsWhenThereIsNoDaemon) {
     const std::vector<std::string> cases[] = {
-        {"tree"}, {"match", "--flags", "0x5", "a=b"}, {"--service", "other", "find", "/x.appex"}};
+        {"tree"},
+        {"match", "--flags", "0x5", "a=b"},
+        {"--service", "other", "find", "/x.appex"},
+        {"elect", uuid, "on"},
+        {"add", "/x.appex"},
+    };
     for (const auto& arguments : cases) {
         EXPECT_EQ(run(arguments), Status::noDaemon);
         EXPECT_THAT(err_.str(),

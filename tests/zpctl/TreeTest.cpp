@@ -39,7 +39,7 @@ Dictionary form(const Sample& sample) {
 const std::vector<Dictionary> sampleForms{
     form({"s", "1", "U5", {}, {}}),
     form({"b", "1.10", "U2", "/A/Juke.app", 1}),
-    form({"b", "1.9", "U1", "/A/Juke.app", {}}),
+    form({"b", "1.9", "U1", "/A/Juke.app", 2}),
     form({"a", "3", "U3", "/A/Cine.ma.app", -1}),
 };
 
@@ -54,7 +54,7 @@ TEST(Tree, GroupsPlugInsByApplicationInOrder) {
               "Cine.ma  /A/Cine.ma.app\n"
               "`-- Name of a  3     point  election -1  U3\n"
               "Juke  /A/Juke.app\n"
-              "|-- Name of b  1.9   point               U1\n"
+              "|-- Name of b  1.9   point  not elected  U1\n"
               "`-- Name of b  1.10  point  elected      U2\n"
               "Outside applications\n"
               "`-- Name of s  1     point               U5\n"

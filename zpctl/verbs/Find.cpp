@@ -7,8 +7,8 @@
 #include <CLI/CLI.hpp>
 #include <nlohmann/json.hpp>
 
-#include "platform/file/File.h"
 #include "platform/value/Uuid.h"
+#include "zpctl/Arguments.h"
 #include "zpctl/Json.h"
 #include "zpctl/PlugIn.h"
 #include "zpctl/Session.h"
@@ -55,14 +55,6 @@ void writeFacts(const Dictionary& form, const Session& session) {
     add("Registered", dateOf(form));
     add("Election", plugIn.election.empty() ? "none" : plugIn.election);
     table.write(session.out(), session.paint());
-}
-
-// A path that leads nowhere goes to the daemon all the same: it is the one to say so.
-std::string absolutePath(const std::string& path) {
-    if (auto canonical = platform::canonicalPath(path))
-        return *canonical;
-    const auto here = platform::canonicalPath(".");
-    return path.starts_with('/') || !here ? path : *here + '/' + path;
 }
 
 Status find(const std::string& target, Session& session) {

@@ -8,6 +8,13 @@ namespace zpctl {
 Action declareMatch(CLI::App& command);
 Action declareFind(CLI::App& command);
 Action declareTree(CLI::App& command);
+Action declareElect(CLI::App& command);
+Action declareAnnotate(CLI::App& command);
+Action declareMonitor(CLI::App& command);
+Action declareAdd(CLI::App& command);
+Action declareRemove(CLI::App& command);
+Action declareInstall(CLI::App& command);
+Action declareUninstall(CLI::App& command);
 Action declareKeygen(CLI::App& command);
 Action declareSign(CLI::App& command);
 Action declareVerify(CLI::App& command);
