@@ -225,6 +225,11 @@ void Probe::run(const std::string& line) {
         {"take", [&] { client_.emplace(std::stoi(words[1])); }},
         {"ask", [&] { say(ask()); }},
         {"names", [&] { say("plug-ins: " + matched(client(), Item())); }},
+        {"remove",
+         [&] {
+             const Words paths(words.begin() + 1, words.end());
+             say(said(client().request(pathsRequest("remove", paths))));
+         }},
         {"send", [&] { client().send(frameOf(requestFrame, allPlugIns())); }},
         {"receive", [&] { say(reply()); }},
         {"child-asks", [&] { waitpid(aside([&] { say(ask()); }), nullptr, 0); }},

@@ -57,6 +57,13 @@ Item findAt(WireClient& client, const std::string& path) {
     return formOf(client.request(findRequest(Item::map({{"paths", "file://" + path}}))));
 }
 
+Item pathsRequest(const char* type, const std::vector<std::string>& paths) {
+    Item list = Item::array({});
+    for (const std::string& path : paths)
+        list.append(path);
+    return envelope(type, Item::map({{"paths", list}}));
+}
+
 Item findRequest(const Item& more) {
     return envelope("find", more);
 }

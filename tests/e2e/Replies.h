@@ -26,5 +26,7 @@ namespace e2e {
 // The form of the bundle at a path, by a "find" with its file URL.
 [[nodiscard]] Item findAt(WireClient& client, const std::string& path);
 [[nodiscard]] Item findRequest(const Item& more);
+// "add", "remove"
+[[nodiscard]] Item pathsRequest(const char* type, const std::vector<std::string>& paths);
 
 } // namespace e2e
