@@ -1,23 +1,16 @@
 #include "AppRegistry/ARBundleReader.h"
 
 #include "AppRegistry/ARIdentity.h"
+#include "platform/bundle/Bundle.h"
 #include "platform/file/File.h"
-#include "platform/plist/PropertyList.h"
+#include "platform/plist/DictionaryFile.h"
 
+using platform::BundleReader;
 using platform::Dictionary;
 
 namespace {
 
 constexpr ARDigest notHashed{};
-
-std::expected<Dictionary, std::string> parseInfo(std::string_view bytes) {
-    const auto parsed = platform::plist::parse(bytes);
-    if (!parsed)
-        return std::unexpected("its property list is broken: " + describe(parsed.error()));
-    if (const Dictionary* dictionary = parsed->dictionary())
-        return *dictionary;
-    return std::unexpected("its property list is not a dictionary");
-}
 
 std::expected<platform::FileContent, std::string> readFile(const std::string& path,
                                                            std::size_t largest) {
@@ -72,12 +65,12 @@ std::expected<Dictionary, std::string> ARBundleReader::readInfo(ARBundleContent&
         return std::unexpected(stamp.error());
     if (!stamp->present())
         return std::unexpected("it has no Info.plist");
-    const auto file = readFile(candidate.folder.pathOf(name), largestInfo);
+    const auto file = readFile(candidate.folder.pathOf(name), BundleReader::largestInfo);
     if (!file)
         return std::unexpected(file.error());
     content.row.stamps[infoFile] = *stamp;
     content.digests[infoFile] = hash_.of(file->bytes);
-    return parseInfo(file->bytes);
+    return platform::parseDictionary(file->bytes);
 }
 
 std::expected<void, std::string> ARBundleReader::readOther(ARBundleContent& content,
@@ -118,10 +111,10 @@ std::optional<Dictionary> ARReadReportedInfo(const ARBundleRow& row) {
     std::string path(row.path.view());
     if (row.kind != ARKind::extensionPoint)
         path += "/Info.plist";
-    const auto file = readFile(path, ARBundleReader::largestInfo);
+    const auto file = readFile(path, BundleReader::largestInfo);
     if (!file)
         return std::nullopt;
-    auto info = parseInfo(file->bytes);
+    auto info = platform::parseDictionary(file->bytes);
     if (!info)
         return std::nullopt;
     return ARReportedInfo(row.kind, std::move(*info));

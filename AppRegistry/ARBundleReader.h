@@ -28,7 +28,6 @@ struct ARBundleContent {
 // thread of the pass that owns it.
 class ARBundleReader {
 public:
-    static constexpr std::size_t largestInfo = std::size_t{1} << 20;
     static constexpr std::size_t largestSignature = std::size_t{256} << 10;
 
     explicit ARBundleReader(const ARBundleFiles& files) : files_(files) {}

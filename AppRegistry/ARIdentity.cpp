@@ -5,6 +5,8 @@
 #include "AppRegistry/ARBundleFiles.h"
 #include "AppRegistry/ARFolder.h"
 #include "AppRegistry/ARPointKeys.h"
+#include "platform/bundle/ExtensionPoints.h"
+#include "platform/bundle/Identifier.h"
 #include "platform/bundle/InfoKeys.h"
 
 using platform::Dictionary;
@@ -12,8 +14,6 @@ using platform::SharedBytes;
 using platform::Value;
 
 namespace {
-
-constexpr std::string_view extensionPointSuffix = ".plist";
 
 std::optional<SharedBytes> textEntry(const Dictionary& info, const char* key) {
     const Value* value = info.find(key);
@@ -36,13 +36,6 @@ std::optional<SharedBytes> plugInIdentifier(const Dictionary& info) {
     return textEntry(info, platform::InfoKey::bundleIdentifier);
 }
 
-// The second byte of U+0080 to U+009F, whose first is c2.
-bool isHighControl(std::string_view text, std::size_t at) {
-    const auto byte = static_cast<unsigned char>(text[at]);
-    return byte >= 0x80 && byte <= 0x9f && at > 0 &&
-           static_cast<unsigned char>(text[at - 1]) == 0xc2;
-}
-
 std::optional<SharedBytes> identifierOf(ARKind kind, std::string_view path,
                                         const Dictionary& info) {
     switch (kind) {
@@ -54,22 +47,11 @@ std::optional<SharedBytes> identifierOf(ARKind kind, std::string_view path,
         break;
     }
     std::string_view name = ARNameOf(path);
-    name.remove_suffix(std::min(name.size(), extensionPointSuffix.size()));
+    name.remove_suffix(std::min(name.size(), platform::extensionPointSuffix.size()));
     return SharedBytes(name);
 }
 
 } // namespace
-
-bool ARIsIdentifier(std::string_view text) {
-    if (text.empty() || text.size() > ARLongestIdentifier || text == "." || text == "..")
-        return false;
-    for (std::size_t at = 0; at < text.size(); ++at) {
-        const auto byte = static_cast<unsigned char>(text[at]);
-        if (byte < 0x20 || byte == 0x7f || byte == '/' || isHighControl(text, at))
-            return false;
-    }
-    return true;
-}
 
 Dictionary ARReportedInfo(ARKind kind, Dictionary info) {
     if (kind != ARKind::plugIn || info.contains(platform::InfoKey::extensionPoint))
@@ -87,7 +69,7 @@ std::optional<std::string> ARIdentify(ARBundleRow& row, std::string_view path,
     const auto identifier = identifierOf(row.kind, path, info);
     if (!identifier && row.kind != ARKind::application)
         return "it has no identifier";
-    if (identifier && !ARIsIdentifier(identifier->view()))
+    if (identifier && !platform::isIdentifier(identifier->view()))
         return "its identifier is not one";
     row.identifier = identifier.value_or(SharedBytes());
     row.originalIdentifier = row.identifier;

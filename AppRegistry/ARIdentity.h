@@ -9,12 +9,6 @@
 
 // What an info dictionary says that its bundle is.
 
-inline constexpr std::size_t ARLongestIdentifier = 255; // bytes
-
-// Identifiers become file names and appear in logs: not empty, not too long, no "/", NUL or
-// control characters, neither "." nor "..".
-[[nodiscard]] bool ARIsIdentifier(std::string_view text);
-
 // The info dictionary as the registry reports it: of a plug-in, with the extension point's
 // identifier at the top level too, copied from "HXExtension" unless it is there.
 [[nodiscard]] platform::Dictionary ARReportedInfo(ARKind kind, platform::Dictionary info);

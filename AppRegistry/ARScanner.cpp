@@ -4,6 +4,7 @@
 #include <cerrno>
 #include <system_error>
 
+#include "platform/bundle/ExtensionPoints.h"
 #include "platform/file/File.h"
 
 std::string_view ARSuffixOf(ARKind kind) {
@@ -15,7 +16,7 @@ std::string_view ARSuffixOf(ARKind kind) {
     case ARKind::extensionPoint:
         break;
     }
-    return ".plist";
+    return platform::extensionPointSuffix;
 }
 
 std::string_view ARApplicationPathOf(std::string_view plugInPath) {

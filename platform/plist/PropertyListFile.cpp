@@ -4,7 +4,7 @@
 
 #include "platform/file/OwnershipTest.h"
 #include "platform/log/Log.h"
-#include "platform/plist/PropertyList.h"
+#include "platform/plist/DictionaryFile.h"
 
 namespace platform {
 
@@ -14,17 +14,8 @@ std::expected<Dictionary, std::string> readTrusted(const std::string& path, std:
     const auto canonical = canonicalPath(path);
     if (!canonical)
         return Dictionary(); // gone in this moment
-    if (const auto refusal = OwnershipTest().refusal(*canonical))
-        return std::unexpected(*refusal);
-    const auto content = readRegularFile(*canonical, largest);
-    if (!content)
-        return std::unexpected(describe(content.error()));
-    const auto value = plist::parse(content->bytes);
-    if (!value)
-        return std::unexpected(describe(value.error()));
-    if (!value->dictionary())
-        return std::unexpected("not a dictionary");
-    return *value->dictionary();
+    OwnershipTest ownership;
+    return readTrustedDictionary(*canonical, largest, ownership);
 }
 
 } // namespace
