@@ -4,6 +4,7 @@
 
 #include "Zephrin/Collections.h"
 #include "Zephrin/FileURL.h"
+#include "Zephrin/InfoEntries.h"
 #include "Zephrin/InfoKeys.h"
 #include "Zephrin/ZPDError.h"
 #include "Zephrin/ZPDLog.h"
@@ -21,17 +22,8 @@ constexpr std::string_view dataProtocol = "#Data";
 constexpr std::string_view noVersion = "<none>";
 constexpr std::string_view firstVersion = "1";
 
-std::optional<Value> entry(const std::optional<Dictionary>& dictionary, std::string_view key) {
-    const Value* found = dictionary ? dictionary->find(key) : nullptr;
-    return found ? std::optional(*found) : std::nullopt;
-}
-
 bool isText(const std::optional<Value>& value, std::string_view text) {
     return value && value->string() == text;
-}
-
-std::string shown(const std::optional<Value>& value) {
-    return value ? describe(*value) : "(null)";
 }
 
 } // namespace

@@ -3,9 +3,11 @@
 #include <cstddef>
 #include <cstdint>
 #include <expected>
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 
@@ -13,13 +15,15 @@
 #include "platform/value/Uuid.h"
 #include "platform/value/Value.h"
 
+class ZPExtensionPoints;
+
 // One installed plug-in as daemon and client library share it: identity, location, information
 // dictionary, names and annotations. It crosses between them as a form, a flat dictionary.
 //
-// Shared by whoever holds it. Set up once, by one thread, before anyone else sees it; afterwards
-// only names and annotations change. Those may be read and set from any thread; of two changes to
-// the annotations at the same time one may be lost, unless the callers take turns. Records are
-// equal when their UUIDs are.
+// Shared by whoever holds it. Set up once, by one thread, which may resolve its SDK too, before
+// anyone else sees it; afterwards only names and annotations change. Those may be read and set from
+// any thread; of two changes to the annotations at the same time one may be lost, unless the
+// callers take turns. Records are equal when their UUIDs are.
 class ZPPlugInCore {
 public:
     using Ptr = std::shared_ptr<ZPPlugInCore>;
@@ -115,6 +119,41 @@ public:
     // Completes the plug-in dictionary: attributes, and a version in them.
     void canonicalize();
 
+    // ---- Defaults from the extension point, the plug-in's SDK (ZPPlugInSDK.cpp)
+
+    // What the records of this process ask for extension points: the files of this system's
+    // ExtensionPoints folders unless something else is set. Any thread.
+    // REQUIRES: set at most once, before any record resolves its SDK
+    static void setExtensionPoints(std::shared_ptr<const ZPExtensionPoints> points);
+    // The SDK dictionary of an extension point; nothing, with a log line, when there is none.
+    [[nodiscard]] static std::optional<platform::Dictionary>
+    readSDKDictionary(std::string_view identifier);
+    // Merges the SDK dictionary of the record's extension point into its own and makes that
+    // canonical; without such an extension point it is made canonical as it is. Reads a file.
+    // REQUIRES: the record has an information dictionary
+    void resolveSDK();
+    // What the plug-in says, and below that, at every depth, what only the SDK says. The SDK wins
+    // where `sdkOverridesKey`; lists of shared resources are united. Where one of two values is not
+    // a dictionary the plug-in's stays. Nests as deeply as the arguments do, which no reader lets
+    // pass 64 levels.
+    [[nodiscard]] static platform::Dictionary mergeDictionary(const platform::Dictionary& sdk,
+                                                              const platform::Dictionary& plugIn);
+    [[nodiscard]] static bool sdkOverridesKey(std::string_view key);
+    // Every value of the two once, in no defined order.
+    [[nodiscard]] static platform::Array
+    mergeSharedResources(const std::optional<platform::Array>& sdk,
+                         const std::optional<platform::Array>& plugIn);
+
+    // Called with the values found, or with the error.
+    using LocalizedCompletion = std::function<void(const std::optional<platform::Dictionary>&,
+                                                   const std::optional<platform::Error>&)>;
+    // The information dictionary's values for these keys, names in the language in use; keys that
+    // have none are left out. All values must be fit for an archive: null and encoded records,
+    // at any depth, are not, and one of those makes the whole look-up fail. Calls `completion`
+    // once, before it returns.
+    void localizedInfoDictionaryForKeys(std::span<const std::string> keys,
+                                        const LocalizedCompletion& completion) const;
+
     // ---- Derived from the dictionaries; specs are strings in a sound plug-in
 
     [[nodiscard]] std::optional<platform::Dictionary> attributes() const;
@@ -190,6 +229,9 @@ protected:
     }
 
 private:
+    void mergeSDK(const platform::Dictionary& sdk, const platform::Dictionary& info);
+    [[nodiscard]] std::optional<platform::Value>
+    localizedValue(std::string_view key, const platform::Dictionary& info) const;
     void addNames(platform::Dictionary& form, platform::Dictionary& bundleInfo) const;
 
     mutable std::recursive_mutex mutex_;

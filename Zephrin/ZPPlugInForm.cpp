@@ -2,6 +2,7 @@
 
 #include <cassert>
 
+#include "Zephrin/InfoEntries.h"
 #include "Zephrin/InfoKeys.h"
 #include "Zephrin/ZPDLog.h"
 #include "Zephrin/ZPPlugInCore.h"
@@ -44,10 +45,8 @@ void addText(Dictionary& form, std::string_view key, const std::optional<std::st
 }
 
 void logDisplayName(const char* format, const char* operation, const Dictionary& bundleInfo) {
-    if (!ZPDLogAr().enabled(platform::log::Level::debug))
-        return;
-    const Value* const name = bundleInfo.find(InfoKey::displayName);
-    ZPDLogAr().debug(format, operation, name ? describe(*name) : std::string("(null)"));
+    if (ZPDLogAr().enabled(platform::log::Level::debug))
+        ZPDLogAr().debug(format, operation, shown(entry(bundleInfo, InfoKey::displayName)));
 }
 
 } // namespace

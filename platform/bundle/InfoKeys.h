@@ -29,6 +29,7 @@ inline constexpr const char* dedicated = "Dedicated";
 inline constexpr const char* passProxy = "PassProxy";
 inline constexpr const char* hubProtocolVersion = "HubProtocolVersion";
 inline constexpr const char* shared = "Shared";
+inline constexpr const char* cleanTimeout = "CleanTimeout";
 inline constexpr const char* hostEntitlement = "HXExtensionHostEntitlement";
 
 // The attributes in the plug-in dictionary.
