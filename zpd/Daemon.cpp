@@ -9,6 +9,7 @@
 
 #include "AppRegistry/ARRegistry.h"
 #include "Zephrin/ZPDLog.h"
+#include "Zephrin/ZPPlugInCore.h"
 #include "platform/container/FolderContainers.h"
 #include "platform/file/File.h"
 #include "platform/file/PathWatch.h"
@@ -22,6 +23,7 @@
 #include "platform/signing/SignedPrograms.h"
 #include "platform/types/DeclaredTypes.h"
 #include "zpd/Platform.h"
+#include "zpd/ZPDExtensionPoints.h"
 #include "zpd/ZPDServer.h"
 
 using platform::UniqueFd;
@@ -141,6 +143,7 @@ std::unique_ptr<Daemon> Daemon::create(const ZPDOptions& options) {
     if (!parts->openRegistry() || !parts->makeServer(options))
         return nullptr;
     parts->watchFiles();
+    ZPPlugInCore::setExtensionPoints(std::make_shared<ZPDExtensionPoints>(*parts->registry));
     parts->server->setVerbose(options.verbose);
     parts->server->setCacheLimit(options.cacheLimit);
     return std::unique_ptr<Daemon>(new Daemon(std::move(parts)));
