@@ -21,3 +21,13 @@ function(zephrin_install_library target)
       FILES_MATCHING PATTERN "*.h")
   endforeach()
 endfunction()
+
+# docs/man/NAME.SECTION, each where man(1) looks for its section.
+function(zephrin_install_manuals)
+  file(GLOB pages CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/docs/man/*.[1-9])
+  foreach(page IN LISTS pages)
+    cmake_path(GET page EXTENSION LAST_ONLY section)
+    string(SUBSTRING ${section} 1 -1 section)
+    install(FILES ${page} DESTINATION ${CMAKE_INSTALL_MANDIR}/man${section})
+  endforeach()
+endfunction()

@@ -23,8 +23,8 @@ are not ASCII as \uXXXX. With it an error is {"error": {"message": ..., "code": 
 
 Exit status:
   0  done
-  1  the daemon refused; its message and code are on standard error. Of keygen and sign: not done;
-     of verify: no signature that counts
+  1  the daemon refused; its message and code are on standard error. Of a verb that needs no
+     daemon: not done; of verify: no signature that counts
   2  wrong usage
   3  no daemon, or none that answered in time
 
@@ -37,6 +37,8 @@ Examples:
   zpctl match HXExtensionPointIdentifier=com.example.artwork
   zpctl match 'HXExtensionVersion=>=1.10'
   zpctl --json find /Applications/Cinema.app/PlugIns/Posters.appex
+  zpctl elect 2B4F0C52-5B8B-4C5B-9B0B-0F6C1B7C9E11 on
+  zpctl install build/Cinema.app
   zpctl verify /Applications/Cinema.app
   zpctl VERB --help)";
 

@@ -3,6 +3,7 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
+#include <regex>
 #include <sstream>
 #include <string>
 #include <sys/socket.h>
@@ -56,6 +57,23 @@ TEST_F(CommandLine, ExplainsItselfOnStandardOutput) {
     EXPECT_EQ(run({"--version"}), Status::done);
     EXPECT_THAT(out_.str(), testing::StartsWith("zpctl "));
     EXPECT_EQ(err_.str(), "");
+}
+
+TEST_F(CommandLine, HasAManualThatKnowsAsMuchAsHelp) {
+    const std::string manual = platform::readRegularFile(ZPCTL_MANUAL, 1U << 20).value().bytes;
+    const auto compare = [&](const std::vector<std::string>& help) {
+        ASSERT_EQ(run(help), Status::done);
+        const std::string text = out_.str();
+        const std::regex option("--([a-z]+)");
+        for (std::sregex_iterator found(text.begin(), text.end(), option), end; found != end;
+             ++found)
+            EXPECT_THAT(manual, HasSubstr("Fl -" + found->str(1))) << help.front();
+    };
+    compare({"--help"});
+    for (const zpctl::Verb& verb : zpctl::verbs()) {
+        EXPECT_THAT(manual, HasSubstr("\n.It Cm " + std::string(verb.name)));
+        compare({verb.name, "--help"});
+    }
 }
 
 TEST_F(CommandLine, RefusesWrongUsage) {

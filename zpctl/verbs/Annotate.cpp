@@ -26,7 +26,8 @@ constexpr const char* explanation =
   election   a number: 1 elected, 2 not elected, 0 no choice
   extension  a dictionary of further settings
 One of them, or both; any other key is wrong. What the file leaves out stays as it is; what it holds
-takes the place of what was there. The annotation is on disk when this verb has ended.
+takes the place of what was there. The annotation is on disk when this verb has ended, else the
+daemon's log says why not.
 
 Examples:
   zpctl annotate 2B4F0C52-5B8B-4C5B-9B0B-0F6C1B7C9E11 settings.plist

@@ -18,8 +18,8 @@ namespace {
 
 constexpr const char* explanation =
     R"(on is election 1, off is 2, default is 0: no choice. Hosts find the plug-ins that are elected with
-HXUserElection=1. The election is on disk when this verb has ended; it stays when the plug-in is
-installed anew.
+HXUserElection=1. The election is on disk when this verb has ended (else the daemon's log says why
+not), and stays when the plug-in is installed anew.
 
 Examples:
   zpctl elect 2B4F0C52-5B8B-4C5B-9B0B-0F6C1B7C9E11 on
