@@ -11,14 +11,15 @@ step_limit=100 # tenths of a second that anything here may take
 
 home=
 daemon=
+monitor=
 
 clean_up() {
     status=$?
     trap - EXIT INT TERM
-    if [ -n "$daemon" ]; then
-        kill "$daemon" 2>/dev/null || true
-        wait "$daemon" 2>/dev/null || true
-    fi
+    for process in $monitor $daemon; do
+        kill "$process" 2>/dev/null || true
+        wait "$process" 2>/dev/null || true
+    done
     [ -z "$home" ] || rm -rf "$home"
     exit $status
 }
@@ -110,6 +111,29 @@ stop_daemon() {
     [ $status -eq 0 ] || fail "the daemon ended with status $status, expected 0"
 }
 
+# start_monitor COUNT: tells of so many notifications, from when it has begun.
+start_monitor() {
+    echo "\$ zpctl monitor --count $1 &"
+    : >"$home/monitor"
+    zpctl monitor --count "$1" >"$home/heard" 2>"$home/monitor" &
+    monitor=$!
+    eventually grep -qF waiting "$home/monitor" || fail "the monitor did not begin"
+}
+
+stop_monitor() {
+    eventually ended "$monitor" || fail "no notification came"
+    status=0
+    wait "$monitor" || status=$?
+    monitor=
+    [ $status -eq 0 ] || fail "the monitor ended with status $status, expected 0"
+    sed 's/^/  /' "$home/heard"
+    grep -qF com.tovana.zephrin.annotation-change "$home/heard" || fail "it heard something else"
+}
+
+ended() {
+    ! kill -0 "$1" 2>/dev/null || grep -q '^State:[[:space:]]*Z' "/proc/$1/status" 2>/dev/null
+}
+
 install_samples() {
     mkdir -p "$ZEPHRIN_HOME/etc"
     cp -R "$build/examples/Applications" "$build/examples/System" "$ZEPHRIN_HOME/"
@@ -133,8 +157,11 @@ uuid_in_output() {
     sed -n 's/.*\([0-9A-F]\{8\}\(-[0-9A-F]\{4\}\)\{3\}-[0-9A-F]\{12\}\).*/\1/p' "$output" | head -n 1
 }
 
-tree_is_german() {
-    zpctl tree 2>/dev/null | grep -qF 'Untertitel-Versatz'
+# tells TEXT COMMAND...: the command's output has the text, now.
+tells() {
+    text=$1
+    shift
+    "$@" 2>/dev/null | grep -qF -- "$text"
 }
 
 for program in "$build/bin/zpd" "$build/bin/zpctl" "$build/examples/Applications"; do
@@ -197,7 +224,7 @@ hides 1.10
 title "The box's language changes: so do the names"
 echo "\$ echo LANG=de_DE.UTF-8 > \$ZEPHRIN_HOME/etc/locale.conf"
 echo 'LANG=de_DE.UTF-8' >"$ZEPHRIN_HOME/etc/locale.conf"
-eventually tree_is_german || true
+eventually tells 'Untertitel-Versatz' zpctl tree || true
 run 0 zpctl tree
 shows Kino Untertitel-Versatz
 
@@ -224,17 +251,53 @@ shows com.tovana.private.zephrin.manager 'The signature counts.'
 run 1 zpctl verify "$build/bin/zpctl"
 shows 'Does not count'
 
+title "A plug-in is taken away by its path, and comes back; only a manager may take away"
+dusk=$ZEPHRIN_HOME/Applications/Jukebox.app/PlugIns/Dusk.appex
+run 1 zpctl remove "$dusk"
+shows 'code 11'
+run 0 "$ZEPHRIN_HOME/bin/zpctl-manager" remove "$dusk"
+run 0 zpctl match HXExtensionPointIdentifier=com.example.themes
+shows '0 plug-ins'
+run 0 zpctl add "$dusk"
+run 0 zpctl match HXExtensionPointIdentifier=com.example.themes
+shows com.example.theme.dusk '1 plug-in'
+
 title "Without the key on the box the same program is one like any other"
 run 0 rm "$ZEPHRIN_HOME/etc/trust.d/demo.pem"
 run 1 "$ZEPHRIN_HOME/bin/zpctl-manager" match --flags 0x200
 shows 'code 11'
 
-title "After a restart everything is still known, under the same UUID"
+title "The user elects a plug-in; whoever listens hears of it"
+run 0 zpctl match HXExtensionIdentifier=com.example.subtitle-shifter
+subtitles=$(uuid_in_output)
+[ -n "$subtitles" ] || fail "no UUID in the output above"
+run 0 zpctl match HXUserElection=1
+shows '0 plug-ins'
+start_monitor 1
+run 0 zpctl elect "$subtitles" on
+shows 'is elected'
+stop_monitor
+
+title "Discovery by election follows, at once"
+run 0 zpctl match HXUserElection=1
+shows com.example.subtitle-shifter 2.3 elected '1 plug-in'
+run 0 zpctl tree
+shows ' elected '
+run 0 zpctl elect "$subtitles" off
+run 0 zpctl match HXUserElection=1
+shows '0 plug-ins'
+run 0 zpctl tree
+shows ' not elected '
+run 0 zpctl elect "$subtitles" on
+
+title "After a restart everything is still known, under the same UUID, and so is the user's choice"
 stop_daemon
 run 3 zpctl find "$uuid"
 start_daemon
 run 0 zpctl find "$uuid"
 shows com.example.predict "$uuid"
+run 0 zpctl match HXUserElection=1
+shows com.example.subtitle-shifter 2.3 elected '1 plug-in'
 stop_daemon
 
 printf '\nThe demo worked: every step above did what it should.\n'
