@@ -1,3 +1,5 @@
+#include <filesystem>
+
 #include <gtest/gtest.h>
 
 #include "tests/e2e/Daemon.h"
@@ -83,6 +85,11 @@ TEST(Discovery, LeavesOutWhatTheUserExcluded) {
     EXPECT_EQ(leaves(only("a")), "a b c d");
     EXPECT_EQ(leaves(Item::array({Item::map({})})), "");
     writeFile(file, "<plist>junk");
+    EXPECT_EQ(matched(client, Item::map({})), "a b c d");
+    writeFile(file + ".new", xmlPlist(Item::map({{"exclusions", Item::array({only("b")})}})));
+    std::filesystem::rename(file + ".new", file);
+    EXPECT_EQ(matched(client, Item::map({})), "a c d");
+    std::filesystem::remove_all(home / "etc/Preferences");
     EXPECT_EQ(matched(client, Item::map({})), "a b c d");
 }
 

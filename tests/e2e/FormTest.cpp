@@ -1,5 +1,7 @@
 #include <algorithm>
 #include <ctime>
+#include <filesystem>
+#include <functional>
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -10,6 +12,8 @@
 
 namespace e2e {
 namespace {
+
+namespace fs = std::filesystem;
 
 std::string keysOf(const Item& form) {
     std::vector<std::string> keys = form.keys();
@@ -98,6 +102,41 @@ TEST(Form, SpeaksTheLanguageOfTheBox) {
     EXPECT_EQ(form["localizedContainingDisplayName"], Item("Küche"));
     EXPECT_EQ(form["bundleInfo"]["BQBundleDisplayName"], Item("Herd"));
     EXPECT_EQ(form["bundleInfo"]["BQBundleDisplayName[de]"], Item("Ofen"));
+
+    const std::string file = home / "etc/locale.conf";
+    const auto write = [](const std::string& to, const char* locale) {
+        writeFile(to, std::string("LANG=") + locale + "\n");
+    };
+
+    struct {
+        const char* what;
+        std::function<void()> act;
+        const char* name;
+    } const changes[] = {
+        {"written", [&] { write(file, "de"); }, "Ofen"},
+        {"removed", [&] { fs::remove(file); }, "Oven"},
+        {"made", [&] { write(file, "de_AT"); }, "Herd"},
+        {"replaced",
+         [&] {
+             write(home / "etc/new", "de_DE");
+             fs::rename(home / "etc/new", file);
+         },
+         "Ofen"},
+        {"removed with its folder", [&] { fs::remove_all(home / "etc"); }, "Oven"},
+        {"made with its folder", [&] { write(file, "de_AT"); }, "Herd"},
+    };
+
+    for (const auto& change : changes) {
+        SCOPED_TRACE(change.what);
+        change.act();
+        EXPECT_TRUE(eventually([&] {
+            return findAt(client, path)["localizedDisplayName"] == Item(change.name) &&
+                   match(client, Item()).front()["localizedDisplayName"] == Item(change.name);
+        }));
+    }
+    for (const char* line : {"ops default: locale change detected; purging cache",
+                             "ops info: purging cache for 1 > 0"})
+        EXPECT_TRUE(eventually([&] { return daemon.linesWith(line) >= std::size(changes); }));
 }
 
 TEST(Form, MisconfiguredPlugInsAreNotOffered) {
