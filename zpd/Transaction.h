@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -11,6 +12,10 @@
 #include "platform/ipc/Message.h"
 #include "platform/value/Error.h"
 #include "platform/value/Value.h"
+
+namespace platform {
+class SerialQueue;
+}
 
 class ZPDIpcClient;
 class ZPDPlugIn;
@@ -73,8 +78,10 @@ public:
     using PathBlock = std::function<bool(const std::string& path, bool resolved)>;
     // Walks "paths". False when the transaction has failed.
     [[nodiscard]] bool marshalPaths(const PathBlock& block);
-    // The same, and then done.
-    bool processPaths(const PathBlock& block);
+    // The same, and then done: on `queue`, with the transaction left open meanwhile. However long
+    // the list, whoever else has work for that queue gets a turn in between.
+    // REQUIRES: on the service queue
+    void processPaths(platform::SerialQueue& queue, PathBlock block);
 
     // Gets each plug-in and tells whether to go on; when not, it has failed the transaction.
     using PlugInBlock = std::function<bool(const std::shared_ptr<ZPDPlugIn>& plugIn)>;
@@ -109,6 +116,9 @@ private:
     // The row of a type; nothing for an unknown one.
     [[nodiscard]] static const RequestType* known(std::string_view type);
     void route();
+    // Nothing when the transaction has failed.
+    [[nodiscard]] const platform::Array* requestedPaths();
+    void processPathsFrom(std::size_t first, platform::SerialQueue& queue, PathBlock block);
     [[nodiscard]] bool marshalPath(const platform::Value& entry, const PathBlock& block);
     void send(const platform::ipc::Reply& reply);
 

@@ -1,9 +1,13 @@
+#include <algorithm>
+#include <chrono>
 #include <filesystem>
 #include <string>
+#include <thread>
 #include <utility>
 #include <vector>
 
 #include "Zephrin/ZPDError.h"
+#include "platform/queue/SerialQueue.h"
 #include "tests/server/ClientFixture.h"
 
 namespace {
@@ -67,16 +71,36 @@ TEST_F(Transactions, WalkTheirPaths) {
     EXPECT_FALSE(transaction({})->marshalPaths([](const auto&, bool) { return true; }));
 }
 
-TEST_F(Transactions, StopAtThePathThatTheBlockRefuses) {
-    const auto t = transaction({{"paths", Array{"/", "/"}}});
-    int calls = 0;
-    EXPECT_FALSE(t->processPaths([&](const auto&, bool) {
-        ++calls;
-        t->fail(9, "invalid path");
-        return false;
-    }));
-    EXPECT_EQ(calls, 1);
-    EXPECT_EQ(failureIn(*t), "9 invalid path");
+TEST_F(Transactions, ProcessTheirPathsInTurns) {
+    constexpr int paths = 12;
+    constexpr std::chrono::milliseconds each{5};
+    platform::SerialQueue queue("test");
+    const Awaited<bool> begun;
+    queue.async([begun] { (void)begun.get(); });
+    std::string done;
+    const auto begin = [&](char name, std::size_t refused) {
+        const auto t = transaction({{"paths", Array(std::vector<Value>(paths, "/"))}});
+        onServiceQueue([&] {
+            t->processPaths(queue, [&done, name, refused, each, t = t.get()](const auto&, bool) {
+                std::this_thread::sleep_for(each);
+                done += name;
+                if (static_cast<std::size_t>(std::ranges::count(done, name)) != refused)
+                    return true;
+                t->fail(9, "invalid path");
+                return false;
+            });
+        });
+        return t;
+    };
+    const auto whole = begin('a', 0);
+    const auto refused = begin('b', 2);
+    begun.bring(true);
+    while (whole.use_count() > 1 || refused.use_count() > 1)
+        std::this_thread::sleep_for(each);
+    EXPECT_EQ(std::ranges::count(done, 'a'), paths);
+    EXPECT_NE(done.find("abba"), std::string::npos) << done;
+    EXPECT_EQ(failureIn(*whole), "");
+    EXPECT_EQ(failureIn(*refused), "9 invalid path");
 }
 
 TEST_F(Transactions, ForwardTheirOwnErrorsAndMapOthers) {

@@ -2,7 +2,7 @@
 //
 // To register a bundle is to read and hash its files and to write to the disk, and already finding
 // out where a path leads may take long. So the handlers leave the service queue, and the paths are
-// walked on the queue "registration", one request after the other.
+// walked on the queue "registration", where requests take turns.
 
 #include "Zephrin/ZPDError.h"
 #include "Zephrin/ZPDLog.h"
@@ -16,11 +16,8 @@
 using platform::Value;
 
 void Transaction::addPlugIns() {
-    leaveOpen();
-    server().registrationQueue().async([self = shared_from_this()] {
-        self->processPaths([&](const std::string& path, bool resolved) {
-            return self->addPlugIn(path, resolved);
-        });
+    processPaths(server().registrationQueue(), [this](const std::string& path, bool resolved) {
+        return addPlugIn(path, resolved);
     });
 }
 
@@ -45,12 +42,10 @@ bool Transaction::addPlugIn(const std::string& path, bool resolved) {
 void Transaction::removePlugIns() {
     const RemovalRight right{hasPathToWalk() && client().hasEntitlement(Entitlement::manager),
                              client().pid()};
-    leaveOpen();
-    server().registrationQueue().async([self = shared_from_this(), right] {
-        self->processPaths([&](const std::string& path, bool resolved) {
-            return self->removePlugIn(right, path, resolved);
-        });
-    });
+    processPaths(server().registrationQueue(),
+                 [this, right](const std::string& path, bool resolved) {
+                     return removePlugIn(right, path, resolved);
+                 });
 }
 
 bool Transaction::removePlugIn(const RemovalRight& right, const std::string& path, bool resolved) {
