@@ -72,7 +72,7 @@ protected:
 // Each round rebuilds a lost database, with what the folders do not tell.
 TEST_F(RegistryCrash, InTheFirstPassLosesNothing) {
     constexpr int applications = 500; // with a plug-in each
-    constexpr int rounds = 8;
+    constexpr int rounds = 6;
     Names expected;
     for (int i = 0; i < applications; ++i) {
         const std::string name = "A" + std::to_string(1000 + i);

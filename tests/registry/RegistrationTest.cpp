@@ -1,3 +1,8 @@
+#include <csignal>
+#include <fstream>
+#include <sys/resource.h>
+
+#include "AppRegistry/ARKeptPaths.h"
 #include "tests/registry/RegistryFixture.h"
 
 using Strings = std::vector<std::string>;
@@ -45,6 +50,22 @@ protected:
     }
 
     Witness witness;
+};
+
+// While it lives, this process can write no file, as on a full disk.
+class FullDisk {
+public:
+    FullDisk() {
+        std::signal(SIGXFSZ, SIG_IGN);
+        ::getrlimit(RLIMIT_FSIZE, &before_);
+        const ::rlimit none{0, before_.rlim_max};
+        ::setrlimit(RLIMIT_FSIZE, &none);
+    }
+
+    ~FullDisk() { ::setrlimit(RLIMIT_FSIZE, &before_); }
+
+private:
+    ::rlimit before_{};
 };
 
 } // namespace
@@ -149,4 +170,93 @@ TEST_F(Registration, RenewsPlugInsWhoseApplicationChanged) {
         registry->applicationProxyForBundlePath(home / "Applications/A.app")->zephrinPlugins(),
         std::vector{at(inside)});
     EXPECT_EQ(witness.told, Strings());
+}
+
+TEST_F(Registration, IsRefusedAndUndoneWhenItCannotBeStored) {
+    const auto before = at(inside);
+    const auto known = registry->knowledge();
+    {
+        const FullDisk full;
+        EXPECT_TRUE(registry->registerPlugin(home / outside));
+        EXPECT_TRUE(registry->unregisterPlugin(home / inside));
+        EXPECT_EQ(at(inside), before);
+        EXPECT_FALSE(registry->applicationProxyForBundlePath(home / "Elsewhere/B.app"));
+        EXPECT_EQ(registry->knowledge().uuid, known.uuid);
+        EXPECT_EQ(witness.told, Strings());
+    }
+    reopen();
+    EXPECT_EQ(identifiers(), Strings{"in"});
+    EXPECT_FALSE(registry->registerPlugin(home / outside));
+    EXPECT_EQ(identifiers(), (Strings{"in", "out"}));
+}
+
+TEST_F(Registration, StoresLaterWhatALookFoundOnAFullDisk) {
+    {
+        const FullDisk full;
+        std::filesystem::rename(home / outside, home / "Applications/A.app/PlugIns/New.appex");
+        std::filesystem::remove_all(home / inside);
+        registry->rescan();
+        EXPECT_EQ(witness.told, (Strings{"-in", "+out"}));
+    }
+    const auto uuid = uuidOf("Applications/A.app/PlugIns/New.appex");
+    const auto known = registry->knowledge();
+    EXPECT_FALSE(registry->registerPlugin(home / "Elsewhere/B.app/PlugIns/Sibling.appex"));
+    EXPECT_GT(registry->knowledge().sequence, known.sequence);
+    reopen();
+    EXPECT_EQ(uuidOf("Applications/A.app/PlugIns/New.appex"), uuid);
+    EXPECT_EQ(identifiers(), (Strings{"out", "sibling"}));
+}
+
+TEST_F(Registration, LetsAnApplicationGoWithItsLastAddedPlugIn) {
+    const auto isKnown = [&](const char* path) {
+        return registry->applicationProxyForBundlePath(home / path) != nullptr;
+    };
+    const std::string sibling = home / "Elsewhere/B.app/PlugIns/Sibling.appex";
+    EXPECT_FALSE(registry->registerPlugin(home / outside));
+    EXPECT_FALSE(registry->registerPlugin(sibling));
+    EXPECT_FALSE(registry->unregisterPlugin(home / outside));
+    EXPECT_TRUE(isKnown("Elsewhere/B.app"));
+    EXPECT_FALSE(registry->unregisterPlugin(sibling));
+    EXPECT_FALSE(isKnown("Elsewhere/B.app"));
+    EXPECT_FALSE(registry->registerPlugin(sibling));
+    remove("Elsewhere/B.app/PlugIns/Sibling.appex");
+    registry->rescan();
+    EXPECT_FALSE(isKnown("Elsewhere/B.app"));
+
+    // One that is refused brings none in; one in a watched folder stays, noticed or not.
+    home.write("Elsewhere/B.app/PlugIns/Broken.appex/Info.plist", "broken");
+    EXPECT_TRUE(registry->registerPlugin(home / "Elsewhere/B.app/PlugIns/Broken.appex"));
+    EXPECT_FALSE(isKnown("Elsewhere/B.app"));
+    makeApplication("Applications/C.app", "com.example.c");
+    makePlugIn("Applications/C.app/PlugIns/C.appex", "c");
+    for (const char* path : {inside, "Applications/C.app/PlugIns/C.appex"}) {
+        EXPECT_FALSE(registry->registerPlugin(home / path));
+        EXPECT_FALSE(registry->unregisterPlugin(home / path));
+    }
+    EXPECT_TRUE(isKnown("Applications/A.app"));
+    EXPECT_TRUE(isKnown("Applications/C.app"));
+    registry->rescan();
+    EXPECT_EQ(identifiers(), Strings());
+}
+
+TEST_F(Registration, KeepsPathsOfAnyBytesBesideTheDatabase) {
+    const std::string odd = "Elsewhere/\xff\n&<.appex";
+    makePlugIn(odd, "odd");
+    EXPECT_FALSE(registry->registerPlugin(home / odd));
+    EXPECT_FALSE(registry->registerPlugin(home / outside));
+    EXPECT_FALSE(registry->unregisterPlugin(home / inside));
+    registry.reset();
+    const std::string file = ARKeptPathsFile(places.registryDatabase);
+    EXPECT_EQ(ARKeptPaths(file).read(),
+              (ARKeptPaths::Paths{{home / odd, home / outside}, {home / inside}}));
+    for (const char* content :
+         {"", "broken", "<plist><dict><key>version</key><integer>2</integer></dict></plist>"}) {
+        std::ofstream(file) << content;
+        const std::string log =
+            logOf([&] { EXPECT_EQ(ARKeptPaths(file).read(), ARKeptPaths::Paths()); });
+        EXPECT_NE(log.find("ignoring " + file), std::string::npos) << log;
+    }
+    open(); // the database still knows, and the file is well again
+    EXPECT_EQ(identifiers(), (Strings{"odd", "out"}));
+    EXPECT_EQ(ARKeptPaths(file).read().added.size(), 2u);
 }
