@@ -20,16 +20,16 @@ double percentile(std::vector<double>& sorted, double part) {
 }
 
 // The rounds of one side.
-class Side {
+class Rounds {
 public:
-    Side(Exchange& exchange, int perRound) : exchange_(exchange), perRound_(perRound) {}
+    Rounds(const Side& side, int perRound) : side_(side), perRound_(perRound) {}
 
     void round() {
         std::vector<double> times;
-        const std::chrono::nanoseconds before = processorTime(exchange_.server());
+        const std::chrono::nanoseconds before = used();
         for (int i = 0; i < perRound_; ++i)
-            times.push_back(Microseconds(exchange_.roundTrip()).count());
-        const Microseconds used = processorTime(exchange_.server()) - before;
+            times.push_back(Microseconds(side_.once()).count());
+        const Microseconds used = this->used() - before;
         std::sort(times.begin(), times.end());
         p50_.push_back(percentile(times, 0.5));
         p99_.push_back(percentile(times, 0.99));
@@ -41,7 +41,11 @@ public:
     }
 
 private:
-    Exchange& exchange_;
+    [[nodiscard]] std::chrono::nanoseconds used() const {
+        return side_.server > 0 ? processorTime(side_.server) : std::chrono::nanoseconds();
+    }
+
+    const Side& side_;
     int perRound_;
     std::vector<double> p50_;
     std::vector<double> p99_;
@@ -102,17 +106,25 @@ std::chrono::nanoseconds Exchange::windowed(std::size_t count, std::size_t windo
     return Clock::now() - start;
 }
 
-Compared compare(Exchange& daemon, Exchange& floor, const Plan& plan) {
-    Side ours(daemon, plan.perRound);
-    Side theirs(floor, plan.perRound);
+Compared compare(const Side& daemon, const Side& floor, const Plan& plan) {
+    Rounds ours(daemon, plan.perRound);
+    Rounds theirs(floor, plan.perRound);
     // Once for nothing: caches fill, and whatever is made at first use is made.
-    Side(daemon, plan.perRound).round();
-    Side(floor, plan.perRound).round();
+    Rounds(daemon, plan.perRound).round();
+    Rounds(floor, plan.perRound).round();
     for (int i = 0; i < plan.rounds; ++i) {
         ours.round();
         theirs.round();
     }
     return {.daemon = ours.result(), .floor = theirs.result()};
+}
+
+Compared compare(Exchange& daemon, Exchange& floor, const Plan& plan) {
+    const auto sideOf = [](Exchange& exchange) {
+        return Side{.once = [&exchange] { return exchange.roundTrip(); },
+                    .server = exchange.server()};
+    };
+    return compare(sideOf(daemon), sideOf(floor), plan);
 }
 
 Rates compareRates(Exchange& daemon, Exchange& floor, const Plan& plan, std::size_t window) {

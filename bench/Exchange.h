@@ -2,6 +2,7 @@
 
 #include <chrono>
 #include <cstddef>
+#include <functional>
 #include <string>
 #include <sys/types.h>
 #include <vector>
@@ -49,7 +50,14 @@ struct Plan {
     int perRound = 500;
 };
 
+// What is measured: something done once, which answers how long it took.
+struct Side {
+    std::function<std::chrono::nanoseconds()> once;
+    pid_t server = 0; // whose processor time counts; 0 for nobody's
+};
+
 // Rounds on the one and the other in turn, so that what disturbs the machine disturbs both.
+[[nodiscard]] Compared compare(const Side& daemon, const Side& floor, const Plan& plan);
 [[nodiscard]] Compared compare(Exchange& daemon, Exchange& floor, const Plan& plan);
 
 // Requests in a second, daemon and floor, with a window.

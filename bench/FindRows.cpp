@@ -1,10 +1,7 @@
-#include <csignal>
-#include <sys/prctl.h>
-#include <sys/wait.h>
 #include <thread>
-#include <unistd.h>
 
 #include "bench/Bundles.h"
+#include "bench/Bystander.h"
 #include "bench/Rig.h"
 #include "bench/Rows.h"
 
@@ -28,37 +25,6 @@ void fillUnread(e2e::WireClient& client, const std::string& request) {
             std::this_thread::sleep_for(std::chrono::milliseconds(2));
     }
 }
-
-// A process that keeps the daemon's queue for its connection full, on a core that is left for it.
-// Ended when this goes.
-class Flood {
-public:
-    Flood(const Run& run, Cores cores, const Rig& rig, const std::string& request,
-          std::size_t reply)
-        : pid_(fork()) {
-        if (pid_ != 0) {
-            std::this_thread::sleep_for(std::chrono::milliseconds(200)); // until it is at work
-            return;
-        }
-        prctl(PR_SET_PDEATHSIG, SIGKILL);
-        run.cores.asBystander(cores);
-        const e2e::WireClient client(rig.daemon().socketPath());
-        Exchange exchange(client.fd(), rig.daemon().pid(), request, reply);
-        for (;;)
-            exchange.windowed(100000, 256);
-    }
-
-    Flood(const Flood&) = delete;
-    Flood& operator=(const Flood&) = delete;
-
-    ~Flood() {
-        kill(pid_, SIGKILL);
-        waitpid(pid_, nullptr, 0);
-    }
-
-private:
-    pid_t pid_;
-};
 
 void besideRow(const Run& run, Cores cores, const std::string& name, double beside, double alone) {
     run.table.add({.name = name,
@@ -121,7 +87,13 @@ void findRows(const Run& run, Cores cores) {
     }
     if (!run.cores.leavesOne(cores))
         return; // the flood and the client would only take the core from each other
-    const Flood flood(run, cores, rig, request, reply);
+    // It keeps the daemon's queue for its connection full.
+    const Bystander flood(run, cores, [&] {
+        const e2e::WireClient client(rig.daemon().socketPath());
+        Exchange exchange(client.fd(), rig.daemon().pid(), request, reply);
+        for (;;)
+            exchange.windowed(100000, 256);
+    });
     const Compared beside = compare(find, floor.exchange, run.plan);
     besideRow(run, cores, "find beside a client that floods, p50", beside.daemon.p50,
               alone.daemon.p50);

@@ -23,7 +23,8 @@ namespace {
 
 constexpr const char* usage =
     "Usage: zpd-bench [--quick] [--cores one|two] [ROWS...]\n"
-    "Rows: find match match-many nothing memory start (all of them when none is named)\n";
+    "Rows: find match match-many nothing memory start annotate notify install\n"
+    "      (all of them when none is named)\n";
 
 constexpr const char* memoryFolder = "/dev/shm";
 
@@ -66,7 +67,10 @@ const Family families[] = {
     {"match-many", [](const Run& run, Cores cores) { matchRows(run, cores, 10000); }, true, false},
     {"nothing", nothingRows, false, false},
     {"memory", [](const Run& run, Cores) { memoryRows(run); }, false, false},
-    {"start", startRows, true, true}};
+    {"start", startRows, true, true},
+    {"annotate", annotateRows, true, true},
+    {"notify", notifyRows, true, true},
+    {"install", installRows, true, true}};
 
 // Homes of a hundred thousand bundles take minutes to make and remove on a disk; nothing that is
 // measured there reads from it.

@@ -34,11 +34,22 @@ std::string findByPathFrame(const std::string& path) {
     return frameOf("find", Item::map({{"paths", "file://" + path}}));
 }
 
-std::string findByUuidFrame(e2e::WireClient& client, const std::string& path) {
+std::string uuidAt(e2e::WireClient& client, const std::string& path) {
     client.send(findByPathFrame(path));
     const std::optional<e2e::Frame> reply = client.receive();
-    const Item form = e2e::decode(reply.value().body)["matches"].embedded();
-    return frameOf("find", Item::map({{"uuids", Item::uuid(form["uuid"].text())}}));
+    return e2e::decode(reply.value().body)["matches"].embedded()["uuid"].text();
+}
+
+std::string findByUuidFrame(e2e::WireClient& client, const std::string& path) {
+    return frameOf("find", Item::map({{"uuids", Item::uuid(uuidAt(client, path))}}));
+}
+
+std::string annotateFrame(const std::string& uuid, int election, const std::string& note) {
+    Item annotations = Item::map({{"election", election}});
+    if (!note.empty())
+        annotations.set("extension", Item::map({{"com.example.bench.note", note}}));
+    return frameOf("annotate", Item::map({{"annotations", annotations},
+                                          {"uuids", Item::array({Item::uuid(uuid)})}}));
 }
 
 std::string matchFrame(const std::string& point) {

@@ -35,7 +35,11 @@ struct FloorExchange {
 };
 
 [[nodiscard]] std::string findByPathFrame(const std::string& path);
+[[nodiscard]] std::string uuidAt(e2e::WireClient& client, const std::string& path);
 [[nodiscard]] std::string findByUuidFrame(e2e::WireClient& client, const std::string& path);
+// "annotate" of one plug-in; the election, and whatever else is noted down.
+[[nodiscard]] std::string annotateFrame(const std::string& uuid, int election,
+                                        const std::string& note = {});
 [[nodiscard]] std::string matchFrame(const std::string& point);
 // Size of the reply to a request, header included.
 [[nodiscard]] std::size_t replySize(e2e::WireClient& client, const std::string& request);

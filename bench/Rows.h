@@ -33,6 +33,12 @@ void matchRows(const Run& run, Cores cores, std::size_t plugIns);
 void nothingRows(const Run& run, Cores cores);
 // Memory for each record.
 void memoryRows(const Run& run);
+// "annotate" with its sync, and "find" beside it.
+void annotateRows(const Run& run, Cores cores);
+// Applications that come while the daemon runs, many at once and one by one.
+void installRows(const Run& run, Cores cores);
+// From a change to the observers' blocks.
+void notifyRows(const Run& run, Cores cores);
 // From the start of the program to the first answer.
 void startRows(const Run& run, Cores cores);
 
