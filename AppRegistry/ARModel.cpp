@@ -1,6 +1,9 @@
 #include "AppRegistry/ARModel.h"
 
 #include <algorithm>
+#include <utility>
+
+#include "AppRegistry/ARScanner.h"
 
 void ARModel::fill(std::vector<ARBundleRow> rows) {
     entries_.reserve(rows.size());
@@ -18,8 +21,11 @@ ARModel::Entry* ARModel::find(std::string_view path) {
 ARModel::Entry& ARModel::put(ARRowPtr row) {
     const std::string_view path = row->path.view();
     const auto found = entries_.find(path);
-    if (found == entries_.end())
-        return entries_.emplace(path, Entry{std::move(row)}).first->second;
+    if (found == entries_.end()) {
+        Entry& entry = entries_.emplace(path, Entry{std::move(row)}).first->second;
+        join(entry);
+        return entry;
+    }
     // The key must lie in the row that stays.
     auto node = entries_.extract(found);
     node.key() = path;
@@ -28,7 +34,43 @@ ARModel::Entry& ARModel::put(ARRowPtr row) {
 }
 
 void ARModel::remove(std::string_view path) {
-    entries_.erase(path);
+    const auto found = entries_.find(path);
+    if (found == entries_.end())
+        return;
+    leave(found->second);
+    entries_.erase(found);
+}
+
+const ARModel::Entry* ARModel::firstWithin(std::string_view application) const {
+    const auto first = within_.find(application);
+    return first == within_.end() ? nullptr : first->second;
+}
+
+void ARModel::join(Entry& entry) {
+    const std::string_view application = ARApplicationPathOf(entry.row->path.view());
+    if (application.empty())
+        return;
+    auto first = within_.find(application);
+    if (first == within_.end())
+        first = within_.emplace(application, nullptr).first;
+    entry.next = std::exchange(first->second, &entry);
+    if (entry.next)
+        entry.next->previous = &entry;
+}
+
+void ARModel::leave(Entry& entry) {
+    if (entry.next)
+        entry.next->previous = entry.previous;
+    if (entry.previous) {
+        entry.previous->next = entry.next;
+        return;
+    }
+    const auto first = within_.find(ARApplicationPathOf(entry.row->path.view()));
+    if (first == within_.end())
+        return;
+    first->second = entry.next;
+    if (!entry.next)
+        within_.erase(first);
 }
 
 void ARModel::sortById(std::vector<ARRowPtr>& rows) {

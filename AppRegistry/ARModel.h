@@ -1,7 +1,9 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <memory>
+#include <string>
 #include <string_view>
 #include <unordered_map>
 #include <vector>
@@ -16,7 +18,9 @@ class ARModel {
 public:
     struct Entry {
         ARRowPtr row;
-        std::uint64_t seen = 0; // the number of the pass that met it last
+        std::uint64_t seen = 0;    // the number of the pass that met it last
+        Entry* previous = nullptr; // among the plug-ins within one application
+        Entry* next = nullptr;
     };
 
     void fill(std::vector<ARBundleRow> rows);
@@ -42,10 +46,35 @@ public:
         return picked;
     }
 
+    // The same of one item alone: of what lies at its path and, if that is an application, of the
+    // plug-ins in it.
+    template <class Wanted>
+    [[nodiscard]] std::vector<ARRowPtr> pickOf(std::string_view item, Wanted&& wanted) const {
+        std::vector<ARRowPtr> picked;
+        const auto itself = entries_.find(item);
+        if (itself != entries_.end() && wanted(itself->second))
+            picked.push_back(itself->second.row);
+        for (const Entry* entry = firstWithin(item); entry; entry = entry->next) {
+            if (wanted(*entry))
+                picked.push_back(entry->row);
+        }
+        sortById(picked);
+        return picked;
+    }
+
 private:
+    struct Hash : std::hash<std::string_view> {
+        using is_transparent = void;
+    };
+
     static void sortById(std::vector<ARRowPtr>& rows);
+    [[nodiscard]] const Entry* firstWithin(std::string_view application) const;
+    void join(Entry& entry);
+    void leave(Entry& entry);
 
     std::unordered_map<std::string_view, Entry> entries_; // keys lie in the rows
+    // By application the first of its plug-ins.
+    std::unordered_map<std::string, Entry*, Hash, std::equal_to<>> within_;
     std::int64_t lastId_ = 0;
     std::uint64_t pass_ = 0;
 };
