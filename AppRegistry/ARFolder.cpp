@@ -26,17 +26,10 @@ struct RawEntry {
     char name[1];
 };
 
-// Some file systems do not tell the type with the name.
-ARFolder::EntryType typeOf(int folder, const char* name, unsigned char type) {
-    if (type == DT_UNKNOWN) {
-        struct ::stat status = {};
-        if (::fstatat(folder, name, &status, AT_SYMLINK_NOFOLLOW) != 0)
-            return ARFolder::EntryType::other;
-        type = IFTODT(status.st_mode);
-    }
-    if (type == DT_DIR)
+ARFolder::EntryType typeOfMode(::mode_t mode) {
+    if (S_ISDIR(mode))
         return ARFolder::EntryType::folder;
-    return type == DT_LNK ? ARFolder::EntryType::link : ARFolder::EntryType::other;
+    return S_ISLNK(mode) ? ARFolder::EntryType::link : ARFolder::EntryType::other;
 }
 
 } // namespace
@@ -66,12 +59,14 @@ std::expected<ARFolder, int> ARFolder::openWithin(const std::string& name) const
 }
 
 std::string ARFolder::pathOf(std::string_view name) const {
-    std::string path;
-    path.reserve(path_.size() + 1 + name.size());
-    path = path_;
-    if (!path.ends_with('/'))
-        path += '/';
-    return path += name;
+    return ARPathIn(path_, name);
+}
+
+std::optional<ARFolder::EntryType> ARFolder::typeOf(const std::string& name) const {
+    struct ::stat status = {};
+    if (::fstatat(descriptor(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0)
+        return std::nullopt;
+    return typeOfMode(status.st_mode);
 }
 
 std::expected<std::vector<ARFolder::Entry>, int> ARFolder::entries(std::string_view suffix) const {
@@ -87,8 +82,11 @@ std::expected<std::vector<ARFolder::Entry>, int> ARFolder::entries(std::string_v
             std::memcpy(&size, raw + offsetof(RawEntry, size), sizeof size);
             const char* const name = raw + offsetof(RawEntry, name);
             const auto type = static_cast<unsigned char>(raw[offsetof(RawEntry, type)]);
-            if (ARIsNamed(name, suffix))
-                found.push_back({name, typeOf(descriptor(), name, type)});
+            if (ARIsNamed(name, suffix)) {
+                // Some file systems do not tell the type with the name.
+                const auto known = type == DT_UNKNOWN ? typeOf(name) : typeOfMode(DTTOIF(type));
+                found.push_back({name, known.value_or(EntryType::other)});
+            }
             at += size;
         }
     }
@@ -105,6 +103,15 @@ std::string_view ARNameOf(std::string_view path) {
 std::string_view ARFolderOf(std::string_view path) {
     const auto slash = path.rfind('/');
     return slash == 0 || slash == std::string_view::npos ? "/" : path.substr(0, slash);
+}
+
+std::string ARPathIn(std::string_view folder, std::string_view name) {
+    std::string path;
+    path.reserve(folder.size() + 1 + name.size());
+    path = folder;
+    if (!path.ends_with('/'))
+        path += '/';
+    return path += name;
 }
 
 bool ARIsNamed(std::string_view name, std::string_view suffix) {

@@ -36,6 +36,9 @@ public:
 
     [[nodiscard]] std::string pathOf(std::string_view name) const;
 
+    // What lies under a name; nothing when there is nothing, or it cannot be told.
+    [[nodiscard]] std::optional<EntryType> typeOf(const std::string& name) const;
+
     // What ends with `suffix` and does not begin with a dot, in order of the names. On failure
     // errno.
     [[nodiscard]] std::expected<std::vector<Entry>, int> entries(std::string_view suffix) const;
@@ -49,5 +52,6 @@ private:
 // The last component, and what is above it ("/" at the top).
 [[nodiscard]] std::string_view ARNameOf(std::string_view path);
 [[nodiscard]] std::string_view ARFolderOf(std::string_view path);
+[[nodiscard]] std::string ARPathIn(std::string_view folder, std::string_view name);
 // True for a name that ends with `suffix`, is longer and does not begin with a dot.
 [[nodiscard]] bool ARIsNamed(std::string_view name, std::string_view suffix);
