@@ -5,6 +5,8 @@
 #include <sys/stat.h>
 #include <system_error>
 
+#include "AppRegistry/ARWatches.h"
+
 namespace {
 
 constexpr const char* infoName = "/Info.plist";
@@ -44,16 +46,19 @@ bool ARIsExecutableName(std::string_view name) {
            name.find('\0') == name.npos;
 }
 
-std::optional<std::string> ARBundleFiles::refusal(const ARCandidate& candidate) const {
+std::expected<std::uint64_t, std::string>
+ARBundleFiles::folderOf(const ARCandidate& candidate) const {
     if (candidate.kind == ARKind::extensionPoint)
-        return std::nullopt; // the file itself is tested with its stamp
+        return 0; // the file itself is tested with its stamp
     struct ::stat status = {};
     const std::string name(candidate.name);
     if (::fstatat(candidate.folder.descriptor(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0)
-        return std::generic_category().message(errno);
+        return std::unexpected(std::generic_category().message(errno));
     if (!S_ISDIR(status.st_mode))
-        return "it is not a folder";
-    return platform::OwnershipTest::refusalOf(status, candidate.path);
+        return std::unexpected("it is not a folder");
+    if (auto refusal = platform::OwnershipTest::refusalOf(status, candidate.path))
+        return std::unexpected(std::move(*refusal));
+    return status.st_ino;
 }
 
 std::expected<ARStamp, std::string> ARBundleFiles::stamp(const ARCandidate& candidate,
@@ -67,13 +72,15 @@ std::expected<ARStamp, std::string> ARBundleFiles::stamp(const ARCandidate& cand
         return unreadable(candidate.folder.pathOf(name), errno);
     }
     if (S_ISLNK(status.st_mode))
-        return stampBehindLink(candidate.folder.pathOf(name));
+        return stampBehindLink(candidate.folder.pathOf(name), candidate.item);
     if (S_ISREG(status.st_mode) && !platform::OwnershipTest::refusalOf(status, {}))
         return stampOf(status, {});
     return stampOf(status, candidate.folder.pathOf(name));
 }
 
-std::expected<ARStamp, std::string> ARBundleFiles::stampBehindLink(const std::string& path) const {
+std::expected<ARStamp, std::string> ARBundleFiles::stampBehindLink(const std::string& path,
+                                                                   const std::string& item) const {
+    watches_.watchFile(item, path);
     const auto target = platform::canonicalPath(path);
     if (!target)
         return target.error() == ENOENT ? ARStamp{} : unreadable(path, target.error());

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <array>
+#include <cstdint>
 #include <expected>
 #include <optional>
 #include <string>
@@ -9,13 +10,16 @@
 #include "AppRegistry/ARBundleRow.h"
 #include "AppRegistry/ARFolder.h"
 
+class ARWatches;
+
 // Something that may be a bundle: a folder (or, of an extension point, a file) by its name in an
 // opened folder.
 struct ARCandidate {
     ARKind kind;
     const ARFolder& folder;
     std::string_view name;
-    std::string_view path; // canonical
+    std::string_view path;   // canonical
+    const std::string& item; // that its watches belong to
 };
 
 // The names of a candidate's counting files below its folder, from the name of its executable
@@ -27,13 +31,15 @@ ARCountingFileNames(const ARCandidate& candidate, std::string_view executable);
 [[nodiscard]] bool ARIsExecutableName(std::string_view name);
 
 // Looks at the files that make a bundle what it is, without opening them. Only for the time of
-// one pass, on the thread of that pass; the ownership test must outlive it.
+// one pass, on the thread of that pass; the ownership test and the watches must outlive it.
 class ARBundleFiles {
 public:
-    explicit ARBundleFiles(platform::OwnershipTest& ownership) : ownership_(ownership) {}
+    ARBundleFiles(platform::OwnershipTest& ownership, ARWatches& watches)
+        : ownership_(ownership), watches_(watches) {}
 
-    // Why the candidate's own folder cannot be trusted; nothing when it can.
-    [[nodiscard]] std::optional<std::string> refusal(const ARCandidate& candidate) const;
+    // What the candidate's own folder goes by in its file system, or why it cannot be trusted.
+    [[nodiscard]] std::expected<std::uint64_t, std::string>
+    folderOf(const ARCandidate& candidate) const;
 
     // The stamp of one file, all zero when it is missing. Else the reason why the bundle cannot
     // be trusted or read: a file of someone else, or one that is not regular.
@@ -45,7 +51,8 @@ public:
 
 private:
     [[nodiscard]] std::expected<ARStamp, std::string>
-    stampBehindLink(const std::string& path) const;
+    stampBehindLink(const std::string& path, const std::string& item) const;
 
     platform::OwnershipTest& ownership_;
+    ARWatches& watches_;
 };

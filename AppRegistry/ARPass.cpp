@@ -1,7 +1,7 @@
 #include "AppRegistry/ARPass.h"
 
 #include <algorithm>
-#include <cmath>
+#include <sys/stat.h>
 
 #include "AppRegistry/ARGrants.h"
 #include "platform/ipc/Cbor.h"
@@ -19,47 +19,89 @@ bool liesBelow(std::string_view path, std::string_view folder) {
 
 } // namespace
 
-ARPass::ARPass(ARStore& store, ARModel& model, ARComplaints& complaints, ARGrants& grants,
-               Apply apply)
-    : store_(store),
-      model_(model),
-      complaints_(complaints),
-      grants_(grants),
+bool ARBatch::declaresTypes() const {
+    const auto declares = [](const ARRowPtr& row) { return row->declaresTypes; };
+    return std::ranges::any_of(removed, declares) || std::ranges::any_of(added, declares);
+}
+
+ARPass::ARPass(const Parts& parts, Apply apply)
+    : store_(parts.store),
+      model_(parts.model),
+      complaints_(parts.complaints),
+      grants_(parts.grants),
+      watches_(parts.watches),
       apply_(std::move(apply)),
-      number_(model.beginPass()),
+      number_(model_.beginPass()),
       batchBegan_(std::chrono::steady_clock::now()) {}
 
-void ARPass::run(const platform::Places& places, const ARKeptPaths::Paths& kept) {
+void ARPass::run(const platform::Places& places, ARDepth depth, const ARKeptPaths::Paths& kept) {
+    full_ = true;
     keptAway_.insert(kept.withdrawn.begin(), kept.withdrawn.end());
+    watches_.beginFullPass(depth);
     scanner_.scan(places);
-    presence_ = ARPresence::added;
-    const auto elsewhere = model_.pick([&](const ARModel::Entry& entry) {
+    const auto added = model_.pick([&](const ARModel::Entry& entry) {
         return entry.seen != number_ && entry.row->kind == ARKind::plugIn &&
                entry.row->presence == ARPresence::added;
     });
-    for (const ARRowPtr& row : elsewhere)
-        bring(std::string(row->path.view()));
+    std::set<std::string> items;
+    for (const ARRowPtr& row : added)
+        items.emplace(ARItemOf(row->path.view()));
+    for (const std::string& item : items)
+        lookAtAdded(item);
+    presence_ = ARPresence::added;
     for (const std::string& path : kept.added)
         bring(path);
     removeUnseen();
-    removeIdleApplications();
     flush();
+    complaints_.endPass(number_);
+    watches_.endFullPass();
+}
+
+void ARPass::look(const std::vector<std::string>& items) {
+    watches_.beginPass(ARDepth::everything);
+    for (const std::string& item : items) {
+        const auto kind = ARKindOfName(ARNameOf(item));
+        const std::string folder(ARFolderOf(item));
+        if (kind && watches_.isRoot(*kind, folder)) {
+            presence_ = ARPresence::found;
+            scanner_.scanItem(*kind, folder, std::string(ARNameOf(item)));
+        } else {
+            lookAtAdded(item);
+        }
+    }
+    flush();
+}
+
+void ARPass::lookAtAdded(const std::string& item) {
+    presence_ = ARPresence::added;
+    const auto added = model_.pickOf(item, [](const ARModel::Entry& entry) {
+        return entry.row->kind == ARKind::plugIn && entry.row->presence == ARPresence::added;
+    });
+    for (int attempt = 0; attempt < ARScanner::mostAttempts; ++attempt) {
+        beginItem(item);
+        for (const ARRowPtr& row : added)
+            bring(std::string(row->path.view()));
+        if (endItem())
+            return;
+    }
 }
 
 // ---- Registration by path
 
 std::optional<std::string> ARPass::add(const std::string& path, const platform::Places& places) {
     asked_ = true;
+    watches_.beginPass(ARDepth::roots); // a look that follows sets the others
     presence_ = scanner_.reaches(path, places) ? ARPresence::found : ARPresence::added;
     lastRefusal_ = "it is not a plug-in";
     if (bring(path))
         return flushAsked();
-    batch_ = {};
-    takeBack();
+    takeBack(0, {});
     return lastRefusal_;
 }
 
 bool ARPass::bring(const std::string& path) {
+    if (!asked_)
+        watches_.watchWay(std::string(ARItemOf(path)), path);
     const std::string application(ARApplicationPathOf(path));
     if (!application.empty() && !meet(ARKind::application, application))
         return false;
@@ -67,7 +109,7 @@ bool ARPass::bring(const std::string& path) {
 }
 
 bool ARPass::meet(ARKind kind, const std::string& path) {
-    scanner_.scanBundle(kind, path);
+    scanner_.scanBundle(kind, path, std::string(ARItemOf(path)));
     const ARModel::Entry* entry = model_.find(path);
     return entry && entry->seen == number_;
 }
@@ -84,7 +126,7 @@ std::optional<std::string> ARPass::withdraw(const std::string& path) {
     } else {
         remove(entry->row);
     }
-    removeIdleApplications();
+    removeIdleApplication(ARApplicationPathOf(path));
     return flushAsked();
 }
 
@@ -96,13 +138,56 @@ std::optional<std::string> ARPass::flushAsked() {
 
 // ---- What the scanner comes upon
 
+void ARPass::beginItem(const std::string& item) {
+    item_ = item;
+    beforeItem_ = before_.size();
+    began_ = mark();
+    abandoned_ = false;
+    folder_.reset();
+    refusals_.clear();
+    watches_.beginLook(item);
+}
+
+bool ARPass::endItem() {
+    removeUnseenOfItem();
+    removeIdleApplication(item_);
+    const bool torn = !abandoned_ && mark() != began_ && isTorn();
+    const std::string item = std::exchange(item_, {});
+    if (torn || abandoned_)
+        takeBack(beforeItem_, began_);
+    if (!full_)
+        watches_.endLook(item);
+    if (torn || abandoned_)
+        return abandoned_;
+    for (const auto& [path, reason] : refusals_)
+        complaints_.report(path, reason, number_);
+    complaints_.endItem(item, number_);
+    flushWhenDue();
+    return true;
+}
+
+// The item must have been one and the same while it was read. An exchange is told of by its event;
+// where that is not out yet, another folder lies there by now.
+bool ARPass::isTorn() {
+    if (watches_.hasMoved(item_))
+        return true;
+    struct ::stat status = {};
+    return folder_ && (::lstat(item_.c_str(), &status) != 0 || status.st_ino != *folder_);
+}
+
 bool ARPass::found(const ARCandidate& candidate) {
     ARModel::Entry* entry = model_.find(candidate.path);
     if (entry && entry->seen == number_)
         return false; // reached twice
-    if (const auto refusal = files_.refusal(candidate)) {
-        refused(std::string(candidate.path), *refusal);
+    const auto folder = files_.folderOf(candidate);
+    if (!folder) {
+        refused(std::string(candidate.path), folder.error());
         return false;
+    }
+    if (candidate.kind != ARKind::extensionPoint) {
+        if (candidate.path == item_)
+            folder_ = *folder;
+        watches_.watchBundle(candidate.item, std::string(candidate.path));
     }
     bool there = true;
     if (entry && unchanged(candidate, *entry->row) && !comesBack(*entry->row)) {
@@ -110,7 +195,6 @@ bool ARPass::found(const ARCandidate& candidate) {
     } else {
         there = readAgain(candidate, entry ? entry->row.get() : nullptr);
     }
-    flushWhenDue();
     // Of an application that was added for one plug-in the others stay unknown.
     return there && presence_ == ARPresence::found && !asked_;
 }
@@ -118,8 +202,23 @@ bool ARPass::found(const ARCandidate& candidate) {
 // Clients can ask for any number of paths: what became of those is not remembered.
 void ARPass::refused(const std::string& path, const std::string& reason) {
     lastRefusal_ = reason;
-    if (!asked_)
-        complaints_.report(path, reason);
+    if (asked_)
+        return;
+    if (item_.empty())
+        complaints_.report(path, reason, number_);
+    else
+        refusals_.emplace_back(path, reason);
+}
+
+// What lies behind a link may be anywhere: only a pass over everything can tell what is gone there.
+bool ARPass::foundLink(const std::string& path) {
+    watches_.leadsAway(item_.empty() ? path : item_);
+    watches_.watchWay(ARWatches::everything, path);
+    if (full_)
+        return true;
+    watches_.markEverything();
+    abandoned_ = true;
+    return false;
 }
 
 void ARPass::unreadable(const std::string& path, const std::string& reason) {
@@ -142,6 +241,7 @@ bool ARPass::unchanged(const ARCandidate& candidate, const ARBundleRow& row) con
 }
 
 void ARPass::keep(const ARCandidate& candidate, ARModel::Entry& entry) {
+    before_.push_back({entry.row, entry.seen});
     entry.seen = number_;
     const bool placeholder =
         candidate.kind == ARKind::application && files_.isPlaceholder(candidate);
@@ -178,8 +278,8 @@ bool ARPass::readAgain(const ARCandidate& candidate, const ARBundleRow* known) {
 ARPresence ARPass::presenceOf(const ARCandidate& candidate, const ARBundleRow* old) {
     if (old && old->presence == ARPresence::found)
         return ARPresence::found; // what the folders lead to stays theirs
-    const bool isKeptAway = !asked_ && candidate.kind == ARKind::plugIn && !old &&
-                            keptAway_.erase(std::string(candidate.path)) > 0;
+    const bool isKeptAway =
+        !asked_ && candidate.kind == ARKind::plugIn && !old && keptAway_.contains(candidate.path);
     return isKeptAway ? ARPresence::withdrawn : presence_;
 }
 
@@ -197,7 +297,7 @@ void ARPass::enlist(ARBundleContent&& content, const ARCandidate& candidate,
     }
     keepSignature(row.id, content);
     const auto shared = std::make_shared<const ARBundleRow>(std::move(row));
-    remember(shared->path.view());
+    remember(shared);
     model_.put(shared).seen = number_;
     batch_.pathsChanged |= ARIsRegisteredByPath(*shared);
     batch_.changes.added.push_back({*shared, content.digests, platform::ipc::encode(content.info)});
@@ -228,7 +328,7 @@ void ARPass::replace(ARBundleRow&& row) {
         old.placeholder != shared->placeholder ||
         (old.presence == ARPresence::withdrawn) != (shared->presence == ARPresence::withdrawn);
     batch_.pathsChanged |= old.kind == ARKind::plugIn && old.presence != shared->presence;
-    remember(shared->path.view());
+    remember(shared);
     model_.put(shared).seen = number_;
     batch_.changes.updated.push_back(*shared);
     if (!visible)
@@ -238,7 +338,7 @@ void ARPass::replace(ARBundleRow&& row) {
 }
 
 void ARPass::remove(ARRowPtr row) {
-    remember(row->path.view());
+    remember(row);
     model_.remove(row->path.view());
     batch_.pathsChanged |= ARIsRegisteredByPath(*row);
     grants_.forget(row->path.view());
@@ -247,33 +347,44 @@ void ARPass::remove(ARRowPtr row) {
     batch_.visible = true;
 }
 
+// What no folder led to.
 void ARPass::removeUnseen() {
-    const auto gone = model_.pick([&](const ARModel::Entry& entry) {
+    auto gone = model_.pick([&](const ARModel::Entry& entry) {
         return entry.seen != number_ && !maybeThere(entry.row->path.view());
     });
-    for (const ARRowPtr& row : gone) {
-        remove(row);
-        flushWhenDue();
+    const auto itemOf = [](const ARRowPtr& row) { return ARItemOf(row->path.view()); };
+    std::ranges::stable_sort(gone, {}, itemOf);
+    for (std::size_t i = 0; i < gone.size(); ++i) {
+        if (i > 0 && itemOf(gone[i]) != itemOf(gone[i - 1]))
+            flushWhenDue();
+        remove(gone[i]);
     }
+}
+
+// In a pass over everything, bundles that were added by path are looked at later.
+void ARPass::removeUnseenOfItem() {
+    const auto gone = model_.pickOf(item_, [&](const ARModel::Entry& entry) {
+        if (entry.seen == number_)
+            return false;
+        const bool added = entry.row->presence == ARPresence::added;
+        const bool theirs = presence_ == ARPresence::added ? added : !(full_ && added);
+        return theirs && !maybeThere(entry.row->path.view());
+    });
+    for (const ARRowPtr& row : gone)
+        remove(row);
 }
 
 // An application that no folder leads to is there for its plug-ins.
-void ARPass::removeIdleApplications() {
-    const auto added = model_.pick([](const ARModel::Entry& entry) {
-        return entry.row->kind == ARKind::application && entry.row->presence == ARPresence::added;
+void ARPass::removeIdleApplication(std::string_view path) {
+    const ARModel::Entry* const application = model_.find(path);
+    if (!application || application->row->kind != ARKind::application ||
+        application->row->presence != ARPresence::added)
+        return;
+    const auto within = model_.pickOf(path, [](const ARModel::Entry& entry) {
+        return entry.row->kind == ARKind::plugIn && entry.row->presence != ARPresence::withdrawn;
     });
-    for (const ARRowPtr& row : added) {
-        if (!hasPlugIns(row->path.view()))
-            remove(row);
-    }
-}
-
-bool ARPass::hasPlugIns(std::string_view application) const {
-    const auto within = model_.pick([&](const ARModel::Entry& entry) {
-        return entry.row->kind == ARKind::plugIn && entry.row->presence != ARPresence::withdrawn &&
-               ARApplicationPathOf(entry.row->path.view()) == application;
-    });
-    return !within.empty();
+    if (within.empty())
+        remove(ARRowPtr(application->row));
 }
 
 bool ARPass::maybeThere(std::string_view path) const {
@@ -290,23 +401,52 @@ void ARPass::flushWhenDue() {
 bool ARPass::flush() {
     const bool accepted = batch_.empty() || apply_(std::exchange(batch_, {}));
     if (!accepted)
-        takeBack();
+        takeBack(0, {});
     before_.clear();
     batchBegan_ = std::chrono::steady_clock::now();
     return accepted;
 }
 
-void ARPass::remember(std::string_view path) {
-    const ARModel::Entry* const entry = model_.find(path);
-    before_.push_back({std::string(path), entry ? std::optional(*entry) : std::nullopt});
+void ARPass::remember(const ARRowPtr& coming) {
+    const ARModel::Entry* const entry = model_.find(coming->path.view());
+    before_.push_back(entry ? Before{entry->row, entry->seen} : Before{coming, 0, true});
 }
 
-void ARPass::takeBack() {
-    for (auto before = before_.rbegin(); before != before_.rend(); ++before) {
-        if (before->entry)
-            model_.put(before->entry->row).seen = before->entry->seen;
+namespace {
+
+// What grows while a batch is made.
+template <class Batch, class Act>
+void eachList(Batch& batch, Act&& act) {
+    std::size_t number = 0;
+    act(number++, batch.changes.added);
+    act(number++, batch.changes.updated);
+    act(number++, batch.changes.removed);
+    act(number++, batch.changes.signatures);
+    act(number++, batch.added);
+    act(number++, batch.updated);
+    act(number++, batch.removed);
+}
+
+} // namespace
+
+ARPass::Mark ARPass::mark() const {
+    Mark mark{.visible = batch_.visible, .pathsChanged = batch_.pathsChanged};
+    eachList(batch_, [&](std::size_t i, const auto& list) { mark.sizes.at(i) = list.size(); });
+    return mark;
+}
+
+void ARPass::takeBack(std::size_t before, const Mark& mark) {
+    for (; before_.size() > before; before_.pop_back()) {
+        const Before& last = before_.back();
+        if (last.isNew)
+            model_.remove(last.row->path.view());
         else
-            model_.remove(before->path);
+            model_.put(last.row).seen = last.seen;
     }
-    before_.clear();
+    eachList(batch_, [&](std::size_t i, auto& list) {
+        const auto size = static_cast<std::ptrdiff_t>(std::min(mark.sizes.at(i), list.size()));
+        list.erase(list.begin() + size, list.end());
+    });
+    batch_.visible = mark.visible;
+    batch_.pathsChanged = mark.pathsChanged;
 }

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <array>
 #include <chrono>
 #include <functional>
 #include <optional>
@@ -15,6 +16,7 @@
 #include "AppRegistry/ARModel.h"
 #include "AppRegistry/ARScanner.h"
 #include "AppRegistry/ARStore.h"
+#include "AppRegistry/ARWatches.h"
 #include "platform/paths/Places.h"
 
 class ARGrants;
@@ -29,13 +31,17 @@ struct ARBatch {
     bool pathsChanged = false; // of plug-ins that were registered or unregistered by path
 
     [[nodiscard]] bool empty() const { return changes.empty(); }
+
+    // Whether it holds anything that declares types.
+    [[nodiscard]] bool declaresTypes() const;
 };
 
-// One comparison of the registry with the folders. Bundles whose files did not change are only
-// looked at; the others are read again. The model follows at once; the changes are handed to
-// `apply` in batches of at most 20 ms of work, those of one registration together. A batch that is
-// refused is taken back from the model. Lives for one pass on the registry's queue; what it is
-// given must outlive it.
+// One comparison of the registry with the folders: of everything, or of single items. Bundles whose
+// files did not change are only looked at; the others are read again. The model follows at once;
+// the changes are handed to `apply` in batches of at most 20 ms of work, those of one item always
+// together. A batch that is refused is taken back from the model, and so is what was learnt of an
+// item that was exchanged for another one meanwhile. Lives for one pass on the registry's queue;
+// what it is given must outlive it.
 class ARPass final : private ARScanSink {
 public:
     static constexpr std::chrono::milliseconds longestBatch{20};
@@ -43,10 +49,20 @@ public:
     // False when the batch was refused.
     using Apply = std::function<bool(ARBatch&&)>;
 
-    ARPass(ARStore& store, ARModel& model, ARComplaints& complaints, ARGrants& grants, Apply apply);
+    struct Parts {
+        ARStore& store;
+        ARModel& model;
+        ARComplaints& complaints;
+        ARGrants& grants;
+        ARWatches& watches;
+    };
+
+    ARPass(const Parts& parts, Apply apply);
 
     // Looks at everything; what was not met is gone. `kept` is what a lost database knew of paths.
-    void run(const platform::Places& places, const ARKeptPaths::Paths& kept = {});
+    void run(const platform::Places& places, ARDepth depth, const ARKeptPaths::Paths& kept = {});
+    // Looks at single items.
+    void look(const std::vector<std::string>& items);
     // Registers one plug-in by canonical path, with the application that it lies in; it stays until
     // it is withdrawn or vanishes. Withdrawn ones come back. On failure the reason, and nothing has
     // changed.
@@ -57,10 +73,14 @@ public:
     [[nodiscard]] std::optional<std::string> withdraw(const std::string& path);
 
 private:
+    void beginItem(const std::string& item) override;
+    [[nodiscard]] bool endItem() override;
     bool found(const ARCandidate& candidate) override;
+    bool foundLink(const std::string& path) override;
     void refused(const std::string& path, const std::string& reason) override;
     void unreadable(const std::string& path, const std::string& reason) override;
 
+    void lookAtAdded(const std::string& item);
     // One plug-in by its canonical path, with the application that it lies in. False when it does
     // not count.
     bool bring(const std::string& path);
@@ -78,37 +98,59 @@ private:
     void replace(ARBundleRow&& row);
     void remove(ARRowPtr row);
     void removeUnseen();
-    void removeIdleApplications();
-    [[nodiscard]] bool hasPlugIns(std::string_view application) const;
+    void removeUnseenOfItem();
+    void removeIdleApplication(std::string_view path);
     [[nodiscard]] bool maybeThere(std::string_view path) const;
     void flushWhenDue();
     bool flush();
-    void takeBack();
 
-    // What the model had under a path before this batch.
+    // What the model had under a path before this batch: that row, unless it came new.
     struct Before {
-        std::string path;
-        std::optional<ARModel::Entry> entry;
+        ARRowPtr row;
+        std::uint64_t seen = 0;
+        bool isNew = false;
     };
 
-    void remember(std::string_view path);
+    // How far a batch has come.
+    struct Mark {
+        std::array<std::size_t, 7> sizes{};
+        bool visible = false;
+        bool pathsChanged = false;
+
+        friend bool operator==(const Mark&, const Mark&) = default;
+    };
+
+    void remember(const ARRowPtr& coming);
+    [[nodiscard]] Mark mark() const;
+    void takeBack(std::size_t before, const Mark& mark);
+    [[nodiscard]] bool isTorn();
 
     ARStore& store_;
     ARModel& model_;
     ARComplaints& complaints_;
     ARGrants& grants_;
+    ARWatches& watches_;
     Apply apply_;
     platform::OwnershipTest ownership_;
-    ARBundleFiles files_{ownership_};
+    ARBundleFiles files_{ownership_, watches_};
     ARBundleReader reader_{files_};
-    ARScanner scanner_{*this, ownership_};
+    ARScanner scanner_{*this, ownership_, watches_};
     std::uint64_t number_;
     ARPresence presence_ = ARPresence::found;     // of what is met now
+    bool full_ = false;                           // everything is looked at
     bool asked_ = false;                          // somebody wants this very bundle
-    std::set<std::string, std::less<>> keptAway_; // not yet met
+    std::set<std::string, std::less<>> keptAway_; // by what a lost database knew
     ARBatch batch_;
     std::vector<Before> before_;
     std::chrono::steady_clock::time_point batchBegan_;
     std::vector<std::string> unreadable_;
     std::string lastRefusal_;
+
+    // Of the item that is looked at now.
+    std::string item_;
+    std::size_t beforeItem_ = 0;
+    Mark began_;
+    bool abandoned_ = false;              // everything is to be looked at instead
+    std::optional<std::uint64_t> folder_; // of the item, in its file system
+    std::vector<std::pair<std::string, std::string>> refusals_; // path and reason
 };

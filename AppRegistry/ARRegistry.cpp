@@ -57,7 +57,8 @@ ARRegistry::~ARRegistry() {
 
 template <class Act, class Apply>
 auto ARRegistry::pass(Act&& act, Apply&& apply) {
-    ARPass pass(*store_, model_, complaints_, context_->grants, std::forward<Apply>(apply));
+    ARPass pass({*store_, model_, complaints_, context_->grants, watches_},
+                std::forward<Apply>(apply));
     return act(pass);
 }
 
@@ -65,11 +66,14 @@ auto ARRegistry::pass(Act&& act, Apply&& apply) {
 // then: what a crash left behind half made counts as new again.
 void ARRegistry::firstPass(bool isComplete) {
     const ARKeptPaths::Paths kept = keptPaths_.read();
-    pass([&](ARPass& pass) { pass.run(places_, isComplete ? ARKeptPaths::Paths() : kept); },
-         [this](ARBatch&& batch) {
-             store(batch);
-             return true;
-         });
+    pass(
+        [&](ARPass& pass) {
+            pass.run(places_, ARDepth::roots, isComplete ? ARKeptPaths::Paths() : kept);
+        },
+        [this](ARBatch&& batch) {
+            store(batch);
+            return true;
+        });
     keptPaths_.keep(model_);
     if (!isComplete)
         committer_.markComplete();
@@ -109,7 +113,8 @@ void ARRegistry::show(const ARBatch& batch) {
     auto next = std::make_shared<ARSnapshot>(*context_->published.get());
     const auto outcome = editor_.apply(*next, batch);
     publish(std::move(next));
-    declareTypes();
+    if (batch.declaresTypes())
+        declareTypes();
     ARWorkspaceObserver* const observer = observer_;
     if (observer && !outcome.uninstalled.empty())
         observer->pluginsWillUninstall(outcome.uninstalled);
@@ -139,25 +144,50 @@ void ARRegistry::declareTypes() {
 }
 
 void ARRegistry::rescan() {
-    queue_.sync([this] {
-        pass([this](ARPass& pass) { pass.run(places_); },
-             [this](ARBatch&& batch) {
-                 store(batch);
-                 show(batch);
-                 return true;
-             });
-    });
+    queue_.sync([this] { lookAtEverything(); });
 }
 
+void ARRegistry::follow(std::function<void()> done) {
+    const auto act = [this] {
+        const ARDirt::Due due = watches_.takeDue(ARDirt::Clock::now());
+        if (due.everything)
+            lookAtEverything();
+        else
+            lookAt(due.items);
+    };
+    queue_.async(act, std::move(done));
+}
+
+// What the folders tell can be told again: where it cannot be stored it is shown all the same.
+bool ARRegistry::storeAndShow(ARBatch&& batch) {
+    store(batch);
+    show(batch);
+    return true;
+}
+
+void ARRegistry::lookAtEverything() {
+    pass([this](ARPass& pass) { pass.run(places_, ARDepth::everything); },
+         [this](ARBatch&& batch) { return storeAndShow(std::move(batch)); });
+}
+
+void ARRegistry::lookAt(const std::vector<std::string>& items) {
+    pass([&](ARPass& pass) { pass.look(items); },
+         [this](ARBatch&& batch) { return storeAndShow(std::move(batch)); });
+}
+
+// Afterwards the item is looked at, which watches what is there now.
 template <class Act>
 std::optional<platform::Error> ARRegistry::carryOut(const std::string& path, Act&& act) {
     const std::optional<std::string> refusal = queue_.sync([&] {
-        return pass(std::forward<Act>(act), [this](ARBatch&& batch) {
+        auto refused = pass(std::forward<Act>(act), [this](ARBatch&& batch) {
             if (!storeNow(batch))
                 return false;
             show(batch);
             return true;
         });
+        if (!refused)
+            lookAt({std::string(ARItemOf(path))});
+        return refused;
     });
     if (!refusal)
         return std::nullopt;

@@ -2,6 +2,7 @@
 
 #include <atomic>
 #include <expected>
+#include <functional>
 #include <memory>
 #include <string>
 
@@ -13,6 +14,7 @@
 #include "AppRegistry/ARProxyContext.h"
 #include "AppRegistry/ARSnapshotEditor.h"
 #include "AppRegistry/ARStore.h"
+#include "AppRegistry/ARWatches.h"
 #include "platform/paths/Places.h"
 #include "platform/queue/SerialQueue.h"
 #include "platform/value/Error.h"
@@ -60,6 +62,13 @@ public:
     // Compares everything with the folders again, and waits for it.
     void rescan();
 
+    // Tells what has to be compared again while the folders change.
+    [[nodiscard]] ARWatches& watches() { return watches_; }
+
+    // Compares that, and calls `done` afterwards; waits for neither. `done` comes on the queue's
+    // thread, when the queue was let go.
+    void follow(std::function<void()> done);
+
 private:
     ARRegistry(platform::Places places, std::shared_ptr<ARStore> store, ARStore::Content content,
                std::shared_ptr<ARProxyContext> context, platform::Types& types);
@@ -75,6 +84,9 @@ private:
     [[nodiscard]] bool storeNow(ARBatch& batch);
     void storeLearntGrants();
     void show(const ARBatch& batch);
+    bool storeAndShow(ARBatch&& batch);
+    void lookAtEverything();
+    void lookAt(const std::vector<std::string>& items);
     // Registers or unregisters: what was asked for is stored before anybody sees it.
     template <class Act>
     [[nodiscard]] std::optional<platform::Error> carryOut(const std::string& path, Act&& act);
@@ -93,6 +105,7 @@ private:
     ARKeptPaths keptPaths_;
     ARModel model_;
     ARComplaints complaints_;
+    ARWatches watches_; // locks by itself
     ARSnapshotEditor editor_;
     ARKnowledge knowledge_;
 

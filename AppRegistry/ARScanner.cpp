@@ -4,6 +4,7 @@
 #include <cerrno>
 #include <system_error>
 
+#include "AppRegistry/ARWatches.h"
 #include "platform/bundle/ExtensionPoints.h"
 #include "platform/file/File.h"
 
@@ -19,6 +20,19 @@ std::string_view ARSuffixOf(ARKind kind) {
     return platform::extensionPointSuffix;
 }
 
+std::optional<ARKind> ARKindOfName(std::string_view name) {
+    for (const ARKind kind : {ARKind::application, ARKind::plugIn, ARKind::extensionPoint}) {
+        if (ARIsNamed(name, ARSuffixOf(kind)))
+            return kind;
+    }
+    return std::nullopt;
+}
+
+std::string_view ARItemOf(std::string_view path) {
+    const std::string_view application = ARApplicationPathOf(path);
+    return application.empty() ? path : application;
+}
+
 std::string_view ARApplicationPathOf(std::string_view plugInPath) {
     const std::string_view plugIns = ARFolderOf(plugInPath);
     const std::string_view application = ARFolderOf(plugIns);
@@ -29,11 +43,11 @@ std::string_view ARApplicationPathOf(std::string_view plugInPath) {
 
 void ARScanner::scan(const platform::Places& places) {
     for (const std::string& folder : places.extensionPointFolders)
-        scanFolder(ARKind::extensionPoint, folder);
+        scanRoot(ARKind::extensionPoint, folder);
     for (const std::string& folder : places.applicationFolders)
-        scanFolder(ARKind::application, folder);
+        scanRoot(ARKind::application, folder);
     for (const std::string& folder : places.plugInFolders)
-        scanFolder(ARKind::plugIn, folder);
+        scanRoot(ARKind::plugIn, folder);
 }
 
 bool ARScanner::reaches(std::string_view plugInPath, const platform::Places& places) const {
@@ -45,89 +59,137 @@ bool ARScanner::reaches(std::string_view plugInPath, const platform::Places& pla
         [&](const std::string& watched) { return platform::canonicalPath(watched) == folder; });
 }
 
-void ARScanner::scanFolder(ARKind kind, const std::string& folder) {
+void ARScanner::scanRoot(ARKind kind, const std::string& folder) {
+    watches_.watchWay(ARWatches::everything, folder);
     const auto path = platform::canonicalPath(folder);
-    if (!path) {
-        complain(folder, path.error());
-        return;
-    }
+    if (!path)
+        return complain(folder, path.error());
+    watches_.watchRoot(kind, *path);
     const auto opened = ARFolder::open(*path, ownership_);
-    if (opened) {
-        scanEntries(kind, *opened);
-    } else {
-        complain(*path, opened.error());
-    }
-}
-
-void ARScanner::scanBundle(ARKind kind, const std::string& path) {
-    const auto canonical = platform::canonicalPath(path);
-    if (!canonical) {
-        complain(path, canonical.error());
-        return;
-    }
-    const std::string_view name = ARNameOf(*canonical);
-    if (!ARIsNamed(name, ARSuffixOf(kind))) {
-        sink_.refused(path, "it leads to what is not named like a bundle");
-        return;
-    }
-    const auto folder = ARFolder::open(std::string(ARFolderOf(*canonical)), ownership_);
-    if (folder) {
-        offer(kind, *folder, name);
-    } else {
-        complain(*canonical, folder.error());
-    }
-}
-
-void ARScanner::scanEntries(ARKind kind, const ARFolder& folder) {
-    const auto entries = folder.entries(ARSuffixOf(kind));
-    if (!entries) {
-        complain(folder.path(), entries.error());
-        return;
-    }
+    const auto entries =
+        opened ? opened->entries(ARSuffixOf(kind)) : std::unexpected(opened.error());
+    if (!entries)
+        return complain(*path, entries.error());
     for (const ARFolder::Entry& entry : *entries)
-        scanEntry(kind, folder, entry);
+        look(kind, *opened, entry.name, entry.type);
 }
 
-void ARScanner::scanEntry(ARKind kind, const ARFolder& folder, const ARFolder::Entry& entry) {
-    if (entry.type == ARFolder::EntryType::link) {
-        if (folder.refusal()) {
-            sink_.refused(folder.pathOf(entry.name), *folder.refusal());
-        } else {
-            scanBundle(kind, folder.pathOf(entry.name));
-        }
-        return;
+void ARScanner::scanItem(ARKind kind, const std::string& folder, const std::string& name) {
+    auto known = opened_.find(folder);
+    if (known == opened_.end()) {
+        auto opened = ARFolder::open(folder, ownership_);
+        if (!opened)
+            return complain(folder, opened.error());
+        known = opened_.emplace(folder, std::move(*opened)).first;
     }
-    const bool wantsFolder = kind != ARKind::extensionPoint;
-    if (wantsFolder == (entry.type == ARFolder::EntryType::folder))
-        offer(kind, folder, entry.name);
+    look(kind, known->second, name, known->second.typeOf(name));
 }
 
-void ARScanner::offer(ARKind kind, const ARFolder& folder, std::string_view name) {
+void ARScanner::look(ARKind kind, const ARFolder& folder, const std::string& name,
+                     std::optional<ARFolder::EntryType> type) {
+    if (type == ARFolder::EntryType::link)
+        return followLink(kind, folder, name);
+    const auto wanted =
+        kind == ARKind::extensionPoint ? ARFolder::EntryType::other : ARFolder::EntryType::folder;
+    const std::string item = folder.pathOf(name);
+    for (int attempt = 0; attempt < mostAttempts; ++attempt) {
+        sink_.beginItem(item);
+        if (type == wanted)
+            offer(kind, folder, name, item);
+        if (sink_.endItem())
+            return;
+        type = folder.typeOf(name);
+    }
+}
+
+// What a link leads to is an item as well. It is looked at again with everything else.
+void ARScanner::followLink(ARKind kind, const ARFolder& folder, const std::string& name) {
+    const std::string link = folder.pathOf(name);
+    if (folder.refusal())
+        return sink_.refused(link, *folder.refusal());
+    if (!sink_.foundLink(link))
+        return;
+    const auto path = platform::canonicalPath(link);
+    if (!path)
+        return complain(link, path.error());
+    for (int attempt = 0; attempt < mostAttempts; ++attempt) {
+        sink_.beginItem(*path);
+        watches_.leadsAway(*path);
+        scanBundle(kind, link, *path);
+        if (sink_.endItem())
+            return;
+    }
+}
+
+void ARScanner::scanBundle(ARKind kind, const std::string& path, const std::string& item) {
+    const auto canonical = platform::canonicalPath(path);
+    if (!canonical)
+        return complain(path, canonical.error());
+    const std::string_view name = ARNameOf(*canonical);
+    if (!ARIsNamed(name, ARSuffixOf(kind)))
+        return sink_.refused(path, "it leads to what is not named like a bundle");
+    const auto folder = ARFolder::open(std::string(ARFolderOf(*canonical)), ownership_);
+    if (!folder)
+        return complain(*canonical, folder.error());
+    offer(kind, *folder, name, item);
+}
+
+void ARScanner::offer(ARKind kind, const ARFolder& folder, std::string_view name,
+                      const std::string& item) {
     const std::string path = folder.pathOf(name);
-    if (folder.refusal()) {
-        sink_.refused(path, *folder.refusal());
-        return;
-    }
-    const bool lookInside = sink_.found({kind, folder, name, path});
+    if (folder.refusal())
+        return sink_.refused(path, *folder.refusal());
+    const bool lookInside = sink_.found({kind, folder, name, path, item});
     if (lookInside && kind == ARKind::application)
-        scanPlugInsOf(folder, name);
+        scanPlugInsOf(folder, name, item);
 }
 
-void ARScanner::scanPlugInsOf(const ARFolder& folder, std::string_view application) {
-    std::string name(application);
-    name += '/';
-    name += ARPlugInsFolder;
+void ARScanner::scanPlugInsOf(const ARFolder& folder, std::string_view application,
+                              const std::string& item) {
+    const std::string name = ARPathIn(application, ARPlugInsFolder);
+    const std::string path = folder.pathOf(name);
+    watches_.watchPlugIns(item, path);
     const auto plugIns = folder.openWithin(name);
-    if (plugIns) {
-        scanEntries(ARKind::plugIn, *plugIns);
-    } else if (plugIns.error() == ELOOP || plugIns.error() == ENOTDIR) {
-        scanFolder(ARKind::plugIn, folder.pathOf(name)); // a link, or not a folder at all
-    } else {
-        complain(folder.pathOf(name), plugIns.error());
+    if (plugIns)
+        return scanPlugIns(*plugIns, item);
+    if (folder.typeOf(name) == ARFolder::EntryType::link)
+        return scanPlugInsBehindLink(path);
+    complain(path, plugIns.error());
+}
+
+void ARScanner::scanPlugInsBehindLink(const std::string& path) {
+    if (!sink_.foundLink(path))
+        return;
+    const auto canonical = platform::canonicalPath(path);
+    if (!canonical)
+        return complain(path, canonical.error());
+    watches_.watchPlugIns(ARWatches::everything, *canonical);
+    const auto opened = ARFolder::open(*canonical, ownership_);
+    if (!opened)
+        return complain(*canonical, opened.error());
+    scanPlugIns(*opened, ARWatches::everything);
+}
+
+void ARScanner::scanPlugIns(const ARFolder& folder, const std::string& item) {
+    const auto entries = folder.entries(ARSuffixOf(ARKind::plugIn));
+    if (!entries)
+        return complain(folder.path(), entries.error());
+    for (const ARFolder::Entry& entry : *entries) {
+        const std::string path = folder.pathOf(entry.name);
+        if (entry.type == ARFolder::EntryType::folder) {
+            offer(ARKind::plugIn, folder, entry.name, item);
+        } else if (entry.type == ARFolder::EntryType::link && folder.refusal()) {
+            sink_.refused(path, *folder.refusal());
+        } else if (entry.type == ARFolder::EntryType::link && sink_.foundLink(path)) {
+            scanBundle(ARKind::plugIn, path, ARWatches::everything);
+        }
     }
 }
 
 void ARScanner::complain(const std::string& path, int number) {
-    if (number != ENOENT && number != ENOTDIR)
-        sink_.unreadable(path, std::generic_category().message(number));
+    if (number == ENOENT || number == ENOTDIR)
+        return;
+    if (number != EACCES && number != ELOOP)
+        watches_.lookAgainLater();
+    sink_.unreadable(path, std::generic_category().message(number));
 }

@@ -7,6 +7,7 @@
 #include <unistd.h>
 #include <utility>
 
+#include "AppRegistry/ARFollower.h"
 #include "AppRegistry/ARRegistry.h"
 #include "Zephrin/ZPDLog.h"
 #include "Zephrin/ZPPlugInCore.h"
@@ -67,6 +68,7 @@ struct Daemon::Parts {
     std::unique_ptr<ZPDServer> server;
     std::unique_ptr<platform::ipc::Watch> localeWatch;
     std::unique_ptr<platform::ipc::Watch> trustWatch;
+    std::unique_ptr<ARFollower> follower;
 };
 
 Daemon::Parts::Parts(platform::Places where)
@@ -146,6 +148,7 @@ std::unique_ptr<Daemon> Daemon::create(const ZPDOptions& options) {
     ZPPlugInCore::setExtensionPoints(std::make_shared<ZPDExtensionPoints>(*parts->registry));
     parts->server->setVerbose(options.verbose);
     parts->server->setCacheLimit(options.cacheLimit);
+    parts->follower = std::make_unique<ARFollower>(parts->mainLoop, *parts->registry);
     return std::unique_ptr<Daemon>(new Daemon(std::move(parts)));
 }
 
@@ -156,6 +159,7 @@ Daemon::~Daemon() = default;
 void Daemon::run() {
     parts_->mainLoop.onSignal(SIGTERM, [parts = parts_.get()] { parts->terminate(); });
     parts_->server->resume();
+    parts_->follower->start();
     parts_->mainLoop.run();
     parts_->terminate();
 }

@@ -1,0 +1,187 @@
+// The registry follows its folders while the daemon runs.
+
+#include <algorithm>
+#include <csignal>
+#include <fcntl.h>
+#include <filesystem>
+#include <fstream>
+#include <map>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <gtest/gtest.h>
+#include <sqlite3.h>
+
+#include "tests/e2e/Daemon.h"
+#include "tests/e2e/Home.h"
+#include "tests/e2e/PlistWriter.h"
+#include "tests/e2e/Replies.h"
+
+namespace e2e {
+namespace {
+
+namespace fs = std::filesystem;
+
+void swapFolders(const std::string& a, const std::string& b) {
+    ASSERT_EQ(renameat2(AT_FDCWD, a.c_str(), AT_FDCWD, b.c_str(), RENAME_EXCHANGE), 0);
+}
+
+void setMode(const std::string& path, mode_t mode) {
+    ASSERT_EQ(chmod(path.c_str(), mode), 0);
+}
+
+class Follow : public testing::Test {
+protected:
+    // An application with two plug-ins, "NAME.one" and "NAME.two", both of one version.
+    std::string makeApp(const std::string& name, const std::string& version,
+                        const std::string& folder = "Applications") const {
+        const std::string app = home.addApp(name, folder);
+        for (const std::string part : {"one", "two"})
+            addPlugIn(app, part, {.identifier = name + "." + part, .version = version});
+        return app;
+    }
+
+    void start() {
+        daemon.emplace(home.path(), Daemon::Options{.logLevel = "default"});
+        client.emplace(daemon->connect());
+        EXPECT_TRUE(eventually([&] { return watches() > 0; }));
+    }
+
+    [[nodiscard]] std::string seen() { return versions(*client, Item::map({})); }
+
+    // Waits until "match" answers so.
+    void expect(const std::string& expected) {
+        EXPECT_TRUE(eventually([&] { return seen() == expected; }))
+            << "expected " << expected << "\nbut saw " << seen() << "\n"
+            << daemon->wholeLog();
+    }
+
+    // "+IDENTIFIER" and "-IDENTIFIER" of the lines since the last call, in their order.
+    std::string told() {
+        std::string result;
+        const auto lines = daemon->log();
+        for (; linesRead < lines.size(); ++linesRead) {
+            const std::string& line = lines[linesRead];
+            for (const auto& [mark, sign] :
+                 {std::pair("plug-in INSTALLED:", '+'), std::pair("plug-in UNINSTALLED:", '-')}) {
+                const auto at = line.find(mark);
+                if (at == std::string::npos)
+                    continue;
+                const auto from = line.find(' ', line.find(':', at)) + 1;
+                result += (result.empty() ? "" : " ") + std::string(1, sign) +
+                          line.substr(from, line.find('(', from) - from);
+            }
+        }
+        return result;
+    }
+
+    // Those of the registry: the most that any descriptor of the daemon has.
+    [[nodiscard]] std::size_t watches() const {
+        std::size_t most = 0;
+        const std::string folder = "/proc/" + std::to_string(daemon->pid()) + "/fdinfo";
+        for (const auto& entry : fs::directory_iterator(folder)) {
+            std::ifstream file(entry.path());
+            std::size_t count = 0;
+            for (std::string line; std::getline(file, line);)
+                count += line.starts_with("inotify wd:");
+            most = std::max(most, count);
+        }
+        return most;
+    }
+
+    [[nodiscard]] std::size_t descriptors() const {
+        const fs::directory_iterator all("/proc/" + std::to_string(daemon->pid()) + "/fd");
+        return static_cast<std::size_t>(std::distance(begin(all), end(all)));
+    }
+
+    // A number that the registry's database answers with.
+    [[nodiscard]] std::int64_t stored(const char* sql) const {
+        sqlite3* database = nullptr;
+        sqlite3_stmt* statement = nullptr;
+        std::int64_t number = -1;
+        if (sqlite3_open_v2((home / "lib/AppRegistry.db").c_str(), &database, SQLITE_OPEN_READWRITE,
+                            nullptr) == SQLITE_OK &&
+            sqlite3_prepare_v2(database, sql, -1, &statement, nullptr) == SQLITE_OK &&
+            sqlite3_step(statement) == SQLITE_ROW)
+            number = sqlite3_column_int64(statement, 0);
+        sqlite3_finalize(statement);
+        sqlite3_close(database);
+        return number;
+    }
+
+    Home home;
+    std::optional<Daemon> daemon;
+    std::optional<WireClient> client;
+    std::size_t linesRead = 0;
+};
+
+TEST_F(Follow, WhateverHappensToAnApplicationIsSeen) {
+    makeApp("A", "1", "Aside");
+    makeApp("A", "2", "Aside/newer");
+    makeApp("Other", "5", "Instead");
+    makeApp("Later", "6", "System/Aside");
+    start();
+    const std::string in = home / "Applications";
+    const std::string aside = home / "Aside";
+    const std::string two = in + "/A.app/PlugIns/two.appex";
+
+    struct Step {
+        const char* what;
+        std::function<void()> act;
+        const char* seen;
+        const char* told;
+    };
+
+    const Step steps[] = {
+        {"copied", [&] { fs::copy(aside + "/A.app", in + "/A.app", fs::copy_options::recursive); },
+         "A.one 1, A.two 1", "+A.one +A.two"},
+        {"exchanged", [&] { swapFolders(aside + "/newer/A.app", in + "/A.app"); },
+         "A.one 2, A.two 2", "-A.one -A.two +A.one +A.two"},
+        {"one changed",
+         [&] {
+             writeFile(two + "/Info.plist",
+                       xmlPlist(PlugIn{.identifier = "A.two", .version = "3"}.infoDictionary()));
+         },
+         "A.one 2, A.two 3", "-A.two +A.two"},
+        {"one moved out", [&] { fs::rename(two, aside + "/two.appex"); }, "A.one 2", "-A.two"},
+        {"one moved in", [&] { fs::rename(aside + "/two.appex", two); }, "A.one 2, A.two 3",
+         "+A.two"},
+        {"others may write it", [&] { setMode(two, 0777); }, "A.one 2", "-A.two"},
+        {"no more", [&] { setMode(two, 0755); }, "A.one 2, A.two 3", "+A.two"},
+        {"renamed", [&] { fs::rename(in + "/A.app", in + "/B.app"); }, "A.one 2, A.two 3",
+         "-A.one -A.two +A.one +A.two"},
+        {"in there", [&] { fs::remove_all(in + "/B.app/PlugIns/two.appex"); }, "A.one 2", "-A.two"},
+        {"a placeholder", [&] { writeFile(in + "/B.app/.installing", ""); }, "", ""},
+        {"that ends", [&] { fs::remove(in + "/B.app/.installing"); }, "A.one 2", ""},
+        {"another folder of applications", [&] { swapFolders(in, home / "Instead"); },
+         "Other.one 5, Other.two 5", "-A.one +Other.one +Other.two"},
+        {"removed", [&] { fs::remove_all(in + "/Other.app"); }, "", "-Other.one -Other.two"},
+        {"and the first one again", [&] { swapFolders(in, home / "Instead"); }, "A.one 2",
+         "+A.one"},
+        {"its executable cut short",
+         [&] { fs::resize_file(in + "/B.app/PlugIns/one.appex/plugin", 1); }, "A.one 2",
+         "-A.one +A.one"},
+        {"no folder at all", [&] { fs::remove_all(in); }, "", "-A.one"},
+        {"a link in place of it", [&] { fs::create_directory_symlink("System/Aside", in); },
+         "Later.one 6, Later.two 6", "+Later.one +Later.two"},
+        {"which leads elsewhere",
+         [&] { fs::rename(home / "System/Aside", home / "System/Applications"); },
+         "Later.one 6, Later.two 6", "-Later.one -Later.two +Later.one +Later.two"},
+    };
+    for (const Step& step : steps) {
+        SCOPED_TRACE(step.what);
+        step.act();
+        std::string heard;
+        EXPECT_TRUE(eventually([&] {
+            heard += (heard.empty() ? "" : " ") + told();
+            while (heard.ends_with(' '))
+                heard.pop_back();
+            return heard == step.told && seen() == step.seen;
+        })) << "told: "
+            << heard << "\nseen: " << seen();
+    }
+    EXPECT_EQ(daemon->linesWith(" error: "), 1u) << daemon->wholeLog(); // of what others may write
+}
+
+} // namespace
+} // namespace e2e
