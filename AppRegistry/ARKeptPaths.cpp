@@ -128,10 +128,3 @@ std::optional<Error> ARKeptPaths::write(const Paths& paths) const {
         return xml.error();
     return platform::writeFileAtomically(file_, *xml, fileMode);
 }
-
-std::string ARKeptPathsFile(std::string_view database) {
-    constexpr std::string_view suffix = ".db";
-    if (database.ends_with(suffix))
-        database.remove_suffix(suffix.size());
-    return std::string(database) + ".plist";
-}

@@ -3,7 +3,6 @@
 #include <expected>
 #include <optional>
 #include <string>
-#include <string_view>
 #include <vector>
 
 #include "platform/value/Error.h"
@@ -23,6 +22,8 @@ public:
         friend bool operator==(const Paths&, const Paths&) = default;
     };
 
+    static constexpr const char* fileSuffix = ".plist"; // beside the database
+
     explicit ARKeptPaths(std::string file) : file_(std::move(file)) {}
 
     // What the file holds. One that is missing, damaged or could have been written by others holds
@@ -38,6 +39,3 @@ private:
     const std::string file_;
     std::optional<Paths> held_; // by the file; nothing when that is not known
 };
-
-// The file that belongs to a database.
-[[nodiscard]] std::string ARKeptPathsFile(std::string_view database);

@@ -21,12 +21,13 @@ ARRegistry::open(platform::Places places, platform::Locale& locale,
     auto opened = AROpenStore(places.registryDatabase);
     if (!opened)
         return std::unexpected(std::move(opened.error()));
-    const std::shared_ptr<ARStore> store = std::move(opened->first);
-    const bool isComplete = opened->second.complete;
+    const std::shared_ptr<ARStore> store = std::move(opened->store);
+    const bool isComplete = opened->content.complete;
     const std::shared_ptr<ARProxyContext> context(
         new ARProxyContext{locale, containers, ARInfoCache(store), ARGrants(store, signing), {}});
     std::unique_ptr<ARRegistry> registry(
-        new ARRegistry(std::move(places), store, std::move(opened->second), context, types));
+        new ARRegistry(std::move(places), store, std::move(opened->content), context, types));
+    registry->lock_ = std::move(opened->lock);
     registry->queue_.sync([&] { registry->firstPass(isComplete); });
     registry->queue_.async([store] { store->checkpoint(); });
     return registry;
@@ -40,7 +41,7 @@ ARRegistry::ARRegistry(platform::Places places, std::shared_ptr<ARStore> store,
       context_(std::move(context)),
       types_(types),
       committer_(store_),
-      keptPaths_(ARKeptPathsFile(places_.registryDatabase)),
+      keptPaths_(ARFileBeside(places_.registryDatabase, ARKeptPaths::fileSuffix)),
       editor_(places_, context_),
       knowledge_(content.knowledge) {
     model_.fill(std::move(content.rows));

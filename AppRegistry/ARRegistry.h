@@ -94,6 +94,7 @@ private:
     void declareTypes();
 
     const platform::Places places_;
+    platform::UniqueFd lock_; // of the database, which proxies may keep open for longer
     const std::shared_ptr<ARStore> store_;
     const std::shared_ptr<ARProxyContext> context_;
     platform::Types& types_;

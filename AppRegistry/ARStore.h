@@ -6,12 +6,13 @@
 #include <optional>
 #include <span>
 #include <string>
-#include <utility>
+#include <string_view>
 #include <vector>
 
 #include "AppRegistry/ARApplicationWorkspace.h"
 #include "AppRegistry/ARBundleRow.h"
 #include "AppRegistry/ARSignature.h"
+#include "platform/file/File.h"
 #include "platform/value/Error.h"
 
 // A new entry with all that is stored of it.
@@ -92,10 +93,18 @@ private:
     std::unique_ptr<Impl> impl_;
 };
 
+// A file that belongs to a database: of the same name, with another suffix.
+[[nodiscard]] std::string ARFileBeside(std::string_view database, std::string_view suffix);
+
 // The path under which a damaged database is kept for a look; an earlier one is replaced.
 [[nodiscard]] std::string ARDamagedStorePath(const std::string& path);
 
+struct AROpenedStore {
+    platform::UniqueFd lock; // keeps other daemons away for as long as it lives
+    std::unique_ptr<ARStore> store;
+    ARStore::Content content;
+};
+
 // Opens the database and reads it. A damaged one is set aside with one log line, and an empty one
-// takes its place.
-[[nodiscard]] std::expected<std::pair<std::unique_ptr<ARStore>, ARStore::Content>, platform::Error>
-AROpenStore(const std::string& path);
+// takes its place. One that another daemon uses is left alone.
+[[nodiscard]] std::expected<AROpenedStore, platform::Error> AROpenStore(const std::string& path);

@@ -1,5 +1,7 @@
 #include <cerrno>
 #include <cstdio>
+#include <fcntl.h>
+#include <sys/file.h>
 #include <unistd.h>
 
 #include "AppRegistry/ARLog.h"
@@ -15,6 +17,7 @@ namespace {
 // Raised with every change of the tables. An older database is upgraded, a newer one rebuilt.
 constexpr std::int64_t schemaVersion = 2;
 constexpr int waitForOtherProcessMilliseconds = 5000;
+constexpr ::mode_t lockMode = 0600;
 
 constexpr const char* version1 =
     "BEGIN;"
@@ -149,6 +152,21 @@ std::optional<std::string> writableByOthers(const std::string& path) {
     return std::nullopt;
 }
 
+// For as long as the answer lives no other daemon opens this database: each would go by its own
+// memory of what both change. Only who may write the database can hold the lock.
+std::expected<platform::UniqueFd, platform::Error> lockFor(const std::string& path) {
+    const std::string lockPath = ARFileBeside(path, ".lock");
+    platform::UniqueFd lock(
+        ::open(lockPath.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, lockMode));
+    if (!lock)
+        return std::unexpected(platform::posixError(errno, "open " + lockPath));
+    if (::flock(lock.get(), LOCK_EX | LOCK_NB) == 0)
+        return lock;
+    const bool isTaken = errno == EWOULDBLOCK;
+    return std::unexpected(
+        platform::posixError(errno, isTaken ? "another daemon uses " + path : "lock " + lockPath));
+}
+
 using OpenedStore = std::pair<std::unique_ptr<ARStore>, ARStore::Content>;
 
 std::expected<OpenedStore, ARStoreFailure> openAndLoad(const std::string& path) {
@@ -209,13 +227,23 @@ std::expected<ARStore::Content, ARStoreFailure> ARStore::load() {
     return content;
 }
 
+std::string ARFileBeside(std::string_view database, std::string_view suffix) {
+    constexpr std::string_view own = ".db";
+    if (database.ends_with(own))
+        database.remove_suffix(own.size());
+    return std::string(database) += suffix;
+}
+
 std::string ARDamagedStorePath(const std::string& path) {
     return path + ".damaged";
 }
 
-std::expected<OpenedStore, platform::Error> AROpenStore(const std::string& path) {
+std::expected<AROpenedStore, platform::Error> AROpenStore(const std::string& path) {
     if (auto error = platform::makeFolders(folderOf(path), 0755))
         return std::unexpected(std::move(*error));
+    auto lock = lockFor(path);
+    if (!lock)
+        return std::unexpected(std::move(lock).error());
     auto opened = ::access(path.c_str(), F_OK) == 0 ? openExisting(path) : openAndLoad(path);
     if (!opened && opened.error().damaged) {
         const std::string reason = opened.error().reason;
@@ -234,5 +262,5 @@ std::expected<OpenedStore, platform::Error> AROpenStore(const std::string& path)
                                                platform::fileErrorReadUnknown,
                                                path + ": " + opened.error().reason});
     }
-    return std::move(*opened);
+    return AROpenedStore{std::move(*lock), std::move(opened->first), std::move(opened->second)};
 }

@@ -109,6 +109,7 @@ TEST_F(Grants, AreJudgedByWhatTheFilesHold) {
     sign(one, "this");
     sign(two, "that");
     remove(std::string(two) + "/program");
+    registry.reset();
     registry = std::move(*ARRegistry::open(places, locale, containers, types, examiner));
     platform::Sha256 hash;
     ASSERT_EQ(examiner.seen.size(), 2U);

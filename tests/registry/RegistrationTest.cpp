@@ -3,6 +3,7 @@
 #include <sys/resource.h>
 
 #include "AppRegistry/ARKeptPaths.h"
+#include "AppRegistry/ARStore.h"
 #include "tests/registry/RegistryFixture.h"
 
 using Strings = std::vector<std::string>;
@@ -246,7 +247,7 @@ TEST_F(Registration, KeepsPathsOfAnyBytesBesideTheDatabase) {
     EXPECT_FALSE(registry->registerPlugin(home / outside));
     EXPECT_FALSE(registry->unregisterPlugin(home / inside));
     registry.reset();
-    const std::string file = ARKeptPathsFile(places.registryDatabase);
+    const std::string file = ARFileBeside(places.registryDatabase, ARKeptPaths::fileSuffix);
     EXPECT_EQ(ARKeptPaths(file).read(),
               (ARKeptPaths::Paths{{home / odd, home / outside}, {home / inside}}));
     for (const char* content :
