@@ -6,8 +6,10 @@
 #include "fuzz/Target.h"
 #include "platform/ipc/Cbor.h"
 #include "platform/ipc/Frame.h"
+#include "platform/plist/PropertyList.h"
 
 using namespace platform::ipc;
+using platform::plist::mostXmlPerByte;
 
 namespace {
 
@@ -31,9 +33,24 @@ void readAndWrite(std::string_view input, bool isReply) {
                   "a converted record holds what was put into it");
 }
 
+// What clients send is kept in property lists.
+void writeAsPropertyList(std::string_view input) {
+    const auto value = decode(input);
+    if (!value)
+        return;
+    const auto text = platform::plist::writeXml(*value);
+    if (!text)
+        return;
+    const auto again = platform::plist::parse(*text, deepestNesting);
+    fuzz::require(again.has_value(), "what was accepted can be read");
+    fuzz::require(*again == *value, "what was accepted is read again equal");
+    fuzz::require(text->size() <= mostXmlPerByte * input.size() + 100, "the list is not too large");
+}
+
 } // namespace
 
 void fuzz::run(std::string_view input) {
     readAndWrite(input, false);
     readAndWrite(input, true);
+    writeAsPropertyList(input);
 }

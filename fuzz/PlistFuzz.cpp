@@ -17,7 +17,5 @@ void fuzz::run(std::string_view input) {
     const auto again = parse(*text);
     require(again.has_value(), "what was written can be read");
     require(writeXml(*again).value() == *text, "writing it again gives the same text");
-    // Dates are written in whole seconds; a text cannot look like one.
-    if (!text->contains("<date>"))
-        require(*again == *value, "what is read again is equal");
+    require(*again == *value, "what is read again is equal");
 }

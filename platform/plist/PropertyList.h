@@ -19,11 +19,16 @@ namespace plist {
 
 inline constexpr std::size_t deepestNesting = 32;
 
+// A list takes at most so many bytes for one of the wire's encoding (besides its frame): arrays
+// within arrays do, or an exact date very near to 1970.
+inline constexpr std::size_t mostXmlPerByte = 40;
+
 [[nodiscard]] std::expected<Value, Error> parse(std::string_view bytes,
                                                 std::size_t deepest = deepestNesting);
 
 // Fails for a value that a property list cannot hold (null, UUID, URL, encoded records,
-// non-finite numbers and dates, text with characters that XML 1.0 forbids), at any depth.
+// non-finite numbers and dates, text with characters that XML 1.0 forbids), at any depth. What is
+// written reads back equal; dates may carry a fraction of a second, which other readers may refuse.
 [[nodiscard]] std::expected<std::string, Error> writeXml(const Value& value);
 
 } // namespace plist

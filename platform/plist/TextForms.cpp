@@ -1,5 +1,6 @@
 #include "platform/plist/TextForms.h"
 
+#include <algorithm>
 #include <array>
 #include <charconv>
 #include <chrono>
@@ -48,6 +49,56 @@ std::string withoutSpace(std::string_view text) {
     return out;
 }
 
+bool isDigit(char c) {
+    return c >= '0' && c <= '9';
+}
+
+// Seconds since the Unix epoch, exactly: a whole number and decimal digits after the point. The
+// digits count upwards also before the epoch, as those of a clock do: -0.25 is -1 and "75".
+struct DecimalSeconds {
+    std::int64_t whole = 0;
+    std::string fraction;
+};
+
+// One less the fraction. REQUIRES: digits, not all of them 0
+std::string complement(std::string digits) {
+    const auto last = digits.find_last_not_of('0');
+    for (std::size_t i = 0; i <= last; ++i)
+        digits[i] = static_cast<char>((i < last ? '9' : '9' + 1) - digits[i] + '0');
+    return digits;
+}
+
+DecimalSeconds secondsOf(Date date) {
+    char room[400]; // more than what the smallest number has
+    const double size = std::fabs(date.secondsSinceEpoch);
+    const auto written = std::to_chars(room, room + sizeof room, size, std::chars_format::fixed);
+    const std::string_view text(room, written.ptr);
+    const auto point = std::min(text.find('.'), text.size());
+    DecimalSeconds result{readWhole<std::int64_t>(text.substr(0, point)).value_or(0), {}};
+    if (point != text.size())
+        result.fraction = text.substr(point + 1);
+    if (date.secondsSinceEpoch >= 0)
+        return result;
+    result.whole = -result.whole;
+    if (!result.fraction.empty()) {
+        --result.whole;
+        result.fraction = complement(std::move(result.fraction));
+    }
+    return result;
+}
+
+std::optional<Date> dateOf(DecimalSeconds decimal) {
+    const bool below = decimal.whole < 0;
+    if (below && decimal.fraction.find_first_not_of('0') != std::string::npos) {
+        ++decimal.whole;
+        decimal.fraction = complement(std::move(decimal.fraction));
+    }
+    const std::string text =
+        std::to_string(below ? -decimal.whole : decimal.whole) + "." + decimal.fraction + "0";
+    const auto size = readWhole<double>(text, std::chars_format::fixed);
+    return size ? std::optional(Date{below ? -*size : *size}) : std::nullopt;
+}
+
 } // namespace
 
 bool isXmlSpace(char c) {
@@ -85,12 +136,15 @@ std::optional<Value> readReal(std::string_view text) {
 
 std::optional<Value> readDate(std::string_view text) {
     text = trimmed(text);
-    constexpr std::string_view shape = "dddd-dd-ddTdd:dd:ddZ";
-    if (text.size() != shape.size())
+    constexpr std::string_view shape = "dddd-dd-ddTdd:dd:dd";
+    if (text.size() <= shape.size() || text.back() != 'Z')
+        return std::nullopt;
+    const std::string_view fraction = text.substr(shape.size(), text.size() - shape.size() - 1);
+    if (!fraction.empty() && (fraction.size() < 2 || fraction[0] != '.' ||
+                              !std::ranges::all_of(fraction.substr(1), isDigit)))
         return std::nullopt;
     for (std::size_t i = 0; i < shape.size(); ++i) {
-        const bool digit = text[i] >= '0' && text[i] <= '9';
-        if (shape[i] == 'd' ? !digit : text[i] != shape[i])
+        if (shape[i] == 'd' ? !isDigit(text[i]) : text[i] != shape[i])
             return std::nullopt;
     }
     const auto number = [&](std::size_t at, std::size_t length) {
@@ -105,7 +159,9 @@ std::optional<Value> readDate(std::string_view text) {
     if (!day.ok() || hour > 23 || minute > 59 || second > 59)
         return std::nullopt;
     const auto time = sys_days(day) + hours(hour) + minutes(minute) + seconds(second);
-    return Value(Date{static_cast<double>(time.time_since_epoch().count())});
+    const auto date = dateOf(
+        {time.time_since_epoch().count(), std::string(fraction.substr(fraction.empty() ? 0 : 1))});
+    return date ? std::optional<Value>(*date) : std::nullopt;
 }
 
 std::optional<Value> readData(std::string_view text) {
@@ -139,16 +195,17 @@ std::optional<std::string> dateText(Date date) {
     constexpr double end = 253'402'300'800.0;      // 10000-01-01T00:00:00Z
     if (!(date.secondsSinceEpoch >= earliest && date.secondsSinceEpoch < end))
         return std::nullopt;
-    const sys_seconds time{seconds(static_cast<std::int64_t>(std::floor(date.secondsSinceEpoch)))};
+    const DecimalSeconds decimal = secondsOf(date);
+    const sys_seconds time{seconds(decimal.whole)};
     const auto midnight = floor<days>(time);
     const year_month_day day(midnight);
     const hh_mm_ss clock(time - midnight);
     char room[40];
     std::snprintf(
-        room, sizeof room, "%04d-%02u-%02uT%02d:%02d:%02dZ", int(day.year()), unsigned(day.month()),
+        room, sizeof room, "%04d-%02u-%02uT%02d:%02d:%02d", int(day.year()), unsigned(day.month()),
         unsigned(day.day()), static_cast<int>(clock.hours().count()),
         static_cast<int>(clock.minutes().count()), static_cast<int>(clock.seconds().count()));
-    return room;
+    return room + (decimal.fraction.empty() ? "" : "." + decimal.fraction) + "Z";
 }
 
 std::string dataText(const Data& data) {

@@ -14,12 +14,12 @@ namespace platform::plist {
 [[nodiscard]] std::optional<Value> readInteger(std::string_view text);
 // A finite decimal number.
 [[nodiscard]] std::optional<Value> readReal(std::string_view text);
-// "2026-11-22T22:05:00Z".
+// "2026-11-22T22:05:00Z", or with a fraction of a second: "2026-11-22T22:05:00.25Z".
 [[nodiscard]] std::optional<Value> readDate(std::string_view text);
 // Base 64 (RFC 4648, section 4) with white space anywhere.
 [[nodiscard]] std::optional<Value> readData(std::string_view text);
 
-// Nothing for a date outside the years 0 to 9999. Fractions of a second are left out.
+// The shortest text that reads back as the same date. Nothing outside the years 0 to 9999.
 [[nodiscard]] std::optional<std::string> dateText(Date date);
 [[nodiscard]] std::string dataText(const Data& data);
 // The shortest text that reads back as the same number. REQUIRES: finite

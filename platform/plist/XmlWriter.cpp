@@ -1,3 +1,4 @@
+#include <algorithm>
 #include <cmath>
 
 #include "platform/plist/PropertyList.h"
@@ -12,6 +13,10 @@ namespace {
 constexpr std::string_view header = "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n"
                                     "<plist version=\"1.0\">\n";
 constexpr std::string_view footer = "</plist>\n";
+
+// Deeper than this, lines are not indented further: people no longer count the levels there, and a
+// list must not become much larger than what is in it.
+constexpr std::size_t deepestIndent = 8;
 
 // XML 1.0, production 2 (Char).
 bool isXmlCharacter(char32_t c) {
@@ -34,6 +39,8 @@ private:
         failure = reason;
         return false;
     }
+
+    void indent(std::size_t level) { out.append(std::min(level, deepestIndent), '\t'); }
 
     void element(std::string_view name, std::string_view content) {
         out.append("<").append(name).append(">").append(content);
@@ -94,7 +101,8 @@ bool Writer::array(const Array& array, std::size_t level) {
         if (!write(item, level + 1))
             return false;
     }
-    out.append(level, '\t').append("</array>\n");
+    indent(level);
+    out += "</array>\n";
     return true;
 }
 
@@ -105,16 +113,17 @@ bool Writer::dictionary(const Dictionary& dictionary, std::size_t level) {
     }
     out += "<dict>\n";
     for (const DictionaryEntry& entry : dictionary) {
-        out.append(level + 1, '\t');
+        indent(level + 1);
         if (!textElement("key", entry.key.view()) || !write(entry.value, level + 1))
             return false;
     }
-    out.append(level, '\t').append("</dict>\n");
+    indent(level);
+    out += "</dict>\n";
     return true;
 }
 
 bool Writer::write(const Value& value, std::size_t level) {
-    out.append(level, '\t');
+    indent(level);
     switch (value.kind()) {
     case Value::Kind::boolean:
         out += *value.boolean() ? "<true/>\n" : "<false/>\n";
