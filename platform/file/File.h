@@ -83,6 +83,10 @@ struct FileContent {
 [[nodiscard]] std::optional<Error>
 writeFileAtomically(const std::string& path, std::string_view bytes, unsigned mode = 0644);
 
+// Removes what was left beside `path` when a process was killed while it replaced the file. What
+// another process writes at this moment stays.
+void removeUnfinishedFiles(const std::string& path);
+
 // The canonical absolute path of an existing file or folder. A text with NUL in it never
 // resolves, nor does one that is longer than a path can be. On failure the errno value.
 [[nodiscard]] std::expected<std::string, int> canonicalPath(std::string_view path);

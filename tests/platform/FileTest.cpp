@@ -4,6 +4,7 @@
 #include <climits>
 #include <fcntl.h>
 #include <filesystem>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -85,6 +86,23 @@ TEST(WriteFileAtomically, LeavesTheOldFileAloneOnFailure) {
     EXPECT_TRUE(writeFileAtomically("", "x"));
     EXPECT_TRUE(writeFileAtomically((folder / "a") + std::string("\0b", 2), "x"));
     EXPECT_EQ(std::distance(fs::directory_iterator(folder.path()), {}), 1) << "nothing left over";
+}
+
+TEST(WriteFileAtomically, LeftOversGoUnlessSomebodyWritesThem) {
+    const TestFolder folder;
+    const auto path = folder.write("store", "kept");
+    folder.write(".store.new-killed", "");
+    const auto written = folder.write(".store.new-alive1", "");
+    const UniqueFd writer(::open(written.c_str(), O_RDWR | O_CLOEXEC));
+    ASSERT_EQ(::flock(writer.get(), LOCK_EX), 0);
+    const auto other = folder.write(".store.new-another", "");
+    const auto others = folder.write(".other.new-123456", "");
+    ASSERT_EQ(::mkfifo((folder / ".store.new-fifo12").c_str(), 0600), 0);
+    fs::create_symlink("store", folder / ".store.new-linked");
+    removeUnfinishedFiles(path);
+    EXPECT_FALSE(fs::exists(folder / ".store.new-killed"));
+    EXPECT_EQ(std::distance(fs::directory_iterator(folder.path()), {}), 6);
+    removeUnfinishedFiles(folder / "missing/store");
 }
 
 TEST(CanonicalPath, ResolvesOnlyWhatIsThere) {
