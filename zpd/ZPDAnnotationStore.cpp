@@ -32,10 +32,9 @@ constexpr const char* storeFile = "/Zephrin-Annotations";
 constexpr const char* olderContainer = "com.tovana.zpd";
 constexpr unsigned globalFolderMode = 0755;
 
-// XML may take so many bytes for one of the wire's encoding: arrays within arrays do, or an exact
-// date very near to 1970. What was accepted must be read again, whatever it was.
-constexpr std::size_t mostXmlPerByte = 40;
-constexpr std::size_t largestStore = ZPDAnnotationStore::mostTogether * mostXmlPerByte;
+// What was accepted is read again, whatever it was.
+constexpr std::size_t largestStore =
+    ZPDAnnotationStore::mostTogether * platform::plist::mostXmlPerByte;
 // An annotation stands two levels down.
 constexpr std::size_t deepestStore = ZPDAnnotationStore::deepestAnnotation + 2;
 
@@ -182,6 +181,7 @@ ZPDAnnotationStore::ZPDAnnotationStore(const std::optional<std::string>& databas
                                        platform::Containers& containers)
     : containers_(containers), path_(databasePath.value_or(defaultDatabasePath())) {
     prepareFolder(!databasePath);
+    platform::removeUnfinishedFiles(path_);
     const auto failure = probed(path_, loadDb(path_));
     if (!failure)
         return;
