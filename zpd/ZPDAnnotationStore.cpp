@@ -242,7 +242,7 @@ std::optional<Error> ZPDAnnotationStore::saveDb(const std::string& path,
     if (!text) {
         failure = text.error();
         text = storeText(entriesThat(annotations, [](const Value& entry) {
-            return platform::plist::writeXml(entry).has_value();
+            return !platform::plist::objectionToXml(entry);
         }));
         if (!text)
             return text.error();
@@ -309,5 +309,5 @@ void ZPDAnnotationStore::remove(std::string_view key) {
 bool ZPDAnnotationStore::canHold(const Dictionary& annotation) {
     return encodedSize(annotation) <= largestAnnotation &&
            isAtMostSoDeep(annotation, deepestAnnotation) &&
-           platform::plist::writeXml(annotation).has_value();
+           !platform::plist::objectionToXml(annotation);
 }

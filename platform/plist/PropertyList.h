@@ -2,6 +2,7 @@
 
 #include <cstddef>
 #include <expected>
+#include <optional>
 #include <string>
 #include <string_view>
 
@@ -26,9 +27,13 @@ inline constexpr std::size_t mostXmlPerByte = 40;
 [[nodiscard]] std::expected<Value, Error> parse(std::string_view bytes,
                                                 std::size_t deepest = deepestNesting);
 
-// Fails for a value that a property list cannot hold (null, UUID, URL, encoded records,
-// non-finite numbers and dates, text with characters that XML 1.0 forbids), at any depth. What is
-// written reads back equal; dates may carry a fraction of a second, which other readers may refuse.
+// What keeps a value from being written: a kind that a property list cannot hold (null, UUID, URL,
+// encoded records), a non-finite number or date, text with characters that XML 1.0 forbids, at any
+// depth. Nothing when there is nothing.
+[[nodiscard]] std::optional<Error> objectionToXml(const Value& value);
+
+// Fails when there is an objection. What is written reads back equal; dates may carry a fraction
+// of a second, which other readers may refuse.
 [[nodiscard]] std::expected<std::string, Error> writeXml(const Value& value);
 
 } // namespace plist

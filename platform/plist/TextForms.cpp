@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <array>
+#include <cassert>
 #include <charconv>
 #include <chrono>
 #include <cmath>
@@ -189,12 +190,15 @@ std::optional<Value> readData(std::string_view text) {
     return Value(Data{SharedBytes(bytes)});
 }
 
-std::optional<std::string> dateText(Date date) {
-    using namespace std::chrono;
+bool hasDateText(Date date) {
     constexpr double earliest = -62'167'219'200.0; // 0000-01-01T00:00:00Z
     constexpr double end = 253'402'300'800.0;      // 10000-01-01T00:00:00Z
-    if (!(date.secondsSinceEpoch >= earliest && date.secondsSinceEpoch < end))
-        return std::nullopt;
+    return date.secondsSinceEpoch >= earliest && date.secondsSinceEpoch < end;
+}
+
+std::string dateText(Date date) {
+    assert(hasDateText(date));
+    using namespace std::chrono;
     const DecimalSeconds decimal = secondsOf(date);
     const sys_seconds time{seconds(decimal.whole)};
     const auto midnight = floor<days>(time);

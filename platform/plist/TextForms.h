@@ -19,8 +19,10 @@ namespace platform::plist {
 // Base 64 (RFC 4648, section 4) with white space anywhere.
 [[nodiscard]] std::optional<Value> readData(std::string_view text);
 
-// The shortest text that reads back as the same date. Nothing outside the years 0 to 9999.
-[[nodiscard]] std::optional<std::string> dateText(Date date);
+// False for a date outside the years 0 to 9999.
+[[nodiscard]] bool hasDateText(Date date);
+// The shortest text that reads back as the same date. REQUIRES: it has one
+[[nodiscard]] std::string dateText(Date date);
 [[nodiscard]] std::string dataText(const Data& data);
 // The shortest text that reads back as the same number. REQUIRES: finite
 [[nodiscard]] std::string realText(double number);

@@ -1,5 +1,8 @@
 #include <algorithm>
+#include <cassert>
 #include <cmath>
+#include <cstdint>
+#include <cstring>
 
 #include "platform/plist/PropertyList.h"
 #include "platform/plist/Readers.h"
@@ -18,6 +21,23 @@ constexpr std::string_view footer = "</plist>\n";
 // list must not become much larger than what is in it.
 constexpr std::size_t deepestIndent = 8;
 
+// ---- What can be written
+
+// How many bytes at the front, in steps of eight, are plain ASCII without controls. (Taking 0x20
+// away sets the high bit of what is less.)
+std::size_t plainLength(std::string_view text) {
+    constexpr std::uint64_t highBits = 0x8080808080808080U;
+    constexpr std::uint64_t blanks = 0x2020202020202020U;
+    std::size_t length = 0;
+    for (; length + 8 <= text.size(); length += 8) {
+        std::uint64_t eight = 0;
+        std::memcpy(&eight, text.data() + length, sizeof eight);
+        if (((eight | (eight - blanks)) & highBits) != 0)
+            break;
+    }
+    return length;
+}
+
 // XML 1.0, production 2 (Char).
 bool isXmlCharacter(char32_t c) {
     if (c < 0x20)
@@ -25,21 +45,76 @@ bool isXmlCharacter(char32_t c) {
     return c != 0xfffe && c != 0xffff;
 }
 
-// Writes one value after the other into `out`. Each step tells whether the value could be written;
-// the first that cannot leaves its reason in `failure`. Lives for one call.
+const char* objectionToText(std::string_view text) {
+    while (!text.empty()) {
+        text.remove_prefix(plainLength(text));
+        if (text.empty())
+            return nullptr;
+        const auto character = takeCharacter(text);
+        if (!character || !isXmlCharacter(*character))
+            return "text with a character that XML cannot hold";
+    }
+    return nullptr;
+}
+
+const char* objectionTo(const Value& value);
+
+const char* objectionTo(const Dictionary& dictionary) {
+    for (const DictionaryEntry& entry : dictionary) {
+        if (const char* const objection = objectionToText(entry.key.view()))
+            return objection;
+        if (const char* const objection = objectionTo(entry.value))
+            return objection;
+    }
+    return nullptr;
+}
+
+const char* objectionTo(const Array& array) {
+    for (const Value& item : array) {
+        if (const char* const objection = objectionTo(item))
+            return objection;
+    }
+    return nullptr;
+}
+
+// Nothing for what can be written.
+const char* objectionTo(const Value& value) {
+    switch (value.kind()) {
+    case Value::Kind::boolean:
+    case Value::Kind::signedInteger:
+    case Value::Kind::unsignedInteger:
+    case Value::Kind::data:
+        return nullptr;
+    case Value::Kind::real:
+        return std::isfinite(*value.real()) ? nullptr : "a number that is not finite";
+    case Value::Kind::date:
+        return hasDateText(*value.date()) ? nullptr : "a date outside the years 0 to 9999";
+    case Value::Kind::string:
+        return objectionToText(*value.string());
+    case Value::Kind::array:
+        return objectionTo(*value.array());
+    case Value::Kind::dictionary:
+        return objectionTo(*value.dictionary());
+    case Value::Kind::null:
+    case Value::Kind::uuid:
+    case Value::Kind::url:
+    case Value::Kind::encoded:
+        break;
+    }
+    return "a value of a kind that property lists do not have";
+}
+
+// ---- Writing
+
+// Writes one value after the other into `out`. Lives for one call. REQUIRES: what it gets can be
+// written
 class Writer {
 public:
-    [[nodiscard]] bool write(const Value& value, std::size_t level);
+    void write(const Value& value, std::size_t level);
 
     std::string out{header};
-    std::string failure;
 
 private:
-    [[nodiscard]] bool fail(const char* reason) {
-        failure = reason;
-        return false;
-    }
-
     void indent(std::size_t level) { out.append(std::min(level, deepestIndent), '\t'); }
 
     void element(std::string_view name, std::string_view content) {
@@ -47,102 +122,84 @@ private:
         out.append("</").append(name).append(">\n");
     }
 
-    [[nodiscard]] bool textElement(std::string_view name, std::string_view text);
-    [[nodiscard]] bool real(double number);
-    [[nodiscard]] bool date(Date date);
-    [[nodiscard]] bool array(const Array& array, std::size_t level);
-    [[nodiscard]] bool dictionary(const Dictionary& dictionary, std::size_t level);
+    void textElement(std::string_view name, std::string_view text);
+    void array(const Array& array, std::size_t level);
+    void dictionary(const Dictionary& dictionary, std::size_t level);
 };
 
-bool Writer::textElement(std::string_view name, std::string_view text) {
+// What markup is made of, and what readers take for a line's end.
+const char* entityFor(char c) {
+    switch (c) {
+    case '&':
+        return "&amp;";
+    case '<':
+        return "&lt;";
+    case '>':
+        return "&gt;";
+    case '\r':
+        return "&#13;";
+    default:
+        return nullptr;
+    }
+}
+
+void Writer::textElement(std::string_view name, std::string_view text) {
     out.append("<").append(name).append(">");
-    while (!text.empty()) {
-        const auto character = takeCharacter(text);
-        if (!character || !isXmlCharacter(*character))
-            return fail("text with a character that XML cannot hold");
-        if (*character == '&') {
-            out += "&amp;";
-        } else if (*character == '<') {
-            out += "&lt;";
-        } else if (*character == '>') {
-            out += "&gt;";
-        } else if (*character == '\r') {
-            out += "&#13;"; // readers take a bare one for a line's end
-        } else {
-            appendCharacter(out, *character);
+    std::size_t from = 0;
+    for (std::size_t at = 0; at < text.size(); ++at) {
+        if (const char* const entity = entityFor(text[at])) {
+            out.append(text.substr(from, at - from)).append(entity);
+            from = at + 1;
         }
     }
-    out.append("</").append(name).append(">\n");
-    return true;
+    out.append(text.substr(from)).append("</").append(name).append(">\n");
 }
 
-bool Writer::real(double number) {
-    if (!std::isfinite(number))
-        return fail("a number that is not finite");
-    element("real", realText(number));
-    return true;
-}
-
-bool Writer::date(Date date) {
-    const auto text = dateText(date);
-    if (!text)
-        return fail("a date outside the years 0 to 9999");
-    element("date", *text);
-    return true;
-}
-
-bool Writer::array(const Array& array, std::size_t level) {
+void Writer::array(const Array& array, std::size_t level) {
     if (array.empty()) {
         out += "<array/>\n";
-        return true;
+        return;
     }
     out += "<array>\n";
-    for (const Value& item : array) {
-        if (!write(item, level + 1))
-            return false;
-    }
+    for (const Value& item : array)
+        write(item, level + 1);
     indent(level);
     out += "</array>\n";
-    return true;
 }
 
-bool Writer::dictionary(const Dictionary& dictionary, std::size_t level) {
+void Writer::dictionary(const Dictionary& dictionary, std::size_t level) {
     if (dictionary.empty()) {
         out += "<dict/>\n";
-        return true;
+        return;
     }
     out += "<dict>\n";
     for (const DictionaryEntry& entry : dictionary) {
         indent(level + 1);
-        if (!textElement("key", entry.key.view()) || !write(entry.value, level + 1))
-            return false;
+        textElement("key", entry.key.view());
+        write(entry.value, level + 1);
     }
     indent(level);
     out += "</dict>\n";
-    return true;
 }
 
-bool Writer::write(const Value& value, std::size_t level) {
+void Writer::write(const Value& value, std::size_t level) {
     indent(level);
     switch (value.kind()) {
     case Value::Kind::boolean:
         out += *value.boolean() ? "<true/>\n" : "<false/>\n";
-        return true;
+        return;
     case Value::Kind::signedInteger:
-        element("integer", std::to_string(*value.signedInteger()));
-        return true;
+        return element("integer", std::to_string(*value.signedInteger()));
     case Value::Kind::unsignedInteger:
-        element("integer", std::to_string(*value.unsignedInteger()));
-        return true;
+        return element("integer", std::to_string(*value.unsignedInteger()));
     case Value::Kind::real:
-        return real(*value.real());
+        return element("real", realText(*value.real()));
     case Value::Kind::string:
         return textElement("string", *value.string());
     case Value::Kind::date:
-        return date(*value.date());
+        return element("date", dateText(*value.date()));
     case Value::Kind::data:
-        element("data", dataText(*value.data()));
-        return true;
+        return element("data", dataText(*value.data()));
     case Value::Kind::array:
         return array(*value.array(), level);
     case Value::Kind::dictionary:
@@ -151,17 +208,23 @@ bool Writer::write(const Value& value, std::size_t level) {
     case Value::Kind::uuid:
     case Value::Kind::url:
     case Value::Kind::encoded:
-        break;
+        assert(false);
     }
-    return fail("a value of a kind that property lists do not have");
 }
 
 } // namespace
 
+std::optional<Error> objectionToXml(const Value& value) {
+    const char* const objection = objectionTo(value);
+    return objection ? std::optional(corrupt(std::string("property list: ") + objection))
+                     : std::nullopt;
+}
+
 std::expected<std::string, Error> writeXml(const Value& value) {
+    if (auto objection = objectionToXml(value))
+        return std::unexpected(std::move(*objection));
     Writer writer;
-    if (!writer.write(value, 0))
-        return std::unexpected(corrupt("property list: " + writer.failure));
+    writer.write(value, 0);
     writer.out += footer;
     return std::move(writer.out);
 }
