@@ -94,25 +94,28 @@ void annotateRows(const Run& run, Cores cores) {
     }
     const std::string uuid = uuidAt(rig.client(), pathOf(home, 0));
     Elections elections(rig, uuid);
-    const BareSave bare(home.path(), e2e::readFile(home / "annotations"));
-    const std::size_t size = e2e::readFile(home / "annotations").size();
+    const std::string content = e2e::readFile(rig.store());
+    const BareSave bare(home / "store", content);
     run.cores.asClient(cores);
 
     const Compared saved =
         compare(Side{.once = [&] { return elections.roundTrip(); }, .server = rig.daemon().pid()},
-                Side{.once = [&] { return bare.save(); }}, slower(run.plan));
+                Side{.once = [&] { return bare.save(); }, .server = getpid()}, slower(run.plan));
     const auto row = [&](const char* name, double measured, double against,
                          std::optional<Goal> goal) {
-        run.table.add({.name = name,
-                       .cores = nameOf(cores),
-                       .measured = measured,
-                       .against = against,
-                       .unit = "us",
-                       .goal = goal,
-                       .note = "against a bare save of the same " + std::to_string(size) + " B"});
+        run.table.add(
+            {.name = name,
+             .cores = nameOf(cores),
+             .measured = measured,
+             .against = against,
+             .unit = "us",
+             .goal = goal,
+             .note = "against a bare save of the same " + std::to_string(content.size()) + " B"});
     };
     row("annotate with its sync, p50", saved.daemon.p50, saved.floor.p50, Goal{.bound = 1.3});
     row("annotate with its sync, p99", saved.daemon.p99, saved.floor.p99, std::nullopt);
+    row("annotate, CPU of the daemon per request", saved.daemon.processor, saved.floor.processor,
+        std::nullopt);
 
     const std::string request = findByUuidFrame(rig.client(), found);
     Exchange find = rig.exchange(request);

@@ -1,5 +1,6 @@
 #include "bench/Rig.h"
 
+#include <filesystem>
 #include <stdexcept>
 #include <sys/socket.h>
 
@@ -15,6 +16,11 @@ void limitWaiting(int fd) {
     setsockopt(fd, SOL_SOCKET, SO_RCVTIMEO, &patience, sizeof patience);
 }
 
+const std::string& withFolder(const std::string& home) {
+    std::filesystem::create_directories(home + "/store");
+    return home;
+}
+
 std::string frameOf(const char* type, const Item& arguments) {
     return e2e::Frame{.id = 1, .body = encode(e2e::envelope(type, arguments))}.bytes();
 }
@@ -22,7 +28,10 @@ std::string frameOf(const char* type, const Item& arguments) {
 } // namespace
 
 Rig::Rig(const std::string& home)
-    : daemon_(home, {.service = "bench", .logLevel = "default"}), client_(daemon_.socketPath()) {
+    : store_(home + "/store/annotations"),
+      daemon_(withFolder(home),
+              {.service = "bench", .arguments = {"-d", store_}, .logLevel = "default"}),
+      client_(daemon_.socketPath()) {
     limitWaiting(client_.fd());
 }
 

@@ -9,7 +9,8 @@
 
 namespace bench {
 
-// The daemon on a home, and one connection to it. The home must outlive it.
+// The daemon on a home, and one connection to it. The home must outlive it. The annotations lie in a
+// folder of their own, as on a box: the daemon watches the folders above its settings.
 class Rig {
 public:
     explicit Rig(const std::string& home);
@@ -18,9 +19,12 @@ public:
 
     [[nodiscard]] e2e::WireClient& client() { return client_; }
 
+    [[nodiscard]] const std::string& store() const { return store_; }
+
     [[nodiscard]] Exchange exchange(const std::string& request);
 
 private:
+    std::string store_; // the file of the annotations
     e2e::Daemon daemon_;
     e2e::WireClient client_;
 };
