@@ -12,6 +12,7 @@
 #include <gtest/gtest.h>
 
 #include "tests/e2e/Annotations.h"
+#include "tests/e2e/Signing.h"
 
 namespace e2e {
 namespace {
@@ -141,6 +142,24 @@ TEST(AnnotationSaving, OneSaveServesAllWhoWait) {
         uuids.append(Item::uuid(world.uuids.at(identifier)));
     (void)world.client->request(every.set("uuids", uuids));
     EXPECT_EQ(saves.count(), 1);
+}
+
+TEST(AnnotationSaving, DiscoveriesWaitForTheElectionsThatTheyMake) {
+    const Home home;
+    const Signer signer(home);
+    const std::string app = home.addApp("Some");
+    for (const std::string& identifier : identifiers) {
+        signer.sign(addPlugIn(app, identifier, {.identifier = identifier}),
+                    Item::map({{"com.tovana.developer.auto-elect-plugin", true}}));
+    }
+    const Daemon daemon(home.path());
+    WireClient client = daemon.connect();
+    const Replacements saves(home.path());
+    EXPECT_EQ(matched(client, Item::map({{"HXUserElection", "1"}})), "a b c");
+    EXPECT_EQ(saves.count(), 1);
+    EXPECT_TRUE(readFile(home / "annotations").contains("<key>c</key>"));
+    EXPECT_EQ(matched(client, Item::map({{"HXUserElection", "1"}})), "a b c");
+    EXPECT_EQ(saves.count(), 0);
 }
 
 // A small file system that only this process and what it starts can see.
