@@ -129,6 +129,8 @@ TEST_F(Installing, CopiesWhatTheDaemonCanTrust) {
     ASSERT_EQ(::chmod((app + "/Info.plist").c_str(), 0660), 0);
     ASSERT_EQ(::chmod((app + "/PlugIns").c_str(), 01777), 0);
 
+    EXPECT_EQ(run({"uninstall", "com.example.a"}).status, Status::refused);
+    EXPECT_FALSE(fs::exists(installed()));
     auto [status, out, err] = run({"--json", "install", app});
     ASSERT_EQ(status, Status::done) << err;
     const auto answer = nlohmann::json::parse(out);

@@ -1,5 +1,6 @@
 // "uninstall": takes an application out of the application folder, in one step. Needs no daemon.
 
+#include <filesystem>
 #include <memory>
 #include <ostream>
 #include <string>
@@ -32,8 +33,10 @@ Status uninstall(const std::string& identifier, const Session& session) {
     const auto failed = [&](const std::string& reason) {
         return session.fail({Status::refused, reason, {}});
     };
-    const auto folder =
-        ApplicationFolder::open(platform::Places::forThisProcess().applicationFolders.front());
+    const std::string place = platform::Places::forThisProcess().applicationFolders.front();
+    if (!std::filesystem::exists(place)) // nothing to make it for
+        return failed("no application " + identifier + " in " + place);
+    const auto folder = ApplicationFolder::open(place);
     if (!folder)
         return failed(folder.error());
     std::vector<std::string> removed;
