@@ -164,6 +164,13 @@ tells() {
     "$@" 2>/dev/null | grep -qF -- "$text"
 }
 
+# hides_now TEXT COMMAND...: the command works, and its output does not have the text, now.
+hides_now() {
+    text=$1
+    shift
+    "$@" >"$output" 2>/dev/null && ! grep -qF -- "$text" "$output"
+}
+
 for program in "$build/bin/zpd" "$build/bin/zpctl" "$build/examples/Applications"; do
     [ -e "$program" ] || fail "not built: $program (make demo builds it)"
 done
@@ -290,6 +297,30 @@ run 0 zpctl tree
 shows ' not elected '
 run 0 zpctl elect "$subtitles" on
 
+title "An application goes while the daemon runs"
+run 0 zpctl uninstall com.example.cinema
+eventually hides_now com.example.subtitles zpctl tree || true
+run 0 zpctl tree
+hides com.example.subtitles
+shows '3 plug-ins in 1 application'
+
+title "And is installed again: its plug-ins are new ones, but what the user chose stays"
+run 0 zpctl install "$build/examples/Applications/Cinema.app"
+eventually tells com.example.subtitles zpctl tree || true
+run 0 zpctl match HXUserElection=1
+shows com.example.subtitle-shifter 2.3 elected '1 plug-in'
+hides "$subtitles"
+
+title "A new version over it, in one step: nobody ever sees half of one"
+cp -R "$build/examples/Applications/Cinema.app" "$home/Cinema.app"
+sed -i 's/>4\.2</>4.3</' "$home/Cinema.app/Info.plist"
+sed -i 's/>2\.3</>2.4</' "$home/Cinema.app/PlugIns/Subtitles.appex/Info.plist"
+run 0 zpctl install "$home/Cinema.app"
+shows 'com.example.cinema 4.3' 'in place of com.example.cinema 4.2'
+eventually tells 2.4 zpctl match HXExtensionIdentifier=com.example.subtitle-shifter || true
+run 0 zpctl match --flags 1 HXExtensionIdentifier=com.example.subtitle-shifter
+shows 2.4 elected '1 plug-in'
+
 title "After a restart everything is still known, under the same UUID, and so is the user's choice"
 stop_daemon
 run 3 zpctl find "$uuid"
@@ -297,7 +328,7 @@ start_daemon
 run 0 zpctl find "$uuid"
 shows com.example.predict "$uuid"
 run 0 zpctl match HXUserElection=1
-shows com.example.subtitle-shifter 2.3 elected '1 plug-in'
+shows com.example.subtitle-shifter 2.4 elected '1 plug-in'
 stop_daemon
 
 printf '\nThe demo worked: every step above did what it should.\n'

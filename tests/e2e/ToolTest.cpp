@@ -96,6 +96,41 @@ TEST(Tool, ChangesWhatTheDaemonKeeps) {
     EXPECT_THAT(tool.run({"match", "--flags", "1"}), testing::Not(HasSubstr("away")));
 }
 
+// All of an application's plug-ins change at once, for everybody who asks.
+TEST(Tool, InstallsOverAnApplicationInOneStepForClients) {
+    constexpr int plugIns = 8;
+    const Home home;
+    const auto source = [&](const std::string& version) {
+        const std::string app = home.addApp("Some", "source" + version);
+        for (int i = 0; i < plugIns; ++i)
+            addPlugIn(app, "P" + std::to_string(i),
+                      {.identifier = "p" + std::to_string(i), .version = version});
+        return app;
+    };
+    const std::string sources[] = {source("1"), source("2")};
+    const Tool tool(home);
+    ASSERT_THAT(tool.run({"install", sources[0]}), testing::StartsWith("0 "));
+    const Daemon daemon(home.path());
+    WireClient client = daemon.connect();
+    for (int change = 1; change <= 6; ++change) {
+        Program install = tool.start({"install", sources[change % 2]});
+        const std::string wanted = change % 2 == 0 ? "1" : "2";
+        const auto arrived = [&] {
+            int found = 0;
+            int old = 0;
+            for (const Item& form : match(client, Item::map({}), 1)) {
+                ++found;
+                old += form["version"].text() == wanted ? 0 : 1;
+            }
+            EXPECT_EQ(found, plugIns) << "change " << change;
+            EXPECT_TRUE(old == 0 || old == plugIns) << "change " << change << ": " << old;
+            return old == 0 || testing::Test::HasFailure();
+        };
+        ASSERT_TRUE(eventually(arrived)) << "change " << change;
+        EXPECT_EQ(install.exitStatus(), 0) << install.errors();
+    }
+}
+
 TEST(Tool, MonitorTellsOfChangesAndEndsWell) {
     const Home home;
     const std::string plugIn = addAppWith(home, "Some", {.identifier = "some"});
