@@ -21,6 +21,7 @@ ARRegistry::open(platform::Places places, platform::Locale& locale,
     auto opened = AROpenStore(places.registryDatabase);
     if (!opened)
         return std::unexpected(std::move(opened.error()));
+    places.registryDatabase = opened->path;
     const std::shared_ptr<ARStore> store = std::move(opened->store);
     const bool isComplete = opened->content.complete;
     const std::shared_ptr<ARProxyContext> context(

@@ -100,11 +100,13 @@ private:
 [[nodiscard]] std::string ARDamagedStorePath(const std::string& path);
 
 struct AROpenedStore {
+    std::string path;
     platform::UniqueFd lock; // keeps other daemons away for as long as it lives
     std::unique_ptr<ARStore> store;
     ARStore::Content content;
 };
 
 // Opens the database and reads it. A damaged one is set aside with one log line, and an empty one
-// takes its place. One that another daemon uses is left alone.
-[[nodiscard]] std::expected<AROpenedStore, platform::Error> AROpenStore(const std::string& path);
+// takes its place. One that another daemon uses is left alone, and one beside it taken instead.
+[[nodiscard]] std::expected<AROpenedStore, platform::Error>
+AROpenStore(const std::string& usualPath);

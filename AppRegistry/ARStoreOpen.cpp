@@ -18,6 +18,7 @@ namespace {
 constexpr std::int64_t schemaVersion = 2;
 constexpr int waitForOtherProcessMilliseconds = 5000;
 constexpr ::mode_t lockMode = 0600;
+constexpr int mostDaemons = 8; // on one home at a time
 
 constexpr const char* version1 =
     "BEGIN;"
@@ -152,19 +153,42 @@ std::optional<std::string> writableByOthers(const std::string& path) {
     return std::nullopt;
 }
 
-// For as long as the answer lives no other daemon opens this database: each would go by its own
-// memory of what both change. Only who may write the database can hold the lock.
-std::expected<platform::UniqueFd, platform::Error> lockFor(const std::string& path) {
+struct LockedPath {
+    std::string path;
+    platform::UniqueFd lock;
+};
+
+// For as long as the answer lives no other daemon opens the database at this path. Only who may
+// write it can hold the lock. Nothing when another one has it.
+std::expected<std::optional<LockedPath>, platform::Error> lockAt(const std::string& path) {
     const std::string lockPath = ARFileBeside(path, ".lock");
     platform::UniqueFd lock(
         ::open(lockPath.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, lockMode));
     if (!lock)
         return std::unexpected(platform::posixError(errno, "open " + lockPath));
     if (::flock(lock.get(), LOCK_EX | LOCK_NB) == 0)
-        return lock;
-    const bool isTaken = errno == EWOULDBLOCK;
-    return std::unexpected(
-        platform::posixError(errno, isTaken ? "another daemon uses " + path : "lock " + lockPath));
+        return LockedPath{path, std::move(lock)};
+    if (errno == EWOULDBLOCK)
+        return std::nullopt;
+    return std::unexpected(platform::posixError(errno, "lock " + lockPath));
+}
+
+// Each daemon goes by its own memory of what it changes, so that each has a database to itself:
+// one that comes second, to serve another name, has another one.
+std::expected<LockedPath, platform::Error> lockFor(const std::string& path) {
+    for (int number = 1; number <= mostDaemons; ++number) {
+        const std::string suffix = "-" + std::to_string(number) + ".db";
+        auto locked = lockAt(number == 1 ? path : ARFileBeside(path, suffix));
+        if (!locked)
+            return std::unexpected(std::move(locked).error());
+        if (!*locked)
+            continue;
+        if (number > 1)
+            ARLog().standard("another daemon uses %{public}@: going by %{public}@", path,
+                             (*locked)->path);
+        return std::move(**locked);
+    }
+    return std::unexpected(platform::posixError(EWOULDBLOCK, "too many daemons use " + path));
 }
 
 using OpenedStore = std::pair<std::unique_ptr<ARStore>, ARStore::Content>;
@@ -238,12 +262,13 @@ std::string ARDamagedStorePath(const std::string& path) {
     return path + ".damaged";
 }
 
-std::expected<AROpenedStore, platform::Error> AROpenStore(const std::string& path) {
-    if (auto error = platform::makeFolders(folderOf(path), 0755))
+std::expected<AROpenedStore, platform::Error> AROpenStore(const std::string& usualPath) {
+    if (auto error = platform::makeFolders(folderOf(usualPath), 0755))
         return std::unexpected(std::move(*error));
-    auto lock = lockFor(path);
-    if (!lock)
-        return std::unexpected(std::move(lock).error());
+    auto locked = lockFor(usualPath);
+    if (!locked)
+        return std::unexpected(std::move(locked).error());
+    const std::string& path = locked->path;
     auto opened = ::access(path.c_str(), F_OK) == 0 ? openExisting(path) : openAndLoad(path);
     if (!opened && opened.error().damaged) {
         const std::string reason = opened.error().reason;
@@ -262,5 +287,6 @@ std::expected<AROpenedStore, platform::Error> AROpenStore(const std::string& pat
                                                platform::fileErrorReadUnknown,
                                                path + ": " + opened.error().reason});
     }
-    return AROpenedStore{std::move(*lock), std::move(opened->first), std::move(opened->second)};
+    return AROpenedStore{std::move(locked->path), std::move(locked->lock), std::move(opened->first),
+                         std::move(opened->second)};
 }
