@@ -50,7 +50,8 @@ void ARPass::run(const platform::Places& places, ARDepth depth, const ARKeptPath
         lookAtAdded(item);
     presence_ = ARPresence::added;
     for (const std::string& path : kept.added)
-        bring(path);
+        if (!bring(path))
+            removeIdleApplication(ARApplicationPathOf(path));
     removeUnseen();
     flush();
     complaints_.endPass(number_);
