@@ -108,13 +108,13 @@ void ARRegistry::storeLearntGrants() {
     store(batch);
 }
 
-// What is stored is shown to readers, and then to the observer.
+// What is stored is shown to readers, and then to the observer. REQUIRES: readers are held.
 void ARRegistry::show(const ARBatch& batch) {
     if (batch.pathsChanged)
         keptPaths_.keep(model_);
     auto next = std::make_shared<ARSnapshot>(*context_->published.get());
     const auto outcome = editor_.apply(*next, batch);
-    publish(std::move(next));
+    store_->releaseReaders([&] { publish(std::move(next)); });
     if (batch.declaresTypes())
         declareTypes();
     ARWorkspaceObserver* const observer = observer_;
@@ -162,6 +162,7 @@ void ARRegistry::follow(std::function<void()> done) {
 
 // What the folders tell can be told again: where it cannot be stored it is shown all the same.
 bool ARRegistry::storeAndShow(ARBatch&& batch) {
+    store_->holdReaders();
     store(batch);
     show(batch);
     return true;
@@ -182,10 +183,13 @@ template <class Act>
 std::optional<platform::Error> ARRegistry::carryOut(const std::string& path, Act&& act) {
     const std::optional<std::string> refusal = queue_.sync([&] {
         auto refused = pass(std::forward<Act>(act), [this](ARBatch&& batch) {
-            if (!storeNow(batch))
-                return false;
-            show(batch);
-            return true;
+            store_->holdReaders();
+            const bool stored = storeNow(batch);
+            if (stored)
+                show(batch);
+            else
+                store_->releaseReaders([] {});
+            return stored;
         });
         if (!refused)
             lookAt({std::string(ARItemOf(path))});

@@ -221,3 +221,15 @@ std::optional<ARSignatureFacts> ARStore::signature(std::int64_t id) const {
     select.reset();
     return found;
 }
+
+// Reading anything is what begins the transaction.
+void ARStore::holdReaders() {
+    const std::lock_guard lock(impl_->readerLock);
+    static_cast<void>(impl_->reader.execute("BEGIN; SELECT sequence FROM knowledge"));
+}
+
+void ARStore::releaseReaders(const std::function<void()>& show) {
+    const std::lock_guard lock(impl_->readerLock);
+    static_cast<void>(impl_->reader.execute("COMMIT"));
+    show();
+}

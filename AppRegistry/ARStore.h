@@ -2,6 +2,7 @@
 
 #include <cstdint>
 #include <expected>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <span>
@@ -85,6 +86,13 @@ public:
     [[nodiscard]] std::optional<std::string> info(std::int64_t id) const;
     // The signature of an entry; nothing when it has none, is gone or cannot be read.
     [[nodiscard]] std::optional<ARSignatureFacts> signature(std::int64_t id) const;
+
+    // From here on both answer as of now, whatever is committed: what readers still see can be
+    // looked up until they see what came instead. That is what `show` does; while it runs nobody
+    // looks anything up, and afterwards what was committed is found. By turns, on the writer's
+    // thread.
+    void holdReaders();
+    void releaseReaders(const std::function<void()>& show);
 
 private:
     struct Impl;
