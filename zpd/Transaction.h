@@ -8,6 +8,7 @@
 #include <string>
 #include <string_view>
 #include <sys/types.h>
+#include <vector>
 
 #include "platform/ipc/Message.h"
 #include "platform/value/Error.h"
@@ -139,6 +140,8 @@ private:
 
     // ---- zpd/requests/Discovery.cpp
     void matchPlugIns();
+    [[nodiscard]] std::vector<platform::SharedBytes>
+    discover(const std::optional<platform::Dictionary>& rules, std::uint64_t flags);
     [[nodiscard]] bool mayDiscoverAll() const;
 
     // ---- zpd/requests/Lookup.cpp

@@ -70,7 +70,9 @@ ZPDPlugIn::Ptr ZPDatabase::createPlugInForProxy(const ARZephrinProxy::Ptr& proxy
     if (plugIn->hasEntitlement(Entitlement::autoElect))
         autoElect(*plugIn);
     purgeCachesToLimit(cacheLimit_);
-    cache_[plugIn->uuid()] = plugIn;
+    // One that was uninstalled meanwhile would never leave the cache again.
+    if (platform_.workspace.zephrinProxyForUUID(plugIn->uuid()))
+        cache_[plugIn->uuid()] = plugIn;
     return plugIn;
 }
 

@@ -1,12 +1,15 @@
 // The registry follows its folders while the daemon runs.
 
 #include <algorithm>
+#include <array>
+#include <atomic>
 #include <csignal>
 #include <fcntl.h>
 #include <filesystem>
 #include <fstream>
 #include <map>
 #include <sys/stat.h>
+#include <thread>
 #include <unistd.h>
 
 #include <gtest/gtest.h>
@@ -181,6 +184,43 @@ TEST_F(Follow, WhateverHappensToAnApplicationIsSeen) {
             << heard << "\nseen: " << seen();
     }
     EXPECT_EQ(daemon->linesWith(" error: "), 1u) << daemon->wholeLog(); // of what others may write
+}
+
+TEST_F(Follow, AnExchangedApplicationIsNeverSeenHalf) {
+    const std::size_t plugIns = 60;
+    const auto make = [&](const std::string& version, const char* folder) {
+        const std::string app = home.addApp("A", folder);
+        for (std::size_t i = 0; i < plugIns; ++i) {
+            const std::string name = "p" + std::to_string(i);
+            addPlugIn(app, name, {.identifier = name, .version = version});
+        }
+        return app;
+    };
+    const std::string app = make("1", "Applications");
+    const std::string other = make("2", "Aside");
+    start();
+    std::atomic<bool> over = false;
+    std::thread exchanger([&] {
+        for (int i = 0; i < 200; ++i) {
+            swapFolders(app, other);
+            std::this_thread::sleep_for(std::array{0ms, 40ms, 45ms}.at(i % 3));
+        }
+        over = true;
+    });
+    std::map<std::string, std::size_t> answers; // "COUNTxVERSION ..." of each
+    while (!over) {
+        std::map<std::string, std::size_t> counts;
+        for (const Item& form : match(*client, Item::map({})))
+            ++counts[form["version"].text()];
+        std::string answer;
+        for (const auto& [version, count] : counts)
+            answer += std::to_string(count) + "x" + version + " ";
+        ++answers[answer];
+    }
+    exchanger.join();
+    EXPECT_GT(answers["60x1 "], 0u);
+    EXPECT_GT(answers["60x2 "], 0u);
+    EXPECT_EQ(answers.size(), 2u) << testing::PrintToString(answers);
 }
 
 } // namespace

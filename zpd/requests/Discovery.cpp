@@ -4,6 +4,7 @@
 
 #include <utility>
 
+#include "AppRegistry/ARApplicationWorkspace.h"
 #include "Zephrin/ZPDError.h"
 #include "Zephrin/ZPDLog.h"
 #include "Zephrin/ZPDaemonClient.h"
@@ -19,6 +20,8 @@ using platform::SharedBytes;
 using platform::Value;
 
 namespace {
+
+constexpr int mostDiscoveries = 5;
 
 std::optional<std::string> plugInsPathOf(const ZPDIpcClient& client) {
     return client.bundle() ? client.bundle()->plugInsPath() : std::nullopt;
@@ -36,10 +39,23 @@ void Transaction::matchPlugIns() {
     if ((flags & ZPDaemonClient::ZPDiscoverAll) != 0 && !mayDiscoverAll())
         return fail(ZPDErrorCode::notAuthorized, "unauthorized discovery flag (ZPDiscoverAll)");
 
-    Discovery discovery(*this, rules ? std::optional(*rules) : std::nullopt, flags);
-    setMatches(ZPDaemonClient::convertToIPC(discovery.run(), version()));
+    const auto matches = discover(rules ? std::optional(*rules) : std::nullopt, flags);
+    setMatches(ZPDaemonClient::convertToIPC(matches, version()));
     ZPDLogOps().debug("reply marshalled");
     done();
+}
+
+// An answer is of one state of the registry: what was installed or removed while it was made is not
+// seen halfway. Where changes never end, the last answer has to do.
+std::vector<SharedBytes> Transaction::discover(const std::optional<Dictionary>& rules,
+                                               std::uint64_t flags) {
+    ARApplicationWorkspace& workspace = server().services().workspace;
+    for (int attempt = 1;; ++attempt) {
+        const std::uint64_t before = workspace.knowledgeSequence();
+        auto matches = Discovery(*this, rules, flags).run();
+        if (attempt == mostDiscoveries || before == workspace.knowledgeSequence())
+            return matches;
+    }
 }
 
 // Asks for the sandbox only where the entitlement is held.
