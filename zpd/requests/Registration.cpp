@@ -67,7 +67,7 @@ bool Transaction::removePlugIn(const RemovalRight& right, const std::string& pat
 bool Transaction::hasPathToWalk() const {
     const Value* const value = request().find("paths");
     const platform::Array* const paths = value ? value->array() : nullptr;
-    if (!paths || paths->size() == 0)
+    if (!paths || paths->empty())
         return false;
     const auto first = paths->begin()->string();
     return first && first->starts_with('/');
