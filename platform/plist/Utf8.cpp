@@ -1,5 +1,8 @@
 #include "platform/plist/Utf8.h"
 
+#include <cstdint>
+#include <cstring>
+
 namespace platform::plist {
 
 namespace {
@@ -25,7 +28,41 @@ char continuation(char32_t bits) {
     return static_cast<char>(0x80 | (bits & 0x3f));
 }
 
+// How many bytes at the front, in steps of eight, are plain ASCII without controls. (Taking 0x20
+// away sets the high bit of what is less.)
+std::size_t plainLength(std::string_view text) {
+    constexpr std::uint64_t highBits = 0x8080808080808080U;
+    constexpr std::uint64_t blanks = 0x2020202020202020U;
+    std::size_t length = 0;
+    for (; length + 8 <= text.size(); length += 8) {
+        std::uint64_t eight = 0;
+        std::memcpy(&eight, text.data() + length, sizeof eight);
+        if (((eight | (eight - blanks)) & highBits) != 0)
+            break;
+    }
+    return length;
+}
+
+bool isXmlCharacter(char32_t c) {
+    if (c < 0x20)
+        return c == '\t' || c == '\n' || c == '\r';
+    return c != 0xfffe && c != 0xffff;
+}
+
 } // namespace
+
+bool isXmlText(std::string_view text) {
+    while (!text.empty()) {
+        if (static_cast<unsigned char>(text.front()) < 0x80)
+            text.remove_prefix(plainLength(text));
+        if (text.empty())
+            return true;
+        const auto character = takeCharacter(text);
+        if (!character || !isXmlCharacter(*character))
+            return false;
+    }
+    return true;
+}
 
 std::optional<char32_t> takeCharacter(std::string_view& text) {
     const auto first = static_cast<unsigned char>(text.front());

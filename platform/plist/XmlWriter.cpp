@@ -1,8 +1,6 @@
 #include <algorithm>
 #include <cassert>
 #include <cmath>
-#include <cstdint>
-#include <cstring>
 
 #include "platform/plist/PropertyList.h"
 #include "platform/plist/Readers.h"
@@ -23,45 +21,15 @@ constexpr std::size_t deepestIndent = 8;
 
 // ---- What can be written
 
-// How many bytes at the front, in steps of eight, are plain ASCII without controls. (Taking 0x20
-// away sets the high bit of what is less.)
-std::size_t plainLength(std::string_view text) {
-    constexpr std::uint64_t highBits = 0x8080808080808080U;
-    constexpr std::uint64_t blanks = 0x2020202020202020U;
-    std::size_t length = 0;
-    for (; length + 8 <= text.size(); length += 8) {
-        std::uint64_t eight = 0;
-        std::memcpy(&eight, text.data() + length, sizeof eight);
-        if (((eight | (eight - blanks)) & highBits) != 0)
-            break;
-    }
-    return length;
-}
-
-// XML 1.0, production 2 (Char).
-bool isXmlCharacter(char32_t c) {
-    if (c < 0x20)
-        return c == '\t' || c == '\n' || c == '\r';
-    return c != 0xfffe && c != 0xffff;
-}
-
-const char* objectionToText(std::string_view text) {
-    while (!text.empty()) {
-        text.remove_prefix(plainLength(text));
-        if (text.empty())
-            return nullptr;
-        const auto character = takeCharacter(text);
-        if (!character || !isXmlCharacter(*character))
-            return "text with a character that XML cannot hold";
-    }
-    return nullptr;
+const char* objectionTo(std::string_view text) {
+    return isXmlText(text) ? nullptr : "text with a character that XML cannot hold";
 }
 
 const char* objectionTo(const Value& value);
 
 const char* objectionTo(const Dictionary& dictionary) {
     for (const DictionaryEntry& entry : dictionary) {
-        if (const char* const objection = objectionToText(entry.key.view()))
+        if (const char* const objection = objectionTo(entry.key.view()))
             return objection;
         if (const char* const objection = objectionTo(entry.value))
             return objection;
@@ -90,7 +58,7 @@ const char* objectionTo(const Value& value) {
     case Value::Kind::date:
         return hasDateText(*value.date()) ? nullptr : "a date outside the years 0 to 9999";
     case Value::Kind::string:
-        return objectionToText(*value.string());
+        return objectionTo(*value.string());
     case Value::Kind::array:
         return objectionTo(*value.array());
     case Value::Kind::dictionary:
