@@ -128,7 +128,7 @@ TEST_F(Registration, RefusesWhatTheTablesSay) {
         SCOPED_TRACE(each.what);
         EXPECT_EQ(answer(each.request), each.answer);
     }
-    EXPECT_EQ(seen(), "in") << "one that stands alone is seen on the system volume only";
+    EXPECT_EQ(seen(), "in") << "one that stands alone is seen below /System only";
     EXPECT_EQ(daemon->terminate(), 0);
     const std::string refused =
         "default default: refused request from pid=" + std::to_string(getpid()) +
@@ -156,7 +156,10 @@ TEST_F(Registration, OutlivesTheDaemon) {
     const Item uuid = uuidOf(out);
     EXPECT_EQ(add({out, in}), "");
     EXPECT_EQ(uuidOf(out), uuid);
+    const Item cached = findRequest(Item::map({{"uuids", Item::uuid(uuidOf(in).text())}}));
+    EXPECT_EQ(answer(cached), "");
     EXPECT_EQ(remove({in}), granted);
+    EXPECT_EQ(answer(cached), "15 Cannot locate PlugIn");
     EXPECT_TRUE(daemon->logs("plug-in UNINSTALLED:in in(1.0)"));
     EXPECT_EQ(daemon->linesWith("plug-in INSTALLED:com.example.Out out(1.0)"), 1u);
     restart();
