@@ -48,6 +48,10 @@ ARDirt::Due ARDirt::take(Clock::time_point now) {
     return due;
 }
 
+bool ARDirt::contains(const std::string& item) const {
+    return everything_ || items_.contains(item);
+}
+
 bool ARDirt::moved(const std::string& item) const {
     if (everything_ && everything_->moved)
         return true;

@@ -38,6 +38,8 @@ public:
     // A look at the item begins: what happened before counts no more.
     void forget(const std::string& item) { items_.erase(item); }
 
+    // What became of the item since then, or of everything.
+    [[nodiscard]] bool contains(const std::string& item) const;
     [[nodiscard]] bool moved(const std::string& item) const;
 
 private:

@@ -152,17 +152,23 @@ void ARPass::beginItem(const std::string& item) {
 bool ARPass::endItem() {
     removeUnseenOfItem();
     removeIdleApplication(item_);
-    const bool torn = !abandoned_ && mark() != began_ && isTorn();
+    const bool matters = mark() != began_ || !refusals_.empty();
+    const bool torn = !abandoned_ && matters && isTorn();
     const std::string item = std::exchange(item_, {});
-    if (torn || abandoned_)
+    if (torn || abandoned_) {
         takeBack(beforeItem_, began_);
+        watches_.discardLook(item);
+    }
     if (!full_)
         watches_.endLook(item);
     if (torn || abandoned_)
         return abandoned_;
-    for (const auto& [path, reason] : refusals_)
-        complaints_.report(path, reason, number_);
-    complaints_.endItem(item, number_);
+    // One that is still being copied is no trouble yet: it is looked at again.
+    if (refusals_.empty() || !watches_.hasChanged(item)) {
+        for (const auto& [path, reason] : refusals_)
+            complaints_.report(path, reason, number_);
+        complaints_.endItem(item, number_);
+    }
     flushWhenDue();
     return true;
 }

@@ -186,6 +186,18 @@ void ARWatches::endLook(const std::string& item) {
     forgetIfUnused(scope);
 }
 
+void ARWatches::discardLook(const std::string& item) {
+    const std::lock_guard lock(lock_);
+    Scopes::value_type& scope = scopeOf(item);
+    for (const int number : scope.second.numbers) {
+        auto [at, end] = interests_.equal_range(number);
+        for (; at != end; ++at) {
+            if (at->second.scope == &scope)
+                at->second.pass = 0;
+        }
+    }
+}
+
 bool ARWatches::hasMoved(const std::string& item) {
     const std::lock_guard lock(lock_);
     drain();
@@ -195,6 +207,12 @@ bool ARWatches::hasMoved(const std::string& item) {
 bool ARWatches::hasInterest(int number, const Scopes::value_type& scope) const {
     const auto [begin, end] = interests_.equal_range(number);
     return std::any_of(begin, end, [&](const auto& at) { return at.second.scope == &scope; });
+}
+
+bool ARWatches::hasChanged(const std::string& item) {
+    const std::lock_guard lock(lock_);
+    drain();
+    return dirt_.contains(item);
 }
 
 // Lets go of reasons for a watch; of the watch itself when none is left.

@@ -62,8 +62,12 @@ public:
     // The look at one item. Before its end watches that were not set since `beginPass` go.
     void beginLook(const std::string& item);
     void endLook(const std::string& item);
-    // Whether the item, or a folder above it, came or went since its look began.
+    // The look came to nothing: what it set counts as not set.
+    void discardLook(const std::string& item);
+    // Whether the item, or a folder above it, came or went since its look began; whether anything
+    // at all happened to it.
     [[nodiscard]] bool hasMoved(const std::string& item);
+    [[nodiscard]] bool hasChanged(const std::string& item);
 
     // A folder in which items of this kind lie; canonical.
     void watchRoot(ARKind kind, const std::string& folder);
