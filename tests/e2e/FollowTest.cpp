@@ -223,5 +223,74 @@ TEST_F(Follow, AnExchangedApplicationIsNeverSeenHalf) {
     EXPECT_EQ(answers.size(), 2u) << testing::PrintToString(answers);
 }
 
+// Folders that were prepared are renamed in and out; a few stay, one in four is another version.
+TEST_F(Follow, AStormLeavesEverythingAsTheFoldersAre) {
+    constexpr int count = 1000;
+    const auto name = [](int i) { return "S" + std::to_string(i); };
+    for (int i = 0; i < count; ++i)
+        addAppWith(home, name(i), {.identifier = name(i)}, "Aside");
+    fs::create_directory(home / "Away");
+    const std::string stays = makeApp("Stays", "1", "Aside");
+    start();
+    fs::rename(stays, home / "Applications/Stays.app");
+    expect("Stays.one 1, Stays.two 1");
+    const std::size_t watchesBefore = watches();
+    const std::size_t descriptorsBefore = descriptors();
+
+    const auto move = [&](int i, const std::string& from, const std::string& to) {
+        fs::rename(home / (from + name(i) + ".app"), home / (to + name(i) + ".app"));
+    };
+    for (int i = 0; i < count; ++i) {
+        move(i, "Aside/", "Applications/");
+        if (i >= 50)
+            move(i - 50, "Applications/", "Away/");
+        std::this_thread::sleep_for(1ms);
+    }
+    for (int i = count - 50; i < count - 10; ++i)
+        move(i, "Applications/", "Away/");
+    std::string expected;
+    for (int i = count - 10; i < count; ++i)
+        expected += name(i) + " 1.0, ";
+    expect(expected + "Stays.one 1, Stays.two 1");
+
+    EXPECT_EQ(stored("SELECT count(*) FROM entries"), 10 * 2 + 3);
+    EXPECT_EQ(stored("SELECT count(*) FROM details"), 10 * 2 + 3);
+    EXPECT_EQ(
+        stored("SELECT count(*) FROM entries WHERE CAST(path AS TEXT) NOT LIKE '%/Applications/%'"),
+        0);
+    // An application, its PlugIns and what is in there.
+    EXPECT_EQ(watches(), watchesBefore + 10 * 3);
+    EXPECT_EQ(descriptors(), descriptorsBefore);
+    const auto lines = [&](const char* text) { return daemon->linesWith(text); };
+    EXPECT_TRUE(eventually(
+        [&] { return lines("plug-in INSTALLED:") == lines("plug-in UNINSTALLED:") + 10 + 2; }));
+    EXPECT_GT(lines("plug-in UNINSTALLED:"), 100u); // was a storm for the daemon too
+    EXPECT_EQ(lines("ar error: skipping"), 0u);
+}
+
+TEST_F(Follow, LostEventsAreMadeUpFor) {
+    makeApp("A", "1");
+    const std::string aside = makeApp("A", "2", "Aside");
+    const std::string other = makeApp("B", "1", "Aside");
+    start();
+    expect("A.one 1, A.two 1");
+    std::size_t queued = 0;
+    std::ifstream("/proc/sys/fs/inotify/max_queued_events") >> queued;
+    ASSERT_GT(queued, 0u);
+    daemon->program().signal(SIGSTOP);
+    const std::string names[] = {home / "Applications/x", home / "Applications/y"};
+    writeFile(names[0], "");
+    for (std::size_t i = 0; i < queued; ++i) // two events each
+        fs::rename(names[i % 2], names[(i + 1) % 2]);
+    swapFolders(aside, home / "Applications/A.app");
+    fs::rename(other, home / "Applications/B.app");
+    daemon->program().signal(SIGCONT);
+    expect("A.one 2, A.two 2, B.one 1, B.two 1");
+    EXPECT_EQ(daemon->linesWith(" error: "), 1u) << daemon->wholeLog();
+    EXPECT_EQ(daemon->linesWith("changes of the folders came too fast"), 1u);
+    fs::remove_all(home / "Applications/B.app"); // watched again
+    expect("A.one 2, A.two 2");
+}
+
 } // namespace
 } // namespace e2e
