@@ -152,6 +152,7 @@ private:
     [[nodiscard]] std::shared_ptr<ZPDPlugIn> findPlugInByPath(const std::string& path) const;
 
     // ---- zpd/requests/UuidList.cpp
+    [[nodiscard]] std::optional<platform::Uuid> listedUuid(const platform::Value& entry);
     [[nodiscard]] std::shared_ptr<ZPDPlugIn> listedPlugIn(const platform::Uuid& uuid,
                                                           const platform::Value* path) const;
 

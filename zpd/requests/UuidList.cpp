@@ -32,7 +32,6 @@ const Array* pathsBeside(const Array& uuids, const Dictionary& request) {
 
 } // namespace
 
-// A value that is a UUID has its 16 bytes: there is none that could not be made.
 bool Transaction::processUuidList(const PlugInBlock& block) {
     server().assertOnServiceQueue();
     const Value* const value = request().find("uuids");
@@ -43,11 +42,9 @@ bool Transaction::processUuidList(const PlugInBlock& block) {
     }
     const Array* const paths = pathsBeside(*uuids, request());
     for (std::size_t i = 0; i < uuids->size(); ++i) {
-        const auto uuid = (*uuids)[i].uuid();
-        if (!uuid) {
-            fail(ZPDErrorCode::invalidRequest, "invalid request (bad uuid array)");
+        const auto uuid = listedUuid((*uuids)[i]);
+        if (!uuid)
             return false;
-        }
         const ZPDPlugIn::Ptr plugIn = listedPlugIn(*uuid, paths ? &(*paths)[i] : nullptr);
         if (!plugIn) {
             fail(ZPDErrorCode::invalidRequest, "no such plugin (uuid not found)");
@@ -57,6 +54,18 @@ bool Transaction::processUuidList(const PlugInBlock& block) {
             return false;
     }
     return true;
+}
+
+// On the wire a UUID is nothing but its 16 bytes: the second failure is for other transports.
+std::optional<platform::Uuid> Transaction::listedUuid(const Value& entry) {
+    if (entry.kind() != Value::Kind::uuid) {
+        fail(ZPDErrorCode::invalidRequest, "invalid request (bad uuid array)");
+        return std::nullopt;
+    }
+    const auto uuid = entry.uuid();
+    if (!uuid)
+        fail(ZPDErrorCode::invalidRequest, "invalid request (uuid allocation failure)");
+    return uuid;
 }
 
 ZPDPlugIn::Ptr Transaction::listedPlugIn(const platform::Uuid& uuid, const Value* path) const {
