@@ -9,8 +9,8 @@
 
 namespace bench {
 
-// The daemon on a home, and one connection to it. The home must outlive it. The annotations lie in a
-// folder of their own, as on a box: the daemon watches the folders above its settings.
+// The daemon on a home, and one connection to it. The home must outlive it. The annotations lie in
+// a folder of their own, as on a box: the daemon watches the folders above its settings.
 class Rig {
 public:
     explicit Rig(const std::string& home);
