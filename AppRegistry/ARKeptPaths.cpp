@@ -100,6 +100,7 @@ ARKeptPaths::Paths pathsOf(const ARModel& model) {
 } // namespace
 
 ARKeptPaths::Paths ARKeptPaths::read() {
+    platform::removeUnfinishedFiles(file_);
     auto paths = readTrusted(file_);
     if (paths) {
         held_ = *paths;
