@@ -34,7 +34,6 @@ output=$home/output
 PATH=$build/bin:$PATH
 export ZEPHRIN_HOME="$home/home"
 export PATH
-socket=$ZEPHRIN_HOME/run/com.tovana.zephrin.zpd
 unset ZEPHRIN_LOG ZEPHRIN_LOG_PRIVATE
 
 fail() {
@@ -90,15 +89,16 @@ eventually() {
     done
 }
 
+# The socket is there a moment before anybody listens on it.
 answers_or_ended() {
-    [ -S "$socket" ] || ! kill -0 "$daemon" 2>/dev/null
+    zpctl tree >/dev/null 2>&1 || ! kill -0 "$daemon" 2>/dev/null
 }
 
 start_daemon() {
     echo "\$ zpd -d \$ZEPHRIN_HOME/Annotations &"
     zpd -d "$ZEPHRIN_HOME/Annotations" >>"$log" 2>&1 &
     daemon=$!
-    eventually answers_or_ended || fail "the daemon made no socket"
+    eventually answers_or_ended || fail "the daemon does not answer"
     kill -0 "$daemon" 2>/dev/null || fail "the daemon ended at once"
 }
 
