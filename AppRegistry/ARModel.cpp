@@ -46,19 +46,26 @@ const ARModel::Entry* ARModel::firstWithin(std::string_view application) const {
     return first == within_.end() ? nullptr : first->second;
 }
 
+// After one of its neighbours, or as the first of its application.
 void ARModel::join(Entry& entry) {
     const std::string_view application = ARApplicationPathOf(entry.row->path.view());
     if (application.empty())
         return;
-    auto first = within_.find(application);
-    if (first == within_.end())
-        first = within_.emplace(application, nullptr).first;
-    entry.next = std::exchange(first->second, &entry);
+    Entry* neighbour = lastJoined_;
+    if (!neighbour || ARApplicationPathOf(neighbour->row->path.view()) != application)
+        neighbour = within_.emplace(application, &entry).first->second;
+    lastJoined_ = &entry;
+    if (neighbour == &entry)
+        return;
+    entry.previous = neighbour;
+    entry.next = std::exchange(neighbour->next, &entry);
     if (entry.next)
         entry.next->previous = &entry;
 }
 
 void ARModel::leave(Entry& entry) {
+    if (lastJoined_ == &entry)
+        lastJoined_ = nullptr;
     if (entry.next)
         entry.next->previous = entry.previous;
     if (entry.previous) {

@@ -75,6 +75,7 @@ private:
     std::unordered_map<std::string_view, Entry> entries_; // keys lie in the rows
     // By application the first of its plug-ins.
     std::unordered_map<std::string, Entry*, Hash, std::equal_to<>> within_;
+    Entry* lastJoined_ = nullptr; // there: the next one is most often of the same application
     std::int64_t lastId_ = 0;
     std::uint64_t pass_ = 0;
 };

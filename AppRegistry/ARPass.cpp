@@ -194,7 +194,7 @@ bool ARPass::found(const ARCandidate& candidate) {
     if (candidate.kind != ARKind::extensionPoint) {
         if (candidate.path == item_)
             folder_ = *folder;
-        watches_.watchBundle(candidate.item, std::string(candidate.path));
+        watches_.watchBundle(candidate.item, candidate.path);
     }
     bool there = true;
     if (entry && unchanged(candidate, *entry->row) && !comesBack(*entry->row)) {

@@ -170,7 +170,8 @@ void ARWatches::endFullPass() {
 void ARWatches::beginLook(const std::string& item) {
     const std::lock_guard lock(lock_);
     dirt_.forget(item);
-    scopeOf(item).second.awayPass = 0;
+    if (const auto scope = scopes_.find(item); scope != scopes_.end())
+        scope->second.awayPass = 0;
 }
 
 void ARWatches::endLook(const std::string& item) {
@@ -270,16 +271,18 @@ bool ARWatches::isRoot(ARKind kind, std::string_view folder) const {
     });
 }
 
-void ARWatches::watchBundle(const std::string& item, const std::string& folder) {
+void ARWatches::watchBundle(const std::string& item, std::string_view folder) {
+    if (depth_ != ARDepth::everything)
+        return;
     const std::lock_guard lock(lock_);
-    if (depth_ == ARDepth::everything)
-        add(folder, contentEvents, {&scopeOf(item), What::bundle, {}, pass_, {}});
+    add(std::string(folder), contentEvents, {&scopeOf(item), What::bundle, {}, pass_, {}});
 }
 
 void ARWatches::watchPlugIns(const std::string& item, const std::string& folder) {
+    if (depth_ != ARDepth::everything)
+        return;
     const std::lock_guard lock(lock_);
-    if (depth_ == ARDepth::everything)
-        add(folder, nameEvents, {&scopeOf(item), What::plugIns, {}, pass_, {}});
+    add(folder, nameEvents, {&scopeOf(item), What::plugIns, {}, pass_, {}});
 }
 
 void ARWatches::watchWay(const std::string& item, const std::string& path) {

@@ -73,7 +73,7 @@ public:
     void watchRoot(ARKind kind, const std::string& folder);
     [[nodiscard]] bool isRoot(ARKind kind, std::string_view folder) const;
     // A bundle's own folder, or one that holds an application's plug-ins.
-    void watchBundle(const std::string& item, const std::string& folder);
+    void watchBundle(const std::string& item, std::string_view folder);
     void watchPlugIns(const std::string& item, const std::string& folder);
     // All folders and links on the way to a path, which need not be there.
     void watchWay(const std::string& item, const std::string& path);
@@ -134,7 +134,7 @@ private:
     std::unordered_multimap<int, Interest> interests_; // by number of the watch
     ARDirt dirt_;
     std::uint64_t pass_ = 0;
-    ARDepth depth_ = ARDepth::roots;
+    ARDepth depth_ = ARDepth::roots; // of this pass; on the queue alone, without the lock
     bool incomplete_ = false;
     bool missing_ = false; // something could not be watched in this pass over everything
 };

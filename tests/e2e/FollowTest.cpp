@@ -223,6 +223,42 @@ TEST_F(Follow, AnExchangedApplicationIsNeverSeenHalf) {
     EXPECT_EQ(answers.size(), 2u) << testing::PrintToString(answers);
 }
 
+TEST_F(Follow, WhatWasRegisteredByPathIsFollowed) {
+    const std::string app = makeApp("Far", "1", "Elsewhere/deep");
+    const std::string other = makeApp("Far", "2", "Aside");
+    start();
+    fs::rename(makeApp("A", "1", "Elsewhere"), home / "Applications/A.app");
+    expect("A.one 1, A.two 1");
+    const std::size_t before = watches();
+    EXPECT_EQ(errorOf(client->request(pathsRequest("add", {app + "/PlugIns/one.appex"}))), "");
+    expect("A.one 1, A.two 1, Far.one 1");
+    swapFolders(app, other);
+    expect("A.one 1, A.two 1, Far.one 2");
+
+    daemon.reset();
+    start();
+    expect("A.one 1, A.two 1, Far.one 2");
+    swapFolders(app, other);
+    expect("A.one 1, A.two 1, Far.one 1");
+    fs::rename(home / "Elsewhere", home / "Gone");
+    expect("A.one 1, A.two 1");
+    EXPECT_TRUE(eventually([&] { return watches() == before; })) << watches();
+}
+
+TEST_F(Follow, ExtensionPointsComeAndGo) {
+    start();
+    const std::string folder = home / "System/Library/ExtensionPoints";
+    const auto points = [&] { return stored("SELECT count(*) FROM entries WHERE kind = 2"); };
+    writeFile(folder + "/com.example.a.plist", xmlPlist(Item::map({{"a", 1}})));
+    EXPECT_TRUE(eventually([&] { return points() == 1; }));
+    writeFile(folder + "/com.example.b.plist", xmlPlist(Item::map({{"b", 1}})));
+    EXPECT_TRUE(eventually([&] { return points() == 2; }));
+    writeFile(folder + "/com.example.b.plist", "no property list");
+    EXPECT_TRUE(daemon->logs("skipping " + folder + "/com.example.b.plist"));
+    fs::remove(folder + "/com.example.a.plist");
+    EXPECT_TRUE(eventually([&] { return points() == 0; }));
+}
+
 // Folders that were prepared are renamed in and out; a few stay, one in four is another version.
 TEST_F(Follow, AStormLeavesEverythingAsTheFoldersAre) {
     constexpr int count = 1000;
