@@ -77,8 +77,16 @@ std::size_t encodedSize(const Dictionary& annotation) {
     return platform::ipc::encode(annotation).size();
 }
 
-std::size_t sizeOf(std::string_view key, const Dictionary& annotation) {
-    return key.size() + encodedSize(annotation);
+std::size_t valuesIn(const Value& value) {
+    std::size_t count = 1;
+    if (const platform::Array* const array = value.array()) {
+        for (const Value& item : *array)
+            count += valuesIn(item);
+    } else if (const Dictionary* const dictionary = value.dictionary()) {
+        for (const DictionaryEntry& entry : *dictionary)
+            count += valuesIn(entry.value);
+    }
+    return count;
 }
 
 bool isAtMostSoDeep(const Value& value, std::size_t levels) {
@@ -209,9 +217,9 @@ std::optional<Error> ZPDAnnotationStore::loadDb(const std::string& path) {
     if (!loaded)
         return loaded.error();
     annotations_ = entriesThat(*loaded, [](const Value& entry) { return entry.dictionary(); });
-    size_ = 0;
+    extent_ = {};
     for (const DictionaryEntry& entry : annotations_)
-        size_ += sizeOf(entry.key.view(), *entry.value.dictionary());
+        extent_ += extentOf(entry.key.view(), *entry.value.dictionary());
     ++changes_;
     return std::nullopt;
 }
@@ -284,15 +292,18 @@ std::optional<Error> ZPDAnnotationStore::add(std::string_view key, const Diction
     Dictionary merged = stored.value_or(Dictionary());
     for (const DictionaryEntry& change : changes)
         merged.set(change.key, change.value);
-    const std::size_t before = stored ? sizeOf(key, *stored) : 0;
-    const std::size_t size = encodedSize(merged);
-    if (size > largestAnnotation)
+    if (encodedSize(merged) > largestAnnotation)
         return ZPDErrorMake(ZPDErrorCode::badAnnotation, "the annotation would be too large");
-    const std::size_t together = size_ - before + key.size() + size;
-    if (together > mostTogether && together > size_)
+    Extent together = extent_;
+    if (stored)
+        together -= extentOf(key, *stored);
+    together += extentOf(key, merged);
+    const bool tooLarge = together.bytes > mostTogether && together.bytes > extent_.bytes;
+    const bool tooMany = together.values > mostValues && together.values > extent_.values;
+    if (tooLarge || tooMany)
         return ZPDErrorMake(ZPDErrorCode::badAnnotation, "all annotations would be too large");
     annotations_.set(key, std::move(merged));
-    size_ = together;
+    extent_ = together;
     ++changes_;
     return std::nullopt;
 }
@@ -302,8 +313,13 @@ void ZPDAnnotationStore::remove(std::string_view key) {
     if (!stored)
         return;
     annotations_.remove(key);
-    size_ -= sizeOf(key, *stored);
+    extent_ -= extentOf(key, *stored);
     ++changes_;
+}
+
+ZPDAnnotationStore::Extent ZPDAnnotationStore::extentOf(std::string_view key,
+                                                        const Dictionary& annotation) {
+    return {key.size() + encodedSize(annotation), valuesIn(annotation)};
 }
 
 bool ZPDAnnotationStore::canHold(const Dictionary& annotation) {

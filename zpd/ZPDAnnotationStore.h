@@ -9,6 +9,7 @@
 #include <string_view>
 
 #include "platform/ipc/Cbor.h"
+#include "platform/ipc/Frame.h"
 #include "platform/value/Error.h"
 #include "platform/value/Value.h"
 
@@ -27,6 +28,8 @@ class ZPDAnnotationStore {
 public:
     static constexpr std::size_t largestAnnotation = 64U << 10; // bytes, encoded for the wire
     static constexpr std::size_t mostTogether = 16U << 20;      // bytes; their keys count, too
+    // All together: small values take many times their encoding in memory and in the file.
+    static constexpr std::size_t mostValues = platform::ipc::mostRequestValues;
     // Levels of an annotation; in a reply it stands in a form, and that in an array.
     static constexpr std::size_t deepestAnnotation = platform::ipc::deepestNesting - 2;
 
@@ -74,6 +77,26 @@ public:
     saveDb(const std::string& path, const platform::Dictionary& annotations);
 
 private:
+    // What annotations take of the room that there is for all of them, keys included.
+    struct Extent {
+        std::size_t bytes = 0; // encoded
+        std::size_t values = 0;
+
+        Extent& operator+=(const Extent& other) {
+            bytes += other.bytes;
+            values += other.values;
+            return *this;
+        }
+
+        Extent& operator-=(const Extent& other) {
+            bytes -= other.bytes;
+            values -= other.values;
+            return *this;
+        }
+    };
+
+    [[nodiscard]] static Extent extentOf(std::string_view key,
+                                         const platform::Dictionary& annotation);
     // Where earlier versions kept the store.
     [[nodiscard]] std::expected<std::string, platform::Error> containerPath() const;
     void migrate();
@@ -86,6 +109,6 @@ private:
     std::string path_;
     platform::Dictionary annotations_; // annotation key to annotation dictionary
     platform::Dictionary handedOut_;   // the last snapshot: keeps it from being changed in place
-    std::size_t size_ = 0;             // of keys and encoded annotations
+    Extent extent_;                    // of all of them
     std::atomic<std::uint64_t> changes_ = 0;
 };

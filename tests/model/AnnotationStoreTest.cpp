@@ -124,15 +124,25 @@ TEST_F(StoreTest, RefusesWhatGrowsTooLarge) {
     EXPECT_TRUE(store.setAnnotation(Dictionary{{"b", text(half)}}, *plugIn));
     EXPECT_EQ(store.annotationForPlugIn(*plugIn)->size(), 1U);
 
+    const auto fillWith = [&](const Value& value) {
+        std::vector<ZPDPlugIn::Ptr> accepted;
+        for (int i = 0; i < 300; ++i) {
+            auto sample = samplePlugIn();
+            sample->identifier = "com.example." + std::to_string(i);
+            auto other = world.record(sample);
+            if (!store.setAnnotation(Dictionary{{"a", value}}, *other))
+                accepted.push_back(std::move(other));
+        }
+        return accepted;
+    };
+    const Value many = Array(std::vector<Value>(65'000, Value(1)));
+    const auto full = fillWith(many);
+    EXPECT_EQ(full.size(), 4U);
+    for (const auto& each : full)
+        store.setAnnotation(std::nullopt, *each);
+
     const std::string large = text(ZPDAnnotationStore::largestAnnotation - 100);
-    std::vector<ZPDPlugIn::Ptr> accepted;
-    for (int i = 0; i < 300; ++i) {
-        auto sample = samplePlugIn();
-        sample->identifier = "com.example." + std::to_string(i);
-        auto other = world.record(sample);
-        if (!store.setAnnotation(Dictionary{{"a", large}}, *other))
-            accepted.push_back(std::move(other));
-    }
+    const auto accepted = fillWith(large);
     EXPECT_EQ(accepted.size(), 255U);
     EXPECT_FALSE(store.setAnnotation(Dictionary{{"a", text(9)}}, *accepted.front()));
     EXPECT_FALSE(store.setAnnotation(Dictionary{{"a", large}}, *accepted.front()));
