@@ -18,10 +18,6 @@ constexpr std::uint32_t howToWatch = IN_ONLYDIR | IN_DONT_FOLLOW | IN_MASK_ADD |
 // Reads at a time, so that whoever keeps the folders busy does not keep the lock.
 constexpr int mostReads = 256;
 
-std::string_view nameIn(const inotify_event& event) {
-    return event.len > 0 ? std::string_view(event.name) : std::string_view();
-}
-
 } // namespace
 
 const std::uint32_t ARWatches::nameEvents =
@@ -75,29 +71,28 @@ void ARWatches::drain() {
             return;
         for (std::size_t at = 0; at < static_cast<std::size_t>(got);) {
             const auto& event = *reinterpret_cast<const inotify_event*>(&room.at(at));
-            take(event);
+            take({event.wd, event.mask, event.len > 0 ? event.name : ""});
             at += sizeof event + event.len;
         }
     }
 }
 
-void ARWatches::take(const inotify_event& event) {
-    if ((event.mask & IN_Q_OVERFLOW) != 0) {
+void ARWatches::take(const Event& event) {
+    if ((event.what & IN_Q_OVERFLOW) != 0) {
         ARLog().error("changes of the folders came too fast: looking at everything");
         dirt_.markEverything(false, ARDirt::Clock::now());
         return;
     }
-    const auto [begin, end] = interests_.equal_range(event.wd);
+    const auto [begin, end] = interests_.equal_range(event.number);
     for (auto at = begin; at != end; ++at)
         concern(at->second, event);
-    if ((event.mask & IN_IGNORED) != 0) // the folder is no more
+    if ((event.what & IN_IGNORED) != 0) // the folder is no more
         interests_.erase(begin, end);
 }
 
-// An event without a name concerns the folder itself.
-void ARWatches::concern(const Interest& interest, const inotify_event& event) {
-    const std::string_view name = nameIn(event);
-    const bool moved = (event.mask & (IN_MOVE | IN_MOVE_SELF)) != 0;
+void ARWatches::concern(const Interest& interest, const Event& event) {
+    const std::string_view name = event.name;
+    const bool moved = (event.what & (IN_MOVE | IN_MOVE_SELF)) != 0;
     switch (interest.what) {
     case What::root:
         if (ARIsNamed(name, ARSuffixOf(interest.kind)))

@@ -12,8 +12,6 @@
 #include "AppRegistry/ARDirt.h"
 #include "platform/file/File.h"
 
-struct inotify_event;
-
 // How much a pass watches: at start only the folders at the top, as there is a second pass when the
 // service is up.
 enum class ARDepth { roots, everything };
@@ -109,13 +107,20 @@ private:
         }
     };
 
+    // What the kernel tells; one without a name concerns the folder itself.
+    struct Event {
+        int number; // of the watch
+        std::uint32_t what;
+        std::string_view name;
+    };
+
     // Each REQUIRES: the lock is held.
     void add(const std::string& folder, std::uint32_t events, Interest interest);
     void cannotWatch(const std::string& folder, int number);
     void walk(Interest interest, const std::string& path, std::uint32_t lastEvents);
     void drain();
-    void take(const inotify_event& event);
-    void concern(const Interest& interest, const inotify_event& event);
+    void take(const Event& event);
+    void concern(const Interest& interest, const Event& event);
     void mark(const std::string& item, bool moved);
     [[nodiscard]] Scopes::value_type& scopeOf(const std::string& item);
     [[nodiscard]] bool hasInterest(int number, const Scopes::value_type& scope) const;
