@@ -23,7 +23,6 @@ namespace platform::ipc {
 
 namespace {
 
-constexpr int backlog = 1024;
 constexpr int acceptsPerTurn = 16;
 constexpr std::chrono::milliseconds pauseWithoutDescriptors{100};
 
@@ -80,8 +79,6 @@ struct Listener::Impl final : SocketWatch::Target, std::enable_shared_from_this<
 };
 
 void Listener::Impl::begin(UniqueFd listening) {
-    if (!listening)
-        return tell(ConnectionError::invalid);
     socket = std::make_unique<SocketWatch>(loop, std::move(listening));
     socket->waitReadable(shared_from_this());
 }
@@ -180,10 +177,6 @@ void Listener::resume() {
     if (!impl_->service || impl_->resumed.exchange(true))
         return;
     UniqueFd socket = impl_->service->takeSocket();
-    if (::listen(socket.get(), backlog) != 0) {
-        ipcLog().error("cannot listen at %{public}s: %{errno}d", impl_->path, errno);
-        socket.reset();
-    }
     impl_->loop.post(
         [impl = impl_, socket = std::move(socket)]() mutable { impl->begin(std::move(socket)); });
 }

@@ -32,8 +32,8 @@ class Listener {
 public:
     using Handler = std::move_only_function<void(ListenerEvent)>;
 
-    // Binds the path. Fails when another daemon serves it, when the path is too long for a socket,
-    // and when the system refuses.
+    // Binds the path: clients can connect, and wait to be accepted. Fails when another daemon
+    // serves it, when the path is too long for a socket, and when the system refuses.
     [[nodiscard]] static std::expected<std::unique_ptr<Listener>, Error>
     create(Loop& loop, const std::string& path, Handler handler, const Limits& limits = {});
     Listener(const Listener&) = delete;
@@ -42,7 +42,7 @@ public:
 
     // Replaces the handler. REQUIRES: before `resume`.
     void setEventHandler(Handler handler);
-    // Begins to accept: clients can connect from when it returns. Any thread.
+    // Begins to accept. Any thread.
     void resume();
     // Stops accepting and removes the socket before it returns; connections live on. The handler
     // gets the invalid event, as its last one. Any thread.

@@ -1,6 +1,7 @@
 #include "platform/ipc/ServiceSocket.h"
 
 #include <cerrno>
+#include <cstdio>
 #include <cstring>
 #include <fcntl.h>
 #include <optional>
@@ -21,6 +22,7 @@ namespace {
 constexpr unsigned folderMode = 0755;
 constexpr unsigned socketMode = 0666;
 constexpr unsigned lockMode = 0600;
+constexpr int backlog = 1024; // connections that wait to be accepted
 
 // How long a client waits for a daemon that has too many new connections to accept.
 constexpr timeval longestConnect{.tv_sec = 10, .tv_usec = 0};
@@ -79,20 +81,19 @@ std::optional<Error> removeStale(const std::string& path) {
     return std::nullopt;
 }
 
-} // namespace
+// Beside the path, and not longer than it.
+std::string hiddenPath(std::string path) {
+    path[path.rfind('/') + 1] = '.'; // npos + 1 is the first letter
+    return path;
+}
 
-std::expected<ServiceSocket, Error> ServiceSocket::bind(const std::string& path) {
+// A socket that clients can connect to at the path.
+std::expected<UniqueFd, Error> listeningAt(const std::string& path) {
     const auto address = addressOf(path);
     if (!address)
         return std::unexpected(address.error());
-    if (auto error = makeFolder(folderOf(path)))
-        return std::unexpected(std::move(*error));
-    auto lock = lockBeside(path);
-    if (!lock)
-        return std::unexpected(std::move(lock).error());
     if (auto error = removeStale(path))
         return std::unexpected(std::move(*error));
-
     UniqueFd socket = newSocket(SOCK_NONBLOCK);
     if (!socket)
         return std::unexpected(posixError(errno, "socket"));
@@ -104,7 +105,40 @@ std::expected<ServiceSocket, Error> ServiceSocket::bind(const std::string& path)
         return std::unexpected(posixError(errno, "bind " + path));
     if (::chmod(path.c_str(), socketMode) != 0)
         return std::unexpected(posixError(errno, "chmod " + path));
-    return ServiceSocket(path, std::move(*lock), std::move(socket));
+    if (::listen(socket.get(), backlog) != 0)
+        return std::unexpected(posixError(errno, "listen " + path));
+    return socket;
+}
+
+// Renames the socket to where clients look for it; one that a daemon left there goes. Anything else
+// stays.
+std::optional<Error> show(const std::string& hidden, const std::string& path) {
+    if (auto error = removeStale(path))
+        return error;
+    if (::renameat2(AT_FDCWD, hidden.c_str(), AT_FDCWD, path.c_str(), RENAME_NOREPLACE) == 0)
+        return std::nullopt;
+    const int number = errno;
+    ::unlink(hidden.c_str());
+    return posixError(number, "bind " + path);
+}
+
+} // namespace
+
+std::expected<ServiceSocket, Error> ServiceSocket::bind(const std::string& path) {
+    if (const auto address = addressOf(path); !address)
+        return std::unexpected(address.error());
+    if (auto error = makeFolder(folderOf(path)))
+        return std::unexpected(std::move(*error));
+    auto lock = lockBeside(path);
+    if (!lock)
+        return std::unexpected(std::move(lock).error());
+    const std::string hidden = hiddenPath(path);
+    auto socket = listeningAt(hidden);
+    if (!socket)
+        return std::unexpected(std::move(socket).error());
+    if (auto error = hidden == path ? std::nullopt : show(hidden, path))
+        return std::unexpected(std::move(*error));
+    return ServiceSocket(path, std::move(*lock), std::move(*socket));
 }
 
 ServiceSocket::~ServiceSocket() {

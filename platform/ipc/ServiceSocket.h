@@ -9,12 +9,13 @@
 
 namespace platform::ipc {
 
-// A socket bound to a service's path, and the lock that makes it ours. Owned by a listener, which
-// listens on it; letting it go removes the socket from the path. Any thread.
+// A listening socket at a service's path, and the lock that makes it ours. Owned by a listener,
+// which accepts on it; letting it go removes the socket from the path. Any thread.
 class ServiceSocket {
 public:
-    // Takes the lock beside the path (so that no other daemon serves it), replaces a socket that
-    // was left there, and binds a new one, 0666 in a folder 0755.
+    // Takes the lock beside the path (so that no other daemon serves it), and replaces a socket
+    // that was left there by a new one, 0666 in a folder 0755. Clients can connect as soon as it is
+    // there; they wait until somebody accepts.
     [[nodiscard]] static std::expected<ServiceSocket, Error> bind(const std::string& path);
     ServiceSocket(ServiceSocket&&) = default;
     ServiceSocket& operator=(ServiceSocket&&) = delete;
