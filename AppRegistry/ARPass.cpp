@@ -1,6 +1,7 @@
 #include "AppRegistry/ARPass.h"
 
 #include <algorithm>
+#include <fcntl.h>
 #include <sys/stat.h>
 
 #include "AppRegistry/ARGrants.h"
@@ -233,6 +234,15 @@ void ARPass::unreadable(const std::string& path, const std::string& reason) {
     refused(path, reason);
 }
 
+// What fails because this process may open no more files says nothing of the bundle.
+void ARPass::fault(const std::string& path, const std::string& reason) {
+    const platform::UniqueFd probe(::open("/", O_PATH | O_CLOEXEC));
+    if (probe)
+        return refused(path, reason);
+    watches_.lookAgainLater();
+    unreadable(path, reason);
+}
+
 bool ARPass::comesBack(const ARBundleRow& row) const {
     return asked_ && row.presence == ARPresence::withdrawn;
 }
@@ -266,7 +276,7 @@ bool ARPass::readAgain(const ARCandidate& candidate, const ARBundleRow* known) {
     }
     auto content = reader_.read(candidate, before);
     if (!content) {
-        refused(std::string(candidate.path), content.error());
+        fault(std::string(candidate.path), content.error());
         return false;
     }
     complaints_.forget(std::string(candidate.path));

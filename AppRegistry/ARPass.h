@@ -79,6 +79,7 @@ private:
     bool foundLink(const std::string& path) override;
     void refused(const std::string& path, const std::string& reason) override;
     void unreadable(const std::string& path, const std::string& reason) override;
+    void fault(const std::string& path, const std::string& reason);
 
     void lookAtAdded(const std::string& item);
     // One plug-in by its canonical path, with the application that it lies in. False when it does
