@@ -122,7 +122,8 @@ TEST_F(Follow, WhateverHappensToAnApplicationIsSeen) {
     makeApp("A", "1", "Aside");
     makeApp("A", "2", "Aside/newer");
     makeApp("Other", "5", "Instead");
-    makeApp("Later", "6", "System/Aside");
+    const std::string later = makeApp("Later", "6", "System/Aside");
+    const std::string laterTwo = later + "/PlugIns/two.appex";
     start();
     const std::string in = home / "Applications";
     const std::string aside = home / "Aside";
@@ -136,6 +137,13 @@ TEST_F(Follow, WhateverHappensToAnApplicationIsSeen) {
     };
 
     const Step steps[] = {
+        {"a link to one elsewhere", [&] { fs::create_directory_symlink(later, in + "/Link.app"); },
+         "Later.one 6, Later.two 6", "+Later.one +Later.two"},
+        {"where one is moved out", [&] { fs::rename(laterTwo, aside + "/two.appex"); },
+         "Later.one 6", "-Later.two"},
+        {"and in", [&] { fs::rename(aside + "/two.appex", laterTwo); }, "Later.one 6, Later.two 6",
+         "+Later.two"},
+        {"and the link goes", [&] { fs::remove(in + "/Link.app"); }, "", "-Later.one -Later.two"},
         {"copied", [&] { fs::copy(aside + "/A.app", in + "/A.app", fs::copy_options::recursive); },
          "A.one 1, A.two 1", "+A.one +A.two"},
         {"exchanged", [&] { swapFolders(aside + "/newer/A.app", in + "/A.app"); },
