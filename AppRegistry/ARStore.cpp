@@ -38,6 +38,11 @@ std::int64_t number(E e) {
     return static_cast<std::int64_t>(e);
 }
 
+int noteLogPages(void* logPages, sqlite3*, const char*, int pages) {
+    *static_cast<int*>(logPages) = pages;
+    return SQLITE_OK;
+}
+
 std::optional<platform::Error> errorOf(int code) {
     if (code == SQLITE_OK)
         return std::nullopt;
@@ -64,7 +69,9 @@ ARStore::Impl::Impl(ARSqlConnection writing, ARSqlConnection reading)
       selectDigests(writer, "SELECT digests FROM details WHERE id = ?1"),
       reader(std::move(reading)),
       selectInfo(reader, "SELECT info FROM details WHERE id = ?1"),
-      selectSignature(reader, selectSignatureSql) {}
+      selectSignature(reader, selectSignatureSql) {
+    sqlite3_wal_hook(writer.handle(), noteLogPages, &logPages);
+}
 
 int ARStore::Impl::prepared() const {
     for (const ARSqlStatement* statement :
@@ -170,6 +177,7 @@ std::optional<platform::Error> ARStore::commit(std::span<const ARStoreChanges> c
         code = impl_->write(changes);
     if (synced)
         static_cast<void>(impl_->writer.execute(ARUnsyncedCommits));
+    impl_->shortenLog();
     return errorOf(code);
 }
 
@@ -189,10 +197,16 @@ std::optional<ARDigests> ARStore::digests(std::int64_t id) {
 }
 
 void ARStore::checkpoint() {
-    sqlite3_wal_checkpoint_v2(impl_->writer.handle(), nullptr, SQLITE_CHECKPOINT_PASSIVE, nullptr,
-                              nullptr);
+    impl_->mayShorten = true;
+    impl_->logPages = longLog;
+    impl_->shortenLog();
     sqlite3_db_release_memory(impl_->writer.handle());
-    sqlite3_wal_autocheckpoint(impl_->writer.handle(), longLog);
+}
+
+void ARStore::Impl::shortenLog() {
+    if (mayShorten && !readersHeld && logPages >= longLog)
+        sqlite3_wal_checkpoint_v2(writer.handle(), nullptr, SQLITE_CHECKPOINT_PASSIVE, nullptr,
+                                  nullptr);
 }
 
 std::optional<std::string> ARStore::info(std::int64_t id) const {
@@ -226,10 +240,15 @@ std::optional<ARSignatureFacts> ARStore::signature(std::int64_t id) const {
 void ARStore::holdReaders() {
     const std::lock_guard lock(impl_->readerLock);
     static_cast<void>(impl_->reader.execute("BEGIN; SELECT sequence FROM knowledge"));
+    impl_->readersHeld = true;
 }
 
 void ARStore::releaseReaders(const std::function<void()>& show) {
-    const std::lock_guard lock(impl_->readerLock);
-    static_cast<void>(impl_->reader.execute("COMMIT"));
-    show();
+    {
+        const std::lock_guard lock(impl_->readerLock);
+        static_cast<void>(impl_->reader.execute("COMMIT"));
+        show();
+    }
+    impl_->readersHeld = false;
+    impl_->shortenLog();
 }

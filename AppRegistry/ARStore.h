@@ -78,8 +78,8 @@ public:
     [[nodiscard]] std::optional<platform::Error> markComplete();
     // What the files of an entry hashed to when they were read.
     [[nodiscard]] std::optional<ARDigests> digests(std::int64_t id);
-    // Brings what was committed from the log into the database file, as does from here on every
-    // commit that finds the log long.
+    // Brings what was committed from the log into the database file. From here on that is done
+    // whenever the log became long.
     void checkpoint();
 
     // The encoded info dictionary of an entry; nothing when it is gone or cannot be read.

@@ -30,6 +30,10 @@ struct ARStore::Impl {
     [[nodiscard]] int writeSignatures(const ARStoreChanges& changes);
     [[nodiscard]] int setTo(const ARKnowledge& known);
 
+    // Brings a log that became long into the database file, so that the next commit begins it
+    // anew. Not while readers are held: what came after them would stay in the log for ever.
+    void shortenLog();
+
     ARSqlConnection writer;
     ARSqlStatement begin;
     ARSqlStatement end;
@@ -44,6 +48,9 @@ struct ARStore::Impl {
     ARSqlStatement removeSignature;
     ARSqlStatement setKnowledge;
     ARSqlStatement selectDigests;
+    int logPages = 0;         // after the last commit
+    bool mayShorten = false;  // since the first checkpoint
+    bool readersHeld = false; // by the writer's thread
 
     std::mutex readerLock; // held for one look-up at a time, never by a writer
     ARSqlConnection reader;

@@ -1,4 +1,5 @@
 #include <csignal>
+#include <filesystem>
 #include <fstream>
 #include <sys/resource.h>
 
@@ -89,6 +90,16 @@ TEST_F(Registration, AddsABundleByPathForGood) {
     remove("Elsewhere");
     reopen();
     EXPECT_EQ(identifiers(), Strings{"in"});
+}
+
+// Of a registry that changes without pause for as long as the box runs.
+TEST_F(Registration, KeepsTheDatabaseSmallHoweverMuchChanges) {
+    registry->rescan(); // after the first checkpoint
+    for (int i = 0; i < 300; ++i) {
+        EXPECT_FALSE(registry->registerPlugin(home / outside));
+        EXPECT_FALSE(registry->unregisterPlugin(home / outside));
+    }
+    EXPECT_LT(std::filesystem::file_size(places.registryDatabase + "-wal"), 4U << 20);
 }
 
 TEST_F(Registration, RefusesWhatIsNoPlugIn) {
