@@ -8,10 +8,12 @@
 #include <string>
 #include <string_view>
 #include <sys/types.h>
+#include <unordered_map>
 #include <vector>
 
 #include "platform/ipc/Message.h"
 #include "platform/value/Error.h"
+#include "platform/value/Uuid.h"
 #include "platform/value/Value.h"
 
 namespace platform {
@@ -89,6 +91,10 @@ public:
     // Walks "uuids", with "paths" for what is not found. False when the transaction has failed;
     // what the block did before stands. REQUIRES: on the service queue
     [[nodiscard]] bool processUuidList(const PlugInBlock& block);
+    // Finds out first where those "paths" lead that the walk will ask for, on the queue
+    // "registration" with the transaction left open, and calls `then` back on the service queue;
+    // at once where none is needed. REQUIRES: on the service queue
+    void followListedPaths(std::function<void()> then);
 
     // Puts a converted result under "matches"; without one the key is left out.
     void setMatches(std::optional<platform::Value> matches);
@@ -153,8 +159,10 @@ private:
 
     // ---- zpd/requests/UuidList.cpp
     [[nodiscard]] std::optional<platform::Uuid> listedUuid(const platform::Value& entry);
-    [[nodiscard]] std::shared_ptr<ZPDPlugIn> listedPlugIn(const platform::Uuid& uuid,
-                                                          const platform::Value* path) const;
+    [[nodiscard]] std::shared_ptr<ZPDPlugIn>
+    listedPlugIn(const platform::Uuid& uuid, const platform::Value* path, std::size_t index) const;
+    void followListedPathsFrom(std::size_t first, std::function<void()> then);
+    [[nodiscard]] bool followListedPath(std::size_t index);
 
     // ---- zpd/requests/Annotation.cpp
     void annotatePlugIns();
@@ -163,7 +171,9 @@ private:
     [[nodiscard]] const platform::Dictionary* requestedAnnotations();
     [[nodiscard]] std::optional<platform::Dictionary>
     annotationChange(const platform::Dictionary& requested);
-    [[nodiscard]] bool annotate(const ZPDPlugIn& plugIn, const platform::Dictionary& change);
+    void annotateListed(const platform::Dictionary& change);
+    [[nodiscard]] bool annotate(const ZPDPlugIn& plugIn, const platform::Dictionary& change,
+                                bool isFirst);
     [[nodiscard]] bool mayAllBeStored(const platform::Dictionary& extensions);
     [[nodiscard]] bool bulkAnnotate(std::string_view uuidText, const platform::Value& extension);
     // False when the annotation would grow too large.
@@ -179,4 +189,6 @@ private:
     bool leftOpen_ = false;
     std::uint64_t changesBefore_ = 0; // of the annotations, when it was dispatched
     bool annotates_ = false;          // also when it stores what is stored already
+    // What listed paths lead to, by their place in the list.
+    std::unordered_map<std::size_t, platform::Uuid> foundByPath_;
 };

@@ -41,7 +41,8 @@ ZPDServer::~ZPDServer() {
     preparations_.close();
     mainQueue_.sync([] {});
     registrationQueue_.sync([] {});
-    closeAnnotations(); // the last requests are answered while the loop is still there
+    mainQueue_.sync([] {}); // what came back from there
+    closeAnnotations();     // the last requests are answered while the loop is still there
     setDelegate(nullptr);
     theServer = nullptr;
 }

@@ -28,8 +28,8 @@ class ZPDIpcClient;
 //   "ipc"         the loop (a thread of its own) of the listener and all connections; it makes
 //                 clients and transactions and never waits
 //   "service"     every request of every client, one at a time, in the order of arrival
-//   "registration"  what "add" and "remove" take long for; of the rank of "service", and neither
-//                 waits for the other
+//   "registration"  what "add" and "remove" take long for, and where listed paths lead; of the rank
+//                 of "service", and neither waits for the other
 //   "serverSync"  a leaf: every access to the holds, always entered synchronously
 //
 // Made and destroyed on the main thread. The platform's services outlive it; it outlives its
@@ -85,7 +85,7 @@ public:
 
     void assertOnServiceQueue() const { mainQueue_.assertOnQueue(); }
 
-    // Where "add" and "remove" go on after they left the service queue. Any thread.
+    // Where requests that go through paths go on after they left the service queue. Any thread.
     [[nodiscard]] platform::SerialQueue& registrationQueue() { return registrationQueue_; }
 
     // ---- Holds (ZPDServerHolds.cpp). Any thread.

@@ -2,6 +2,8 @@
 // the annotation that each form of a reply carries.
 
 #include <cmath>
+#include <string>
+#include <unordered_set>
 
 #include "Zephrin/ZPDError.h"
 #include "Zephrin/ZPDLog.h"
@@ -54,7 +56,18 @@ void Transaction::annotatePlugIns() {
         return;
     if (change->empty())
         return done();
-    if (!processUuidList([&](const ZPDPlugIn::Ptr& plugIn) { return annotate(*plugIn, *change); }))
+    followListedPaths([this, change = *change] { annotateListed(change); });
+}
+
+// One annotation is compared with the change, which may take long, only once however often its
+// plug-ins are listed.
+void Transaction::annotateListed(const Dictionary& change) {
+    std::unordered_set<std::string> changed; // annotation keys
+    const auto block = [&](const ZPDPlugIn::Ptr& plugIn) {
+        const bool isFirst = changed.emplace(plugIn->annotationKey()).second;
+        return annotate(*plugIn, change, isFirst);
+    };
+    if (!processUuidList(block))
         return;
     server().notifyAnnotationChange();
     done();
@@ -80,14 +93,14 @@ std::optional<Dictionary> Transaction::annotationChange(const Dictionary& reques
     return change;
 }
 
-bool Transaction::annotate(const ZPDPlugIn& plugIn, const Dictionary& change) {
+bool Transaction::annotate(const ZPDPlugIn& plugIn, const Dictionary& change, bool isFirst) {
     ZPDLogOps().debug("client %d plug-in %{public}@(%{public}@) annotation change: %@",
                       client().pid(), plugIn.identifier(), plugIn.uuid(), change);
     if (const Value* const election = change.find(AnnotationKey::election)) {
         ZPDLogOps().info("client %d plug-in %{public}@(%{public}@) election := %@", client().pid(),
                          plugIn.identifier(), plugIn.uuid(), *election);
     }
-    if (store(plugIn, change))
+    if (!isFirst || store(plugIn, change))
         return true;
     fail(ZPDErrorCode::invalidRequest, badExtension);
     return false;

@@ -1,8 +1,15 @@
 // The list of plug-ins that requests name by their UUIDs. Paths beside it find those that were
 // registered anew, and so have another UUID, since the client looked.
 
+#include <algorithm>
+#include <chrono>
+#include <utility>
+
+#include "AppRegistry/ARApplicationWorkspace.h"
 #include "Zephrin/ZPDError.h"
 #include "Zephrin/ZPDLog.h"
+#include "platform/file/File.h"
+#include "platform/queue/SerialQueue.h"
 #include "zpd/Transaction.h"
 #include "zpd/ZPDPlugIn.h"
 #include "zpd/ZPDServer.h"
@@ -12,6 +19,24 @@ using platform::Dictionary;
 using platform::Value;
 
 namespace {
+
+constexpr std::chrono::milliseconds longestTurn{20};
+
+const Array* arrayIn(const Dictionary& request, std::string_view key) {
+    const Value* const value = request.find(key);
+    return value ? value->array() : nullptr;
+}
+
+struct Lists {
+    explicit Lists(const Dictionary& request)
+        : uuids(arrayIn(request, "uuids")), paths(arrayIn(request, "paths")) {}
+
+    // Whether there are paths for the UUIDs.
+    [[nodiscard]] bool usable() const { return uuids && paths && uuids->size() == paths->size(); }
+
+    const Array* uuids;
+    const Array* paths;
+};
 
 // Nothing when there are none, or none that can be used.
 const Array* pathsBeside(const Array& uuids, const Dictionary& request) {
@@ -34,8 +59,7 @@ const Array* pathsBeside(const Array& uuids, const Dictionary& request) {
 
 bool Transaction::processUuidList(const PlugInBlock& block) {
     server().assertOnServiceQueue();
-    const Value* const value = request().find("uuids");
-    const Array* const uuids = value ? value->array() : nullptr;
+    const Array* const uuids = arrayIn(request(), "uuids");
     if (!uuids) {
         fail(ZPDErrorCode::invalidRequest, "invalid request format (uuid)");
         return false;
@@ -45,7 +69,7 @@ bool Transaction::processUuidList(const PlugInBlock& block) {
         const auto uuid = listedUuid((*uuids)[i]);
         if (!uuid)
             return false;
-        const ZPDPlugIn::Ptr plugIn = listedPlugIn(*uuid, paths ? &(*paths)[i] : nullptr);
+        const ZPDPlugIn::Ptr plugIn = listedPlugIn(*uuid, paths ? &(*paths)[i] : nullptr, i);
         if (!plugIn) {
             fail(ZPDErrorCode::invalidRequest, "no such plugin (uuid not found)");
             return false;
@@ -68,7 +92,8 @@ std::optional<platform::Uuid> Transaction::listedUuid(const Value& entry) {
     return uuid;
 }
 
-ZPDPlugIn::Ptr Transaction::listedPlugIn(const platform::Uuid& uuid, const Value* path) const {
+ZPDPlugIn::Ptr Transaction::listedPlugIn(const platform::Uuid& uuid, const Value* path,
+                                         std::size_t index) const {
     if (auto plugIn = server().findPlugIn(uuid))
         return plugIn;
     if (!path)
@@ -78,5 +103,61 @@ ZPDPlugIn::Ptr Transaction::listedPlugIn(const platform::Uuid& uuid, const Value
     if (!text)
         return nullptr;
     ZPDLogTraffic().info("Looking for plugin %{uuid_t}.16P by path %s", uuid, *text);
-    return findPlugInByPath(std::string(*text));
+    const auto found = foundByPath_.find(index);
+    ZPDPlugIn::Ptr plugIn =
+        found == foundByPath_.end() ? nullptr : server().findPlugIn(found->second);
+    return plugIn ? plugIn : server().findPlugInAtPath(*text);
+}
+
+// ---- Where the paths lead
+
+// A path may lead through any number of links, and a list holds very many.
+void Transaction::followListedPaths(std::function<void()> then) {
+    server().assertOnServiceQueue();
+    const Lists lists(request());
+    ARApplicationWorkspace& workspace = server().services().workspace;
+    const auto isKnown = [&](const Value& entry) {
+        const auto uuid = entry.uuid();
+        return uuid && workspace.zephrinProxyForUUID(*uuid);
+    };
+    if (!lists.usable() || std::ranges::all_of(*lists.uuids, isKnown))
+        return then();
+    leaveOpen();
+    server().registrationQueue().async(
+        [self = shared_from_this(), then = std::move(then)]() mutable {
+            self->followListedPathsFrom(0, std::move(then));
+        });
+}
+
+void Transaction::followListedPathsFrom(std::size_t first, std::function<void()> then) {
+    const auto end = std::chrono::steady_clock::now() + longestTurn;
+    const std::size_t count = Lists(request()).uuids->size();
+    for (std::size_t next = first; next < count; ++next) {
+        if (next > first && std::chrono::steady_clock::now() >= end) {
+            return server().registrationQueue().async(
+                [self = shared_from_this(), next, then = std::move(then)]() mutable {
+                    self->followListedPathsFrom(next, std::move(then));
+                });
+        }
+        if (!followListedPath(next))
+            break;
+    }
+    server().submitWork([self = shared_from_this(), then = std::move(then)] { then(); });
+}
+
+// False where the walk will end.
+bool Transaction::followListedPath(std::size_t index) {
+    const Lists lists(request());
+    ARApplicationWorkspace& workspace = server().services().workspace;
+    const auto uuid = (*lists.uuids)[index].uuid();
+    const auto path = (*lists.paths)[index].string();
+    if (uuid && workspace.zephrinProxyForUUID(*uuid))
+        return true;
+    if (!uuid || !path)
+        return false;
+    const auto proxy =
+        workspace.zephrinProxyForPath(platform::canonicalPath(*path).value_or(std::string(*path)));
+    if (proxy)
+        foundByPath_.emplace(index, proxy->plugInUUID());
+    return proxy != nullptr;
 }
