@@ -8,6 +8,12 @@
 #include "platform/bundle/ExtensionPoints.h"
 #include "platform/file/File.h"
 
+namespace {
+
+constexpr const char* leadsToNoBundle = "it leads to what is not named like a bundle";
+
+} // namespace
+
 std::string_view ARSuffixOf(ARKind kind) {
     switch (kind) {
     case ARKind::application:
@@ -112,6 +118,8 @@ void ARScanner::followLink(ARKind kind, const ARFolder& folder, const std::strin
     const auto path = platform::canonicalPath(link);
     if (!path)
         return complain(link, path.error());
+    if (!ARIsNamed(ARNameOf(*path), ARSuffixOf(kind)))
+        return sink_.refused(link, leadsToNoBundle);
     for (int attempt = 0; attempt < mostAttempts; ++attempt) {
         sink_.beginItem(*path);
         watches_.leadsAway(*path);
@@ -127,7 +135,7 @@ void ARScanner::scanBundle(ARKind kind, const std::string& path, const std::stri
         return complain(path, canonical.error());
     const std::string_view name = ARNameOf(*canonical);
     if (!ARIsNamed(name, ARSuffixOf(kind)))
-        return sink_.refused(path, "it leads to what is not named like a bundle");
+        return sink_.refused(path, leadsToNoBundle);
     const auto folder = ARFolder::open(std::string(ARFolderOf(*canonical)), ownership_);
     if (!folder)
         return complain(*canonical, folder.error());

@@ -186,8 +186,11 @@ TEST_F(FirstPass, RegistersOnceWhatIsReachedTwice) {
     EXPECT_EQ(log, "");
     std::filesystem::create_symlink(home / "nowhere", home / "Applications/Dangling.app");
     std::filesystem::create_symlink("Loop.app", home / "Applications/Loop.app");
+    std::filesystem::create_directory_symlink(home / one, home / "Applications/0.app"); // no app
+    const Uuid uuid = uuidOf(one);
     open();
     EXPECT_EQ(identifiers().size(), 3U);
+    EXPECT_EQ(uuidOf(one), uuid);
 }
 
 TEST_F(FirstPass, KnowsExtensionPointsAndTypeDeclarations) {
