@@ -53,6 +53,7 @@ void ARPass::run(const platform::Places& places, ARDepth depth, const ARKeptPath
     for (const std::string& path : kept.added)
         if (!bring(path))
             removeIdleApplication(ARApplicationPathOf(path));
+    meetTorn();
     removeUnseen();
     flush();
     complaints_.endPass(number_);
@@ -156,6 +157,9 @@ bool ARPass::endItem() {
     const bool matters = mark() != began_ || !refusals_.empty();
     const bool torn = !abandoned_ && matters && isTorn();
     const std::string item = std::exchange(item_, {});
+    torn_.erase(item);
+    if (torn)
+        rememberTorn(item);
     if (torn || abandoned_) {
         takeBack(beforeItem_, began_);
         watches_.discardLook(item);
@@ -181,6 +185,26 @@ bool ARPass::isTorn() {
         return true;
     struct ::stat status = {};
     return folder_ && (::lstat(item_.c_str(), &status) != 0 || status.st_ino != *folder_);
+}
+
+void ARPass::rememberTorn(const std::string& item) {
+    std::vector<ARRowPtr>& rows = torn_[item];
+    for (std::size_t i = beforeItem_; i < before_.size(); ++i) {
+        if (!before_[i].isNew)
+            rows.push_back(before_[i].row);
+    }
+}
+
+// What was there before and after is not gone: it stays as it was known until the look that its
+// events bring.
+void ARPass::meetTorn() {
+    for (const auto& [item, rows] : torn_) {
+        for (const ARRowPtr& row : rows) {
+            ARModel::Entry* const entry = model_.find(row->path.view());
+            if (entry && entry->row == row)
+                entry->seen = number_;
+        }
+    }
 }
 
 bool ARPass::found(const ARCandidate& candidate) {

@@ -3,6 +3,7 @@
 #include <array>
 #include <chrono>
 #include <functional>
+#include <map>
 #include <optional>
 #include <set>
 #include <string>
@@ -125,6 +126,8 @@ private:
     [[nodiscard]] Mark mark() const;
     void takeBack(std::size_t before, const Mark& mark);
     [[nodiscard]] bool isTorn();
+    void rememberTorn(const std::string& item);
+    void meetTorn();
 
     ARStore& store_;
     ARModel& model_;
@@ -145,6 +148,8 @@ private:
     std::vector<Before> before_;
     std::chrono::steady_clock::time_point batchBegan_;
     std::vector<std::string> unreadable_;
+    // By item what was known of those that were exchanged again and again while they were read.
+    std::map<std::string, std::vector<ARRowPtr>> torn_;
     std::string lastRefusal_;
 
     // Of the item that is looked at now.
