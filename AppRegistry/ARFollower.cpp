@@ -109,6 +109,7 @@ ARFollower::ARFollower(platform::ipc::Loop& loop, ARRegistry& registry)
     : state_(std::make_shared<State>(loop, registry)) {}
 
 ARFollower::~ARFollower() {
+    state_->registry.onEventsTaken({});
     state_->over = true;
     state_->events.reset();
     state_->soon->cancel();
@@ -117,6 +118,10 @@ ARFollower::~ARFollower() {
 
 void ARFollower::start() {
     State* const state = state_.get();
+    state->registry.onEventsTaken([followed = std::weak_ptr(state_)] {
+        if (const auto self = followed.lock())
+            self->loop.post([self] { self->wait(); });
+    });
     state->waitForEvents();
     state->watches.markEverything();
     state->lastWork = afterStart;

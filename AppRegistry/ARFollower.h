@@ -9,7 +9,7 @@ class ARRegistry;
 
 // When the registry looks at its folders again: shortly after the kernel told of changes, and from
 // time to time where it cannot tell. Owned by the daemon; used on the loop alone. The loop must
-// outlive it; the registry must too, or be gone for good with the process.
+// outlive it, and so must the registry.
 class ARFollower {
 public:
     ARFollower(platform::ipc::Loop& loop, ARRegistry& registry);

@@ -195,9 +195,23 @@ std::optional<platform::Error> ARRegistry::carryOut(const std::string& path, Act
             lookAt({std::string(ARItemOf(path))});
         return refused;
     });
+    wakeFollower();
     if (!refusal)
         return std::nullopt;
     return platform::Error{&ARErrorDomain, registrationRefused, path + ": " + *refusal};
+}
+
+void ARRegistry::onEventsTaken(std::function<void()> wake) {
+    const std::lock_guard lock(wakeLock_);
+    wake_ = std::move(wake);
+}
+
+void ARRegistry::wakeFollower() {
+    if (!watches_.isDirty())
+        return;
+    const std::lock_guard lock(wakeLock_);
+    if (wake_)
+        wake_();
 }
 
 std::optional<platform::Error> ARRegistry::registerPlugin(std::string_view path) {

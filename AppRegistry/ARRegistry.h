@@ -4,6 +4,7 @@
 #include <expected>
 #include <functional>
 #include <memory>
+#include <mutex>
 #include <string>
 
 #include "AppRegistry/ARApplicationWorkspace.h"
@@ -65,6 +66,10 @@ public:
     // Tells what has to be compared again while the folders change.
     [[nodiscard]] ARWatches& watches() { return watches_; }
 
+    // `wake` is called, on any thread, when a registration by path has taken up events of which
+    // whoever waits for the watches' descriptor may hear nothing. Empty for nobody.
+    void onEventsTaken(std::function<void()> wake);
+
     // Compares that, and calls `done` afterwards; waits for neither. `done` comes on the queue's
     // thread, when the queue was let go.
     void follow(std::function<void()> done);
@@ -90,6 +95,7 @@ private:
     // Registers or unregisters: what was asked for is stored before anybody sees it.
     template <class Act>
     [[nodiscard]] std::optional<platform::Error> carryOut(const std::string& path, Act&& act);
+    void wakeFollower();
     void publish(std::shared_ptr<ARSnapshot> snapshot);
     void declareTypes();
 
@@ -100,6 +106,8 @@ private:
     platform::Types& types_;
     std::atomic<ARWorkspaceObserver*> observer_ = nullptr;
     std::atomic<std::uint64_t> publishedSequence_ = 0; // of the snapshot that is published
+    std::mutex wakeLock_;
+    std::function<void()> wake_; // with the lock
 
     // On the queue.
     ARCommitter committer_;
