@@ -81,9 +81,11 @@ std::optional<Error> removeStale(const std::string& path) {
     return std::nullopt;
 }
 
-// Beside the path, and not longer than it.
+// Beside the path, and not longer than it: what has no hidden name is bound at once.
 std::string hiddenPath(std::string path) {
-    path[path.rfind('/') + 1] = '.'; // npos + 1 is the first letter
+    const std::size_t name = path.rfind('/') + 1; // npos + 1 is the first letter
+    if (path.size() > name + 2)
+        path[name] = '.';
     return path;
 }
 

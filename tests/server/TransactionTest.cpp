@@ -97,6 +97,7 @@ TEST_F(Transactions, ProcessTheirPathsInTurns) {
     begun.bring(true);
     while (whole.use_count() > 1 || refused.use_count() > 1)
         std::this_thread::sleep_for(each);
+    queue.sync([] {}); // what its thread wrote can be read now
     EXPECT_EQ(std::ranges::count(done, 'a'), paths);
     EXPECT_NE(done.find("abba"), std::string::npos) << done;
     EXPECT_EQ(failureIn(*whole), "");
