@@ -16,10 +16,10 @@ ZPDAnnotationSaver::~ZPDAnnotationSaver() {
 }
 
 void ZPDAnnotationSaver::whenSaved(std::uint64_t change, Block block) {
-    queue_.async([this, change, block = std::move(block)]() mutable {
+    queue_.async([this, change, triesBefore = tries_.load(), block = std::move(block)]() mutable {
         if (closed_)
             return;
-        if (!isSettled(change))
+        if (!isSettled(change) || triesBefore == tries_)
             save();
         block();
     });
@@ -27,24 +27,22 @@ void ZPDAnnotationSaver::whenSaved(std::uint64_t change, Block block) {
 
 void ZPDAnnotationSaver::close() {
     queue_.sync([this] {
-        if (std::exchange(closed_, true))
-            return;
-        if (failed_)
-            settled_ = 0; // the last chance
-        save();
+        if (!std::exchange(closed_, true))
+            save();
     });
 }
 
 void ZPDAnnotationSaver::save() {
     queue_.assertOnQueue();
     const ZPDAnnotationStore::Snapshot newest = source_();
-    if (isSettled(newest.change))
+    if (isSaved(newest.change))
         return;
     const auto failure = ZPDAnnotationStore::saveDb(path_, newest.annotations);
-    failed_ = failure.has_value();
     if (failure) {
         ZPDLogOps().error("unable to save annotations:%{public}@ error:%{public}@",
                           fileURLFromPath(path_), *failure);
     }
+    failed_ = failure.has_value();
     settled_.store(newest.change, std::memory_order_release);
+    ++tries_;
 }

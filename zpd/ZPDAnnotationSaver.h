@@ -13,7 +13,7 @@
 //
 // It asks for what to write only when it begins to write, so that any number of changes that came
 // meanwhile are one save, and what did not change is not saved at all. A save that failed is tried
-// again with the next change.
+// again with the next change, and for whoever asks for what is in memory already.
 //
 // Owned by the database, on whose queue the source is asked and which outlives it.
 class ZPDAnnotationSaver {
@@ -33,9 +33,14 @@ public:
         return settled_.load(std::memory_order_acquire) >= change;
     }
 
+    // True when everything up to this change is on disk. Any thread.
+    [[nodiscard]] bool isSaved(std::uint64_t change) const noexcept {
+        return isSettled(change) && !failed_.load(std::memory_order_acquire);
+    }
+
     // Runs `block` on the queue "annotations" once everything up to this change is settled, and
-    // saves what is not. Blocks run in the order in which they came; after `close` none. Any
-    // thread.
+    // saves what is not, or tries to again when no try has ended since it was called. Blocks run
+    // in the order in which they came; after `close` none. Any thread.
     void whenSaved(std::uint64_t change, Block block);
 
     // Waits for the save under way, saves what is left, and saves nothing more.
@@ -49,7 +54,8 @@ private:
     const std::string path_;
     const Source source_;
     std::atomic<std::uint64_t> settled_;
-    bool failed_ = false;         // the last save; only on the queue
-    bool closed_ = false;         // likewise
-    platform::SerialQueue queue_; // last: its blocks use all of the above
+    std::atomic<std::uint64_t> tries_ = 0;
+    std::atomic<bool> failed_ = false; // the last of them
+    bool closed_ = false;              // only on the queue
+    platform::SerialQueue queue_;      // last: its blocks use all of the above
 };

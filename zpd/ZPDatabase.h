@@ -98,12 +98,13 @@ public:
     // A number that grows with each change of an annotation. Any thread.
     [[nodiscard]] std::uint64_t annotationChanges() const { return annotations_.changes(); }
 
-    // Whether all changes up to this one are on disk, or saving them has failed. Any thread.
+    // Whether all changes up to this one are on disk. Any thread.
     [[nodiscard]] bool areAnnotationsSaved(std::uint64_t change) const {
-        return saver_.isSettled(change);
+        return saver_.isSaved(change);
     }
 
-    // Runs the block when that is so, on the queue "annotations", and sees to it. Any thread.
+    // Sees to that, and then, or when it has failed, runs the block on the queue "annotations".
+    // Any thread.
     void whenAnnotationsSaved(std::uint64_t change, platform::SerialQueue::Block block) {
         saver_.whenSaved(change, std::move(block));
     }
