@@ -218,7 +218,11 @@ std::optional<platform::Error> ARRegistry::registerPlugin(std::string_view path)
     const auto canonical = platform::canonicalPath(path);
     if (!canonical)
         return platform::posixError(canonical.error(), std::string(path));
-    return carryOut(*canonical, [&](ARPass& pass) { return pass.add(*canonical, places_); });
+    auto refusal =
+        carryOut(*canonical, [&](ARPass& pass) { return pass.add(*canonical, places_); });
+    if (refusal) // who asked is only told that it was refused
+        ARLog().standard("not registered: %{public}@", *refusal);
+    return refusal;
 }
 
 std::optional<platform::Error> ARRegistry::unregisterPlugin(std::string_view path) {

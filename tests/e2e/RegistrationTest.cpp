@@ -136,6 +136,7 @@ TEST_F(Registration, RefusesWhatTheTablesSay) {
     for (const std::string& line : {refused + in + " - client lacks required entitlement",
                                     refused + "/none\\n - client lacks required entitlement",
                                     "ops default: failed to register plug-in at " + elsewhere,
+                                    (home / "Elsewhere/Empty.appex") + ": it has no Info.plist",
                                     std::string("ops info: bulk options 0x0 not supported"),
                                     std::string("ops info: bulk options 0x5 not supported")})
         EXPECT_EQ(daemon->linesWith(line), 1u) << line;
