@@ -106,6 +106,10 @@ bool Daemon::Parts::openRegistry() {
 }
 
 bool Daemon::Parts::makeServer(const ZPDOptions& options) {
+    if (options.serviceName.empty() || options.serviceName.find('/') != std::string::npos) {
+        ZPDLogOps().error("cannot serve %{public}@: no name for a socket", options.serviceName);
+        return false;
+    }
     const Platform platform{.processes = processes,
                             .signing = signing,
                             .sandbox = sandbox,

@@ -127,6 +127,7 @@ TEST(Start, ASocketPathThatIsTooLongIsAClearError) {
     const Daemon daemon(home.path(), {.service = std::string(rest, 's')});
     WireClient client = daemon.connect();
     EXPECT_EQ(matched(client, Item::map({})), "");
+    EXPECT_EQ(runZpd(home, {"-S", "a/b"}).exitStatus(), 1) << "outside the folder of sockets";
 }
 
 TEST(Start, AStoreThatCannotBeWrittenIsSaidOnce) {
