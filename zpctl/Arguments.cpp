@@ -9,6 +9,10 @@ std::string complaintAboutUuid(const std::string& text) {
     return platform::Uuid::parse(text) ? std::string() : "not a UUID: " + text;
 }
 
+std::string complaintAboutEmpty(const std::string& text) {
+    return text.empty() ? "must not be empty" : std::string();
+}
+
 std::string absolutePath(const std::string& path) {
     if (auto canonical = platform::canonicalPath(path))
         return *canonical;

@@ -44,11 +44,12 @@ std::optional<std::string> empty(int folder) {
 std::optional<std::string> removeTree(int folder, const std::string& name) {
     if (::unlinkat(folder, name.c_str(), 0) == 0 || errno == ENOENT)
         return std::nullopt;
-    if (errno != EISDIR && errno != EPERM)
-        return reason(name, errno);
+    const int refusal = errno;
+    if (refusal != EISDIR && refusal != EPERM)
+        return reason(name, refusal);
     const platform::UniqueFd opened = openToEmpty(folder, name);
     if (!opened)
-        return reason(name, errno);
+        return reason(name, errno == ENOTDIR ? refusal : errno);
     if (auto failure = empty(opened.get()))
         return name + "/" + *failure;
     if (::unlinkat(folder, name.c_str(), AT_REMOVEDIR) != 0)

@@ -96,7 +96,9 @@ TEST_F(CommandLine, RefusesWrongUsage) {
         {"elect", uuid, "maybe"},
         {"annotate", uuid, "/does/not/exist"},
         {"add"},
+        {"add", ""},
         {"remove"},
+        {"uninstall", ""},
         {"monitor", "--count", "0"},
     };
     for (const auto& arguments : cases) {

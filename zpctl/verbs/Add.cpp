@@ -23,7 +23,8 @@ constexpr const char* explanation =
     R"(For plug-ins outside the folders that the daemon watches, and for those that "remove" took away.
 Each PATH is the folder of a plug-in (NAME.appex); a relative one is made absolute. The daemon takes
 them up in this order and ends with the first that it refuses; those before it stay registered. A
-plug-in that is registered already stays as it is. What was added outlives the daemon.
+plug-in that is registered already stays as it is. What was added outlives the daemon. Hosts find
+such a plug-in in an application (NAME.app/PlugIns), or below /System.
 
 Examples:
   zpctl add /opt/themes/Dusk.app/PlugIns/Dusk.appex
@@ -45,7 +46,10 @@ Status add(const std::vector<std::string>& given, Session& session) {
 
 Action declareAdd(CLI::App& command) {
     const auto paths = std::make_shared<std::vector<std::string>>();
-    command.add_option("paths", *paths, "The plug-ins' folders")->type_name("PATH")->required();
+    command.add_option("paths", *paths, "The plug-ins' folders")
+        ->type_name("PATH")
+        ->required()
+        ->check(complaintAboutEmpty);
     command.footer(explanation);
     return [paths](Session& session) { return add(*paths, session); };
 }

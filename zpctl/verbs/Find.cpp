@@ -72,7 +72,8 @@ Action declareFind(CLI::App& command) {
     const auto target = std::make_shared<std::string>();
     command.add_option("plug-in", *target, "The plug-in's registration UUID, or its bundle's path")
         ->type_name("UUID-or-PATH")
-        ->required();
+        ->required()
+        ->check(complaintAboutEmpty);
     command.footer(explanation);
     return [target](Session& session) { return find(*target, session); };
 }

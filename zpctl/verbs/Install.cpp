@@ -12,6 +12,7 @@
 
 #include "platform/paths/Places.h"
 #include "zpctl/ApplicationFolder.h"
+#include "zpctl/Arguments.h"
 #include "zpctl/Printable.h"
 #include "zpctl/Session.h"
 #include "zpctl/verbs/Verbs.h"
@@ -115,7 +116,8 @@ Action declareInstall(CLI::App& command) {
     const auto source = std::make_shared<std::string>();
     command.add_option("application", *source, "The application's folder")
         ->type_name("APP-DIRECTORY")
-        ->required();
+        ->required()
+        ->check(complaintAboutEmpty);
     command.footer(explanation);
     return [source](Session& session) { return install(*source, session); };
 }

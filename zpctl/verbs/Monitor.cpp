@@ -151,7 +151,10 @@ Action declareMonitor(CLI::App& command) {
     const auto count = std::make_shared<std::optional<std::uint64_t>>();
     command.add_option("--count", *count, "End after N notifications")
         ->type_name("N")
-        ->check(CLI::PositiveNumber.description(""));
+        ->check([](const std::string& text) {
+            const bool none = text.find_first_not_of('0') == std::string::npos;
+            return none || text.starts_with('-') ? "not above 0: " + text : std::string();
+        });
     command.footer(explanation);
     return [count](Session& session) { return monitor(*count, session); };
 }

@@ -45,7 +45,10 @@ Status remove(const std::vector<std::string>& given, Session& session) {
 
 Action declareRemove(CLI::App& command) {
     const auto paths = std::make_shared<std::vector<std::string>>();
-    command.add_option("paths", *paths, "The plug-ins' folders")->type_name("PATH")->required();
+    command.add_option("paths", *paths, "The plug-ins' folders")
+        ->type_name("PATH")
+        ->required()
+        ->check(complaintAboutEmpty);
     command.footer(explanation);
     return [paths](Session& session) { return remove(*paths, session); };
 }

@@ -11,6 +11,7 @@
 
 #include "platform/paths/Places.h"
 #include "zpctl/ApplicationFolder.h"
+#include "zpctl/Arguments.h"
 #include "zpctl/Printable.h"
 #include "zpctl/Session.h"
 #include "zpctl/verbs/Verbs.h"
@@ -64,7 +65,8 @@ Action declareUninstall(CLI::App& command) {
     const auto identifier = std::make_shared<std::string>();
     command.add_option("identifier", *identifier, "The application's identifier")
         ->type_name("IDENTIFIER")
-        ->required();
+        ->required()
+        ->check(complaintAboutEmpty);
     command.footer(explanation);
     return [identifier](Session& session) { return uninstall(*identifier, session); };
 }
