@@ -1,5 +1,6 @@
 #pragma once
 
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <functional>
@@ -116,6 +117,9 @@ public:
 private:
     struct RequestType;
     static const RequestType requestTypes[];
+
+    // After so long a list lets others have the queue on which its paths are walked.
+    static constexpr std::chrono::milliseconds longestTurn{20};
 
     [[nodiscard]] static bool supportsVersion(std::uint64_t version);
     [[nodiscard]] std::optional<std::string_view> stringFor(std::string_view key) const;

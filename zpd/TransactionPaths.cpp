@@ -12,12 +12,6 @@
 
 using platform::Value;
 
-namespace {
-
-constexpr std::chrono::milliseconds longestTurn{20};
-
-} // namespace
-
 const platform::Array* Transaction::requestedPaths() {
     const Value* const value = request().find("paths");
     const platform::Array* const paths = value ? value->array() : nullptr;

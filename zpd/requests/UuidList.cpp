@@ -20,8 +20,6 @@ using platform::Value;
 
 namespace {
 
-constexpr std::chrono::milliseconds longestTurn{20};
-
 const Array* arrayIn(const Dictionary& request, std::string_view key) {
     const Value* const value = request.find(key);
     return value ? value->array() : nullptr;
