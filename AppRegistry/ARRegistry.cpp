@@ -198,7 +198,6 @@ std::optional<platform::Error> ARRegistry::carryOut(const std::string& path, Act
     wakeFollower();
     if (!refusal)
         return std::nullopt;
-    ARLog().info("a client's request for %@ is refused: %@", path, *refusal);
     return platform::Error{&ARErrorDomain, registrationRefused, path + ": " + *refusal};
 }
 
