@@ -26,7 +26,8 @@ Program runZpd(const Home& home, std::vector<std::string> arguments) {
 
 TEST(Start, WrongOptionsPrintTheUsageAndNothingElse) {
     const Home home;
-    const std::vector<std::vector<std::string>> cases = {{"extra"}, {"-x"}, {"-S"}, {"-v", "x"}};
+    const std::vector<std::vector<std::string>> cases = {
+        {"extra"}, {"-x"}, {"-S"}, {"-c"}, {"--help"}, {"-vx"}, {"--", "extra"}, {"-v", "x"}};
     for (const std::vector<std::string>& arguments : cases) {
         SCOPED_TRACE(arguments[0]);
         Program program = runZpd(home, arguments);

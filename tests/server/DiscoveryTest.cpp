@@ -37,12 +37,6 @@ TEST_F(Discovery, OfNothingIsAnEmptyList) {
     EXPECT_TRUE(match().empty()) << "also when the registry fails";
 }
 
-TEST_F(Discovery, FollowsTheRegistrysOrder) {
-    for (const char* const name : {"c", "a", "b"})
-        addPlugIn(name);
-    EXPECT_EQ(names(match()), (Names{"c 1", "a 1", "b 1"}));
-}
-
 TEST_F(Discovery, FiltersByPlaceUnlessPrivileged) {
     addPlugIn("in-application");
     const auto alone = addPlugIn("system");
@@ -146,13 +140,6 @@ TEST_F(Discovery, TakesTheContainingPathAsALiteralPrefixAndTheLastOfSeveral) {
     EXPECT_EQ(names(match()), Names{"x 1"});
 }
 
-TEST_F(Discovery, GoesOnWithoutTheClientsPath) {
-    platform_.processes.paths.clear();
-    addPlugIn("x", "9");
-    addPlugIn("x", "1")->application->path = "/Applications/Client.app";
-    EXPECT_EQ(names(match()), Names{"x 9"});
-}
-
 TEST_F(Discovery, KeepsOneRegistrationPerIdentifierAtTheEndOfTheList) {
     addPlugIn("x", "1.9");
     addPlugIn("y");
@@ -165,16 +152,6 @@ TEST_F(Discovery, KeepsOneRegistrationPerIdentifierAtTheEndOfTheList) {
     EXPECT_EQ(match(allVersions).size(), 3U);
     EXPECT_EQ(match(allVersions | allDuplicates).size(), 4U);
     EXPECT_EQ(match(allDuplicates).size(), 2U);
-}
-
-TEST_F(Discovery, OfEqualTimesKeepsTheFirstAndPrefersTheSystemVolume) {
-    const auto first = addPlugIn("x");
-    addPlugIn("x")->registered = first->registered + 0.2; // within the same second
-    EXPECT_EQ(uuids(match()), Names{uuidText(first)});
-    const auto system = addPlugIn("x");
-    system->onSystem = true;
-    system->registered = first->registered - 1000;
-    EXPECT_EQ(uuids(match()), Names{uuidText(system)});
 }
 
 TEST_F(Discovery, MarksReplacements) {

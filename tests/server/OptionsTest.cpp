@@ -18,15 +18,6 @@ std::optional<ZPDOptions> parse(std::vector<std::string> arguments) {
     return ZPDOptions::parse(static_cast<int>(arguments.size()), argv.data());
 }
 
-TEST(Options, TakeTheLastOfRepeatedOnesAndCountVerbose) {
-    const auto options = parse({"-c", "7", "-vS", "first", "-S", "second", "-d/a", "-v", "-c9"});
-    ASSERT_TRUE(options);
-    EXPECT_EQ(options->cacheLimit, 9U);
-    EXPECT_EQ(options->databasePath, "/a");
-    EXPECT_EQ(options->serviceName, "second");
-    EXPECT_EQ(options->verbose, 2U);
-}
-
 TEST(Options, ReadTheLeadingDigitsOfTheCacheLimit) {
     const struct {
         const char* text;
@@ -47,13 +38,6 @@ TEST(Options, ReadTheLeadingDigitsOfTheCacheLimit) {
         ASSERT_TRUE(options) << text;
         EXPECT_EQ(options->cacheLimit, limit) << text;
     }
-}
-
-TEST(Options, RefuseWhatTheyDoNotKnow) {
-    for (const auto& arguments : std::vector<std::vector<std::string>>{
-             {"extra"}, {"-v", "extra"}, {"-x"}, {"-vx"}, {"-c"}, {"--help"}, {"--", "extra"}})
-        EXPECT_FALSE(parse(arguments)) << arguments.front();
-    EXPECT_TRUE(parse({"-v", "--"})) << "and start afresh after a failure";
 }
 
 } // namespace
