@@ -49,16 +49,6 @@ TEST_F(FirstPass, FindsPlugInsInApplicationsAndBesidesThem) {
     EXPECT_EQ(application->zephrinPlugins(), (std::vector{at(one), at(two)}));
 }
 
-TEST_F(FirstPass, ReportsTheExtensionPointAtTheTopOfTheInfoDictionary) {
-    makeUsual();
-    open();
-    const auto info = at(one)->infoDictionary();
-    ASSERT_TRUE(info);
-    EXPECT_EQ(*info->find("HXExtensionPointIdentifier"), platform::Value("com.tovana.point"));
-    EXPECT_EQ(*at(one)->plugInDictionary(),
-              (Dictionary{{"HXExtensionPointIdentifier", "com.tovana.point"}}));
-}
-
 TEST_F(FirstPass, TakesTheIdentifierFromTheExtensionThenTheTopThenTheBundle) {
     Dictionary info = plugInInfo("com.example.bundle", "p");
     const auto identifier = [&](std::string_view path) {
@@ -72,22 +62,6 @@ TEST_F(FirstPass, TakesTheIdentifierFromTheExtensionThenTheTopThenTheBundle) {
     EXPECT_EQ(identifier("Applications/A.app/PlugIns/2.appex"), "com.example.top");
     info.set("HXExtension", Dictionary{{"HXExtensionIdentifier", "com.example.extension"}});
     EXPECT_EQ(identifier("Applications/A.app/PlugIns/3.appex"), "com.example.extension");
-}
-
-TEST_F(FirstPass, KeepsUuidsAndKnowledgeWhileNothingChanges) {
-    makeUsual();
-    open();
-    const Uuid uuid = uuidOf(one);
-    const auto registered = at(one)->registrationDate();
-    const ARKnowledge known = registry->knowledge();
-    ASSERT_TRUE(known.uuid);
-
-    open();
-    EXPECT_EQ(uuidOf(one), uuid);
-    EXPECT_EQ(at(one)->registrationDate(), registered);
-    EXPECT_EQ(registry->knowledge().uuid, known.uuid);
-    EXPECT_EQ(registry->knowledge().sequence, known.sequence);
-    EXPECT_EQ(*at(one)->infoDictionary()->find("BQBundleVersion"), platform::Value("1.0"));
 }
 
 TEST_F(FirstPass, TellsATouchedBundleFromAChangedOne) {

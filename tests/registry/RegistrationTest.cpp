@@ -102,18 +102,6 @@ TEST_F(Registration, KeepsTheDatabaseSmallHoweverMuchChanges) {
     EXPECT_LT(std::filesystem::file_size(places.registryDatabase + "-wal"), 4U << 20);
 }
 
-TEST_F(Registration, RefusesWhatIsNoPlugIn) {
-    home.write("Elsewhere/Broken.appex/Info.plist", "broken");
-    makePlugIn("Elsewhere/Other.bundle", "other");
-    for (const char* path : {"Elsewhere/Missing.appex", "Elsewhere/Broken.appex",
-                             "Elsewhere/Other.bundle", "Elsewhere/B.app"}) {
-        EXPECT_TRUE(registry->registerPlugin(home / path)) << path;
-        EXPECT_TRUE(registry->unregisterPlugin(home / path)) << path;
-    }
-    EXPECT_EQ(identifiers(), Strings{"in"});
-    EXPECT_EQ(witness.told, Strings());
-}
-
 TEST_F(Registration, KeepsAwayWhatWasTakenAway) {
     const auto uuid = uuidOf(inside);
     EXPECT_FALSE(registry->unregisterPlugin(home / inside));
