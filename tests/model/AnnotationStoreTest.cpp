@@ -74,12 +74,6 @@ Value savedWith(Dictionary data) {
 
 } // namespace
 
-TEST_F(StoreTest, StartsEmptyWithoutAFile) {
-    auto store = open();
-    EXPECT_EQ(store.annotationForPlugIn(*plugIn), std::nullopt);
-    EXPECT_FALSE(std::filesystem::exists(path));
-}
-
 TEST_F(StoreTest, ReadsUserDirectoriesFromTheSystemsConfiguration) {
     EXPECT_EQ(ZPDAnnotationStore::confstrPath(_CS_PATH), "/bin:/usr/bin");
     EXPECT_FALSE(ZPDAnnotationStore::confstrPath(-1));

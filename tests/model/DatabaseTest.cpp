@@ -83,16 +83,6 @@ struct DatabaseTest : testing::Test {
 
 // ---- Cache
 
-TEST_F(DatabaseTest, KeepsRecords) {
-    const auto plugIn = install("a");
-    const auto record = database->findPlugIn(plugIn->uuid);
-    ASSERT_TRUE(record);
-    EXPECT_EQ(database->findPlugIn(plugIn->uuid), record);
-    EXPECT_EQ(database->findPlugInAtPath(*plugIn->path), record);
-    EXPECT_EQ(database->plugInForProxy(plugIn), record);
-    EXPECT_EQ(database->findPlugIns(std::nullopt)->front(), record);
-}
-
 TEST_F(DatabaseTest, EmptiesTheCacheWhenItHoldsMoreThanTheLimit) {
     database->setCacheLimit(2);
     std::vector<ZPDPlugIn::Ptr> records;
@@ -108,34 +98,6 @@ TEST_F(DatabaseTest, EmptiesTheCacheWhenItHoldsMoreThanTheLimit) {
     EXPECT_EQ(platform.workspace.schemaCachesCleared, 1);
     EXPECT_EQ(database->findPlugIn(records[3]->uuid()), records[3]);
     EXPECT_NE(database->findPlugIn(records[0]->uuid()), records[0]);
-}
-
-TEST_F(DatabaseTest, RebuildsRecordsInAnotherLanguage) {
-    auto plugIn = install("a");
-    plugIn->name = "One";
-    EXPECT_EQ(database->findPlugIn(plugIn->uuid)->localizedName(), "One");
-    plugIn->name = "Eins";
-    platform.locale.changed();
-    EXPECT_EQ(database->findPlugIn(plugIn->uuid)->localizedName(), "Eins");
-    EXPECT_EQ(platform.workspace.schemaCachesCleared, 1);
-}
-
-TEST_F(DatabaseTest, RebuildsRecordsWhenTheTrustedKeysChange) {
-    const auto plugIn = install("a");
-    const Dictionary elected{{"HXUserElection", "1"}};
-    EXPECT_THAT(found(elected), IsEmpty()); // and no record is made
-    plugIn->granted = Dictionary{{autoElectKey, true}};
-    database->trustChanged();
-    EXPECT_THAT(found(elected), ElementsAre("a"));
-
-    const auto before = database->findPlugIn(plugIn->uuid);
-    plugIn->granted = Dictionary{{replaceKey, "b"}, {autoElectKey, true}};
-    database->trustChanged();
-    const auto after = database->findPlugIn(plugIn->uuid);
-    EXPECT_EQ(before->annotationKey(), "a");
-    EXPECT_EQ(after->annotationKey(), "b");
-    EXPECT_EQ(election(plugIn), Value(1));
-    EXPECT_EQ(platform.workspace.trustChanges, 2);
 }
 
 TEST_F(DatabaseTest, StopsObservingWhenItGoes) {
@@ -276,30 +238,7 @@ TEST_F(DatabaseTest, ElectsEntitledPlugInsThatHaveNoElection) {
     EXPECT_THAT(platform.notifications.posted, IsEmpty());
 }
 
-TEST_F(DatabaseTest, TellsOfChangesOnlyWhenAsked) {
-    const auto record = database->findPlugIn(install("a")->uuid);
-    EXPECT_EQ(database->setAnnotation(Dictionary{{"election", 1}}, *record), std::nullopt);
-    EXPECT_THAT(platform.notifications.posted, IsEmpty());
-    database->notifyAnnotationChange();
-    EXPECT_THAT(platform.notifications.posted, ElementsAre("com.tovana.zephrin.annotation-change"));
-}
-
-// ---- Registration
-
-TEST_F(DatabaseTest, PassesRegistrationOn) {
-    EXPECT_EQ(database->addPlugIn("/a"), std::nullopt);
-    EXPECT_EQ(database->removePlugIn("/b"), std::nullopt);
-    EXPECT_THAT(platform.workspace.registered, ElementsAre("/a"));
-    EXPECT_THAT(platform.workspace.unregistered, ElementsAre("/b"));
-
-    platform.workspace.registrationFailure = platform::posixError(EIO, "store");
-    const auto notAdded = database->addPlugIn("/a");
-    const auto notRemoved = database->removePlugIn("/b");
-    EXPECT_EQ(notAdded->code, 2);
-    EXPECT_EQ(notAdded->description, "AppRegistry failed to register the plug-in");
-    EXPECT_EQ(notRemoved->code, 2);
-    EXPECT_EQ(notRemoved->description, "AppRegistry failed to deregister the plug-in");
-}
+// ---- Removal
 
 TEST_F(DatabaseTest, ForgetsRemovedPlugInsBeforeItTellsOfThem) {
     FakeDelegate delegate;

@@ -136,8 +136,6 @@ private:
 
 struct FakeTypes final : platform::Types {
     std::vector<std::pair<std::string, std::string>> conformances; // type, target
-    bool ruleAnswer = false;
-    std::vector<std::pair<platform::Value, platform::Dictionary>> evaluated;
 
     [[nodiscard]] bool conforms(std::string_view type, std::string_view target) override {
         for (const auto& [from, to] : conformances) {
@@ -147,10 +145,9 @@ struct FakeTypes final : platform::Types {
         return type == target;
     }
 
-    [[nodiscard]] bool evaluateActivationRule(const platform::Value& rule,
-                                              const platform::Dictionary& offer) override {
-        evaluated.emplace_back(rule, offer);
-        return ruleAnswer;
+    [[nodiscard]] bool evaluateActivationRule(const platform::Value&,
+                                              const platform::Dictionary&) override {
+        return false;
     }
 };
 

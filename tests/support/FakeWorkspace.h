@@ -103,14 +103,10 @@ public:
     std::map<std::string, std::shared_ptr<FakeApplication>> applications;
     ARKnowledge known{platform::Uuid::random(), 1};
     bool failQueries = false;
-    std::optional<platform::Error> registrationFailure;
 
     ARWorkspaceObserver* observer = nullptr;
     int proxiesAsked = 0;
     int schemaCachesCleared = 0;
-    int trustChanges = 0;
-    std::vector<std::string> registered;
-    std::vector<std::string> unregistered;
 
     // Something changed somewhere: a new knowledge UUID.
     void move() { known = {platform::Uuid::random(), known.sequence + 1}; }
@@ -153,19 +149,17 @@ public:
 
     [[nodiscard]] ARKnowledge knowledge() override { return known; }
 
-    [[nodiscard]] std::optional<platform::Error> registerPlugin(std::string_view path) override {
-        registered.emplace_back(path);
-        return registrationFailure;
+    [[nodiscard]] std::optional<platform::Error> registerPlugin(std::string_view) override {
+        return std::nullopt;
     }
 
-    [[nodiscard]] std::optional<platform::Error> unregisterPlugin(std::string_view path) override {
-        unregistered.emplace_back(path);
-        return registrationFailure;
+    [[nodiscard]] std::optional<platform::Error> unregisterPlugin(std::string_view) override {
+        return std::nullopt;
     }
 
     void clearSchemaCaches() override { ++schemaCachesCleared; }
 
-    void trustChanged() override { ++trustChanges; }
+    void trustChanged() override {}
 
     void setObserver(ARWorkspaceObserver* o) override { observer = o; }
 
