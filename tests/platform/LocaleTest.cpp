@@ -1,6 +1,4 @@
 #include <cstdlib>
-#include <filesystem>
-#include <poll.h>
 
 #include <gtest/gtest.h>
 
@@ -55,37 +53,4 @@ TEST(SystemLocale, ReadsItsFileAndElseTheEnvironment) {
     EXPECT_EQ(SystemLocale(folder / "missing").current(), "fr_FR");
     ::unsetenv("LANG");
     EXPECT_EQ(SystemLocale(folder / "missing").current(), "");
-}
-
-TEST(SystemLocale, TellsEveryChangeOfItsFile) {
-    const TestFolder folder;
-    ::unsetenv("LANG");
-    SystemLocale locale(folder / "etc/deep/locale.conf"); // whose folders are not there yet
-    int told = 0;
-    locale.observeChanges([&] { ++told; });
-    const auto changed = [&] {
-        const int before = told;
-        struct ::pollfd ready = {locale.watchDescriptor(), POLLIN, 0};
-        while (::poll(&ready, 1, 50) > 0)
-            locale.handleEvents();
-        return told > before;
-    };
-    EXPECT_FALSE(changed());
-    std::filesystem::create_directories(folder / "etc/deep");
-    EXPECT_FALSE(changed());
-    folder.write("etc/deep/locale.conf", "LANG=de_DE\n");
-    EXPECT_TRUE(changed());
-    EXPECT_EQ(locale.current(), "de_DE");
-    folder.write("etc/deep/other.conf", "LANG=en\n");
-    EXPECT_FALSE(changed());
-    folder.write("etc/deep/new", "LANG=it_IT\n");
-    std::filesystem::rename(folder / "etc/deep/new", folder / "etc/deep/locale.conf");
-    EXPECT_TRUE(changed());
-    EXPECT_EQ(locale.current(), "it_IT");
-    std::filesystem::remove_all(folder / "etc");
-    EXPECT_TRUE(changed());
-    EXPECT_EQ(locale.current(), "");
-    folder.write("etc/deep/locale.conf", "LANG=fr\n");
-    EXPECT_TRUE(changed());
-    EXPECT_EQ(locale.current(), "fr");
 }
