@@ -66,17 +66,6 @@ TEST_F(ClientConnectionTest, RepliesComeInOrderOnTheTargetQueue) {
     }
 }
 
-TEST_F(ClientConnectionTest, ConnectsAgainAfterTheDaemonRestarted) {
-    auto server = std::make_unique<EchoServer>(path_);
-    connect();
-    EXPECT_TRUE(askAndWait({{"a", 1}}));
-    for (int i = 0; i < 5; ++i) {
-        server.reset();
-        server = std::make_unique<EchoServer>(path_);
-        EXPECT_TRUE(askAndWait({{"a", 2}})) << i;
-    }
-}
-
 TEST_F(ClientConnectionTest, PendingRequestsOfALostDaemonAreInterruptedOnce) {
     auto server = std::make_unique<EchoServer>(path_, Limits{}, [](Connection&, const Message&) {});
     connect();
@@ -90,19 +79,6 @@ TEST_F(ClientConnectionTest, PendingRequestsOfALostDaemonAreInterruptedOnce) {
     for (const auto& result : seen_->results)
         EXPECT_EQ(result, Result(std::unexpected(ConnectionError::interrupted)));
     EXPECT_EQ(askAndWait({{"a", 1}}), Result(std::unexpected(ConnectionError::invalid)));
-}
-
-TEST_F(ClientConnectionTest, AnswersTheGreetingBeforeItsFirstRequest) {
-    EchoServer server(path_, {}, [](Connection& connection, const Message& message) {
-        Reply reply = createReply(message);
-        reply.body.set("greeted", message.greeted);
-        reply.body.set("fromPeer", message.fromPeer);
-        connection.send(reply);
-    });
-    connect();
-    const Result result = askAndWait({});
-    ASSERT_TRUE(result);
-    EXPECT_EQ(*result, (Dictionary{{"greeted", true}, {"fromPeer", true}}));
 }
 
 TEST_F(ClientConnectionTest, CancelAnswersPendingWithInvalid) {

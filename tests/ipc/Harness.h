@@ -90,8 +90,6 @@ public:
 
     void close() { socket_.reset(); }
 
-    [[nodiscard]] int descriptor() const { return socket_.get(); }
-
     platform::Dictionary greeting; // read when the connection was made
 
 private:
