@@ -1,6 +1,5 @@
 #include "tests/e2e/Home.h"
 
-#include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <sstream>
@@ -21,22 +20,13 @@ namespace {
 } // namespace
 
 Home::Home() {
-    std::string pattern = (fs::temp_directory_path() / "zpd-e2e-XXXXXX").string();
-    if (!mkdtemp(pattern.data()))
-        throw std::runtime_error("no temporary home");
-    path_ = fs::canonical(pattern).string();
-    fs::permissions(path_, fs::perms(0755));
-    fs::create_directories(path_ + "/Applications");
-}
-
-Home::~Home() {
-    std::error_code ignored;
-    fs::remove_all(path_, ignored);
+    fs::permissions(path(), fs::perms(0755));
+    fs::create_directories(path() + "/Applications");
 }
 
 std::string Home::addApp(const std::string& name, const std::string& folder,
                          const Item& info) const {
-    const std::string app = path_ + "/" + folder + "/" + name + ".app";
+    const std::string app = *this / folder + "/" + name + ".app";
     const Item basics =
         Item::map({{"BQBundleIdentifier", "com.example." + name}, {"BQBundleExecutable", name}});
     writeFile(app + "/Info.plist", xmlPlist(basics.merged(info)));

@@ -3,6 +3,7 @@
 #include <string>
 
 #include "tests/e2e/Item.h"
+#include "tests/platform/TestFolder.h"
 
 namespace e2e {
 
@@ -10,15 +11,10 @@ namespace e2e {
 class Home {
 public:
     Home();
-    Home(const Home&) = delete;
-    Home& operator=(const Home&) = delete;
-    ~Home();
 
-    [[nodiscard]] const std::string& path() const { return path_; }
+    [[nodiscard]] const std::string& path() const { return folder_.path(); }
 
-    [[nodiscard]] std::string operator/(const std::string& below) const {
-        return path_ + "/" + below;
-    }
+    [[nodiscard]] std::string operator/(const std::string& below) const { return folder_ / below; }
 
     // Makes an application with an executable; answers its path. `folder` is relative to the home.
     [[nodiscard]] std::string addApp(const std::string& name,
@@ -26,7 +22,7 @@ public:
                                      const Item& info = Item::map({})) const;
 
 private:
-    std::string path_;
+    TestFolder folder_;
 };
 
 // What the tests say of a plug-in; what they leave out is not in its Info.plist.

@@ -225,13 +225,18 @@ void Probe::run(const std::string& line) {
         {"take", [&] { client_.emplace(std::stoi(words[1])); }},
         {"ask", [&] { say(ask()); }},
         {"names", [&] { say("plug-ins: " + matched(client(), Item())); }},
+        {"paths",
+         [&] {
+             std::string line;
+             for (const Item& form : match(client(), Item(), std::stoul(words[1])))
+                 line += (line.empty() ? "" : " ") + form["path"].text();
+             say(line);
+         }},
         {"remove",
          [&] {
              const Words paths(words.begin() + 1, words.end());
              say(said(client().request(pathsRequest("remove", paths))));
          }},
-        {"send", [&] { client().send(frameOf(requestFrame, allPlugIns())); }},
-        {"receive", [&] { say(reply()); }},
         {"child-asks", [&] { waitpid(aside([&] { say(ask()); }), nullptr, 0); }},
         {"heir-asks", [&] { askAfterOwnEnd(false); }},
         {"namesake-asks", [&] { askAfterOwnEnd(true); }},

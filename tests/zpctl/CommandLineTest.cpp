@@ -16,6 +16,7 @@
 
 #include "platform/file/File.h"
 #include "platform/log/Log.h"
+#include "tests/server/TemporaryHome.h"
 
 namespace {
 
@@ -27,15 +28,7 @@ constexpr const char* uuid = "2B4F0C52-5B8B-4C5B-9B0B-0F6C1B7C9E11";
 // Runs the tool where there is no daemon.
 class CommandLine : public testing::Test {
 protected:
-    void SetUp() override {
-        platform::log::silence();
-        char name[] = "/tmp/zpctl-home-XXXXXX";
-        ASSERT_TRUE(mkdtemp(name));
-        home_ = name;
-        setenv("ZEPHRIN_HOME", name, 1);
-    }
-
-    void TearDown() override { std::filesystem::remove_all(home_); }
+    CommandLine() { platform::log::silence(); }
 
     Status run(const std::vector<std::string>& arguments) {
         out_.str("");
@@ -43,7 +36,8 @@ protected:
         return zpctl::run(arguments, {.out = out_, .err = err_});
     }
 
-    std::filesystem::path home_;
+    const TemporaryHome temporary_;
+    const std::filesystem::path home_ = temporary_.folder().path();
     std::ostringstream out_;
     std::ostringstream err_;
 };
