@@ -112,13 +112,6 @@ std::vector<std::string> ServerFixture::names(const Forms& forms) {
     return names;
 }
 
-std::vector<std::string> ServerFixture::uuids(const Forms& forms) {
-    std::vector<std::string> texts;
-    for (const Dictionary& form : forms)
-        texts.push_back(textIn(form, "uuid"));
-    return texts;
-}
-
 std::string textIn(const Dictionary& form, std::string_view key) {
     const Value* const value = form.find(key);
     return std::string(value ? value->string().value_or("") : "");

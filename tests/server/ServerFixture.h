@@ -55,8 +55,6 @@ protected:
     [[nodiscard]] Forms match(std::uint64_t flags = 0, Dictionary keys = {});
     // "identifier version" of each.
     [[nodiscard]] static std::vector<std::string> names(const Forms& forms);
-    // The UUIDs, as a way to tell registrations apart.
-    [[nodiscard]] static std::vector<std::string> uuids(const Forms& forms);
 
     static constexpr const char* clientPath = "/Applications/Client.app/client";
 

@@ -153,9 +153,8 @@ struct FakeTypes final : platform::Types {
 
 struct FakePreferences final : platform::Preferences {
     std::map<std::string, platform::Value> values; // "domain key"
-    std::vector<std::string> synchronized;
 
-    void synchronize(std::string_view domain) override { synchronized.emplace_back(domain); }
+    void synchronize(std::string_view) override {}
 
     [[nodiscard]] std::optional<platform::Value> value(std::string_view domain,
                                                        std::string_view key) override {
