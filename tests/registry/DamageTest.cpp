@@ -4,8 +4,6 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <sqlite3.h>
-
 #include "AppRegistry/ARStore.h"
 #include "tests/registry/RegistryFixture.h"
 
@@ -36,13 +34,6 @@ protected:
 
     void write(std::string_view bytes) const {
         std::ofstream(database(), std::ios::binary | std::ios::trunc) << bytes;
-    }
-
-    void execute(const char* sql) const {
-        sqlite3* handle = nullptr;
-        ASSERT_EQ(sqlite3_open(database().c_str(), &handle), SQLITE_OK);
-        EXPECT_EQ(sqlite3_exec(handle, sql, nullptr, nullptr, nullptr), SQLITE_OK);
-        sqlite3_close(handle);
     }
 
     void expectWhole() {

@@ -1,7 +1,5 @@
 #include <functional>
 
-#include <sqlite3.h>
-
 #include "platform/digest/Sha256.h"
 #include "tests/registry/RegistryFixture.h"
 
@@ -38,22 +36,7 @@ protected:
 
     // How often something was verified since the last call.
     int verified() { return std::exchange(signing.verified, 0); }
-
-    void execute(const char* sql) {
-        registry.reset();
-        sqlite3* handle = nullptr;
-        ASSERT_EQ(sqlite3_open(places.registryDatabase.c_str(), &handle), SQLITE_OK);
-        EXPECT_EQ(sqlite3_exec(handle, sql, nullptr, nullptr, nullptr), SQLITE_OK) << sql;
-        sqlite3_close(handle);
-    }
 };
-
-std::size_t linesWith(std::string_view log, std::string_view text) {
-    std::size_t found = 0;
-    for (auto at = log.find(text); at != log.npos; at = log.find(text, at + 1))
-        ++found;
-    return found;
-}
 
 // Keeps what it was given to verify.
 struct Examiner final : platform::CodeSigning {

@@ -72,26 +72,6 @@ private:
 
 } // namespace
 
-TEST_F(Registration, AddsABundleByPathForGood) {
-    EXPECT_FALSE(registry->registerPlugin(home / outside));
-    EXPECT_EQ(identifiers(), (Strings{"in", "out"}));
-    EXPECT_EQ(at(outside)->containingBundle()->bundleIdentifier(), "com.example.b");
-    EXPECT_EQ(witness.told, Strings{"+out"});
-    const auto uuid = uuidOf(outside);
-    const auto known = registry->knowledge();
-
-    EXPECT_FALSE(registry->registerPlugin(home / outside)); // nothing new
-    EXPECT_EQ(witness.told, Strings{"+out"});
-    EXPECT_EQ(registry->knowledge().uuid, known.uuid);
-
-    reopen();
-    EXPECT_EQ(identifiers(), (Strings{"in", "out"}));
-    EXPECT_EQ(uuidOf(outside), uuid);
-    remove("Elsewhere");
-    reopen();
-    EXPECT_EQ(identifiers(), Strings{"in"});
-}
-
 // Of a registry that changes without pause for as long as the box runs.
 TEST_F(Registration, KeepsTheDatabaseSmallHoweverMuchChanges) {
     registry->rescan(); // after the first checkpoint

@@ -1,5 +1,7 @@
 #include "tests/registry/RegistryFixture.h"
 
+#include <sqlite3.h>
+
 #include "platform/plist/PropertyList.h"
 
 using platform::Dictionary;
@@ -43,6 +45,21 @@ std::string RegistryTest::open() {
         ASSERT_TRUE(opened) << describe(opened.error());
         registry = std::move(*opened);
     });
+}
+
+std::size_t RegistryTest::linesWith(std::string_view log, std::string_view text) {
+    std::size_t found = 0;
+    for (auto at = log.find(text); at != log.npos; at = log.find(text, at + 1))
+        ++found;
+    return found;
+}
+
+void RegistryTest::execute(const char* sql) {
+    registry.reset();
+    sqlite3* handle = nullptr;
+    ASSERT_EQ(sqlite3_open(places.registryDatabase.c_str(), &handle), SQLITE_OK);
+    EXPECT_EQ(sqlite3_exec(handle, sql, nullptr, nullptr, nullptr), SQLITE_OK) << sql;
+    sqlite3_close(handle);
 }
 
 ARZephrinProxy::Ptr RegistryTest::at(std::string_view path) const {

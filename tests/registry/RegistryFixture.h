@@ -40,6 +40,11 @@ protected:
     template <class Act>
     static std::string logOf(Act&& act);
 
+    // In how many places of a log the text stands.
+    [[nodiscard]] static std::size_t linesWith(std::string_view log, std::string_view text);
+    // Changes the database of the registry, which is closed first.
+    void execute(const char* sql);
+
     [[nodiscard]] ARZephrinProxy::Ptr at(std::string_view path) const;
     // The UUID of the plug-in at a path, all zero when there is none.
     [[nodiscard]] platform::Uuid uuidOf(std::string_view path) const;

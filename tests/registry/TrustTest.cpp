@@ -19,13 +19,6 @@ struct Case {
     std::function<void(const TestFolder&)> spoil;
 };
 
-std::size_t count(std::string_view text, std::string_view part) {
-    std::size_t found = 0;
-    for (auto at = text.find(part); at != text.npos; at = text.find(part, at + 1))
-        ++found;
-    return found;
-}
-
 void setMode(const std::string& path, ::mode_t mode) {
     ASSERT_EQ(::chmod(path.c_str(), mode), 0);
 }
@@ -50,7 +43,7 @@ protected:
     // Expects that the bundle named Bad alone is skipped, and reported in one line.
     void expectOnlyGood(const std::string& log) {
         EXPECT_EQ(identifiers(), Strings{"com.example.good"});
-        EXPECT_EQ(count(log, "ar error: skipping " + home.path()), 1U) << log;
+        EXPECT_EQ(linesWith(log, "ar error: skipping " + home.path()), 1U) << log;
         EXPECT_EQ(logOf([this] { registry->rescan(); }), "");
     }
 };
@@ -165,6 +158,6 @@ TEST_F(Trust, TakesAProgramBehindATrustedLink) {
 
 TEST_F(Trust, SkipsAnApplicationWithItsPlugIns) {
     home.write("Applications/A.app/Info.plist", "broken");
-    EXPECT_EQ(count(open(), "ar error: skipping"), 1U);
+    EXPECT_EQ(linesWith(open(), "ar error: skipping"), 1U);
     EXPECT_EQ(identifiers(), Strings());
 }
