@@ -13,20 +13,6 @@ namespace {
 using namespace platform::ipc;
 using namespace tests;
 
-TEST(FrameReaderTest, CutsTheSameFramesHoweverTheyArrive) {
-    const std::vector<std::string> bodies = {
-        "", "a", std::string(50, 'b'), std::string(5000, 'c'), "", std::string(99, 'd')};
-    std::string stream;
-    for (const std::string& body : bodies)
-        stream += frame(1, 7, body);
-    for (std::size_t step = 1; step < 300; ++step) {
-        Feed feed;
-        for (std::size_t at = 0; at < stream.size(); at += step)
-            feed.bytes(std::string_view(stream).substr(at, step));
-        ASSERT_EQ(feed.bodies, bodies) << step;
-    }
-}
-
 TEST(FrameReaderTest, AFrameIsFromThePeerOnlyWhenAllOfItIs) {
     const std::string one = frame(1, 1, std::string(300, 'x'));
     for (const std::size_t cut : {1U, 15U, 16U, 17U, 200U, 315U}) {
