@@ -227,10 +227,10 @@ void Probe::run(const std::string& line) {
         {"names", [&] { say("plug-ins: " + matched(client(), Item())); }},
         {"paths",
          [&] {
-             std::string line;
+             std::string paths;
              for (const Item& form : match(client(), Item(), std::stoul(words[1])))
-                 line += (line.empty() ? "" : " ") + form["path"].text();
-             say(line);
+                 paths += (paths.empty() ? "" : " ") + form["path"].text();
+             say(paths);
          }},
         {"remove",
          [&] {
