@@ -284,7 +284,12 @@ TEST_F(Follow, AStormLeavesEverythingAsTheFoldersAre) {
     const auto move = [&](int i, const std::string& from, const std::string& to) {
         fs::rename(home / (from + name(i) + ".app"), home / (to + name(i) + ".app"));
     };
+    const auto lines = [&](const char* text) { return daemon->linesWith(text); };
     for (int i = 0; i < count; ++i) {
+        // However slow the daemon is, some of the storm comes and goes before its eyes.
+        if (i == count / 2) {
+            EXPECT_TRUE(eventually([&] { return lines("plug-in INSTALLED:") >= 2 + 50; }));
+        }
         move(i, "Aside/", "Applications/");
         if (i >= 50)
             move(i - 50, "Applications/", "Away/");
@@ -303,12 +308,11 @@ TEST_F(Follow, AStormLeavesEverythingAsTheFoldersAre) {
         stored("SELECT count(*) FROM entries WHERE CAST(path AS TEXT) NOT LIKE '%/Applications/%'"),
         0);
     // An application, its PlugIns and what is in there.
-    EXPECT_EQ(watches(), watchesBefore + 10 * 3);
-    EXPECT_EQ(descriptors(), descriptorsBefore);
-    const auto lines = [&](const char* text) { return daemon->linesWith(text); };
+    EXPECT_TRUE(eventually([&] { return watches() == watchesBefore + 10 * 3; })) << watches();
+    EXPECT_TRUE(eventually([&] { return descriptors() <= descriptorsBefore; })) << descriptors();
     EXPECT_TRUE(eventually(
         [&] { return lines("plug-in INSTALLED:") == lines("plug-in UNINSTALLED:") + 10 + 2; }));
-    EXPECT_GT(lines("plug-in UNINSTALLED:"), 100u); // was a storm for the daemon too
+    EXPECT_GE(lines("plug-in UNINSTALLED:"), 50u);
     EXPECT_EQ(lines("ar error: skipping"), 0u);
 }
 
