@@ -41,6 +41,39 @@ protected:
     const std::string path_ = folder_ / "service";
 };
 
+// Requests with these numbers and empty bodies, as one text.
+std::string requests(std::uint64_t from, std::uint64_t count) {
+    std::string all;
+    for (std::uint64_t id = from; id < from + count; ++id)
+        all += request(id, Dictionary{});
+    return all;
+}
+
+void expectRepliesInOrder(RawClient& client, std::uint64_t count) {
+    for (std::uint64_t id = 0; id < count; ++id)
+        ASSERT_EQ(client.read()->id, id);
+}
+
+// Answers each request with this.
+EchoServer::Serve answer(std::string_view key, const Value& value) {
+    return [key, value](Connection& connection, const Message& message) {
+        Reply reply = createReply(message);
+        reply.body.set(key, value);
+        connection.send(reply);
+    };
+}
+
+// Answers whose a request is.
+void tellOrigin(Connection& connection, const Message& message) {
+    Reply reply = createReply(message);
+    reply.body = {{"fromPeer", message.fromPeer}, {"greeted", message.greeted}};
+    connection.send(reply);
+}
+
+void settle(int milliseconds) {
+    std::this_thread::sleep_for(std::chrono::milliseconds(milliseconds));
+}
+
 // Keeps the service queue busy until it is let go.
 class Block {
 public:
@@ -60,20 +93,16 @@ private:
 };
 
 TEST_F(ConnectionTest, GreetsFirstAndTakesOneRightAnswer) {
-    EchoServer server(path_, {}, [](Connection& connection, const Message& message) {
-        Reply reply = createReply(message);
-        reply.body.set("greeted", message.greeted);
-        connection.send(reply);
-    });
+    EchoServer server(path_, {}, tellOrigin);
     RawClient client(path_);
     const Value* challenge = client.greeting.find("challenge");
     ASSERT_TRUE(challenge && challenge->data());
     EXPECT_EQ(challenge->data()->bytes.size(), challengeSize);
-    client.write(request(1, Dictionary{}));
-    EXPECT_EQ(client.read()->body, (Dictionary{{"greeted", false}}));
+    client.write(requests(1, 1));
+    EXPECT_EQ(client.read()->body, (Dictionary{{"fromPeer", true}, {"greeted", false}}));
     client.answerGreeting();
-    client.write(request(2, Dictionary{}));
-    EXPECT_EQ(client.read()->body, (Dictionary{{"greeted", true}}));
+    client.write(requests(2, 1));
+    EXPECT_EQ(client.read()->body, (Dictionary{{"fromPeer", true}, {"greeted", true}}));
     client.answerGreeting();
     EXPECT_TRUE(client.atEnd());
 
@@ -105,19 +134,14 @@ TEST_F(ConnectionTest, LargeRequestsAndRepliesComeThrough) {
         const Dictionary body{{"data", Data{SharedBytes(std::string(size, 'x'))}}};
         std::jthread writer([&] { client.write(request(1, body)); });
         const auto reply = client.read();
-        ASSERT_TRUE(reply) << size;
-        EXPECT_TRUE(reply->body == body) << size;
+        EXPECT_TRUE(reply && reply->body == body) << size;
     }
 }
 
 TEST_F(ConnectionTest, AfterAHalfCloseQueuedRepliesAreFlushedAndNothingElseIsDone) {
-    EchoServer server(path_, {}, [](Connection& connection, const Message& message) {
-        Reply reply = createReply(message);
-        reply.body.set("data", Data{SharedBytes(std::string(4'000'000, 'x'))});
-        connection.send(reply);
-    });
+    EchoServer server(path_, {}, answer("data", Data{SharedBytes(std::string(4'000'000, 'x'))}));
     RawClient client(path_);
-    client.write(request(1, Dictionary{}) + request(2, Dictionary{}));
+    client.write(requests(1, 2));
     ASSERT_TRUE(server.requests.reaches(1));
     client.endWriting();
     ASSERT_TRUE(server.gone.reaches(1));
@@ -129,14 +153,10 @@ TEST_F(ConnectionTest, AfterAHalfCloseQueuedRepliesAreFlushedAndNothingElseIsDon
 }
 
 TEST_F(ConnectionTest, AReplyPastTheLimitsBecomesAShortError) {
-    EchoServer server(path_, {}, [](Connection& connection, const Message& message) {
-        const SharedBytes large(std::string(70U << 20U, 'x'));
-        Reply reply = createReply(message);
-        reply.body.set("a", Array{Data{large}, Data{large}, Data{large}, Data{large}});
-        connection.send(reply);
-    });
+    const Data large{SharedBytes(std::string(70U << 20U, 'x'))};
+    EchoServer server(path_, {}, answer("a", Array{large, large, large, large}));
     RawClient client(path_);
-    client.write(request(7, Dictionary{}));
+    client.write(requests(7, 1));
     const auto reply = client.read();
     ASSERT_TRUE(reply);
     EXPECT_EQ(reply->id, 7U);
@@ -154,18 +174,13 @@ TEST_F(ConnectionTest, AFloodDoesNotDelayOthersByMoreThanItsTurn) {
     Block block(server.queue());
     RawClient flooder(path_);
     RawClient polite(path_);
-    std::string flood;
-    for (std::uint64_t i = 0; i < 200; ++i)
-        flood += request(1000 + i, Dictionary{});
-    flooder.write(flood);
-    flooder.write(request(1, Dictionary{})); // the loop has read what came before this
-    std::this_thread::sleep_for(std::chrono::milliseconds(50));
-    for (std::uint64_t i = 0; i < 5; ++i)
-        polite.write(request(i, Dictionary{}));
-    std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    flooder.write(requests(1000, 200));
+    flooder.write(requests(1, 1)); // the loop has read what came before this
+    settle(50);
+    polite.write(requests(0, 5));
+    settle(50);
     block.release();
-    for (int i = 0; i < 5; ++i)
-        ASSERT_TRUE(polite.read());
+    expectRepliesInOrder(polite, 5);
     const std::lock_guard lock(mutex);
     // Their turns alternate, so the last of the five has about as many of the flood before it.
     const auto last = std::ranges::find(order, 4U);
@@ -174,22 +189,14 @@ TEST_F(ConnectionTest, AFloodDoesNotDelayOthersByMoreThanItsTurn) {
 
 // They come in one read, and no byte after them wakes the daemon.
 TEST_F(ConnectionTest, MoreRequestsThanMayWaitAreAllCarriedOut) {
-    Limits limits;
-    limits.waitingRequests = 8;
-    EchoServer server(path_, limits);
+    EchoServer server(path_, {.waitingRequests = 8});
     RawClient client(path_);
-    std::string all;
-    for (std::uint64_t i = 0; i < 60; ++i)
-        all += request(i, Dictionary{{"number", i}});
-    client.write(all);
-    for (std::uint64_t i = 0; i < 60; ++i)
-        ASSERT_EQ(client.read()->id, i);
+    client.write(requests(0, 60));
+    expectRepliesInOrder(client, 60);
 }
 
 TEST_F(ConnectionTest, ReadingPausesAtTheLimitAndGoesOn) {
-    Limits limits;
-    limits.waitingRequests = 8;
-    EchoServer server(path_, limits);
+    EchoServer server(path_, {.waitingRequests = 8});
     Block block(server.queue());
     RawClient client(path_);
     // More than the sockets hold, so that writing stops when reading does.
@@ -201,25 +208,19 @@ TEST_F(ConnectionTest, ReadingPausesAtTheLimitAndGoesOn) {
             ++written;
         }
     });
-    std::this_thread::sleep_for(std::chrono::milliseconds(300));
+    settle(300);
     EXPECT_LT(written, 20);
     block.release();
-    for (std::uint64_t i = 0; i < 60; ++i)
-        ASSERT_EQ(client.read()->id, i);
+    expectRepliesInOrder(client, 60);
 }
 
 TEST_F(ConnectionTest, AHangUpIsNoticedWhileReadingIsPaused) {
-    Limits limits;
-    limits.waitingRequests = 4;
-    EchoServer server(path_, limits);
+    EchoServer server(path_, {.waitingRequests = 4});
     Block block(server.queue());
     {
         RawClient client(path_);
-        std::string flood;
-        for (std::uint64_t i = 0; i < 50; ++i)
-            flood += request(i, Dictionary{});
-        client.write(flood);
-        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+        client.write(requests(0, 50));
+        settle(50);
         EXPECT_EQ(server.gone.value(), 0);
     }
     EXPECT_TRUE(server.gone.reaches(1)); // with the service queue still busy
@@ -229,9 +230,7 @@ TEST_F(ConnectionTest, AHangUpIsNoticedWhileReadingIsPaused) {
 }
 
 TEST_F(ConnectionTest, WaitingRequestsOfAUserAreLimitedTogether) {
-    Limits limits;
-    limits.userWaitingBytes = 1'000'000;
-    EchoServer server(path_, limits);
+    EchoServer server(path_, {.userWaitingBytes = 1'000'000});
     Block block(server.queue());
     const Dictionary body{{"data", Data{SharedBytes(std::string(300'000, 'x'))}}};
     std::vector<std::unique_ptr<RawClient>> clients;
@@ -249,11 +248,11 @@ TEST_F(ConnectionTest, WaitingRequestsOfAUserAreLimitedTogether) {
                 answered.add();
         });
     }
-    std::this_thread::sleep_for(std::chrono::milliseconds(300));
+    settle(300);
     EXPECT_LT(written, 20);
     // Small requests of others go through all the same, as soon as the queue does.
     RawClient small(path_);
-    small.write(request(1, Dictionary{}));
+    small.write(requests(1, 1));
     block.release();
     EXPECT_TRUE(small.read());
     EXPECT_TRUE(answered.reaches(60));
@@ -273,7 +272,7 @@ bool writeFromChild(RawClient& client, std::string_view bytes) {
 TEST_F(ConnectionTest, FindsWhatOneReadLeftBehind) {
     EchoServer server(path_);
     RawClient client(path_);
-    const std::string text = request(1, Dictionary{});
+    const std::string text = requests(1, 1);
     client.write(text);
     ASSERT_TRUE(client.read());
     const auto whileTheLoopIsHeld = [&](auto&& act) {
@@ -300,18 +299,13 @@ TEST_F(ConnectionTest, FindsWhatOneReadLeftBehind) {
 }
 
 TEST_F(ConnectionTest, TellsWhoseBytesARequestIsMadeOf) {
-    EchoServer server(path_, {}, [](Connection& connection, const Message& message) {
-        Reply reply = createReply(message);
-        reply.body.set("fromPeer", message.fromPeer);
-        reply.body.set("greeted", message.greeted);
-        connection.send(reply);
-    });
+    EchoServer server(path_, {}, tellOrigin);
     RawClient client(path_);
     client.answerGreeting();
     const auto expectRequest = [&](bool fromPeer, bool greeted) {
         EXPECT_EQ(client.read()->body, (Dictionary{{"fromPeer", fromPeer}, {"greeted", greeted}}));
     };
-    const std::string text = request(1, Dictionary{});
+    const std::string text = requests(1, 1);
     const auto fromChild = [&](std::string_view part) { return writeFromChild(client, part); };
     client.write(text);
     expectRequest(true, true);

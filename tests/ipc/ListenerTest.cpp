@@ -1,17 +1,14 @@
 #include "platform/ipc/Listener.h"
 
-#include <cerrno>
 #include <string>
 #include <sys/resource.h>
-#include <sys/socket.h>
-#include <sys/stat.h>
-#include <sys/un.h>
 #include <unistd.h>
 #include <vector>
 
 #include <gtest/gtest.h>
 
 #include "tests/ipc/Harness.h"
+#include "tests/support/Files.h"
 
 namespace {
 
@@ -19,17 +16,10 @@ using namespace platform;
 using namespace platform::ipc;
 using namespace tests;
 
-void ignoreEvents(const ListenerEvent&) {}
-
 class ListenerTest : public testing::Test {
 protected:
     [[nodiscard]] auto listen(const std::string& path) {
-        return Listener::create(loop_, path, ignoreEvents);
-    }
-
-    [[nodiscard]] unsigned modeOf(const std::string& path) {
-        struct stat status{};
-        return ::stat(path.c_str(), &status) == 0 ? status.st_mode & 07777U : 0;
+        return Listener::create(loop_, path, [](const ListenerEvent&) {});
     }
 
     TestFolder folder_;
@@ -37,9 +27,8 @@ protected:
 };
 
 TEST_F(ListenerTest, MakesFolderAndSocketForEverybody) {
-    const ::mode_t before = ::umask(077);
+    const Umask umask(077);
     const auto listener = listen(folder_ / "run/service");
-    ::umask(before);
     ASSERT_TRUE(listener) << describe(listener.error());
     EXPECT_EQ(modeOf(folder_ / "run"), 0755U);
     EXPECT_EQ(modeOf(folder_ / "run/service"), 0666U);
@@ -47,9 +36,9 @@ TEST_F(ListenerTest, MakesFolderAndSocketForEverybody) {
 
 TEST_F(ListenerTest, WhatIsNoSocketIsLeftAlone) {
     const std::string path = folder_ / "service";
-    ASSERT_FALSE(writeFileAtomically(path, "precious"));
+    folder_.write("service", "precious");
     EXPECT_FALSE(listen(path));
-    EXPECT_EQ(readRegularFile(path, 100)->bytes, "precious");
+    EXPECT_EQ(contentOf(path), "precious");
 }
 
 TEST_F(ListenerTest, CancelRemovesTheSocketAndIsTheLastEvent) {
