@@ -7,7 +7,7 @@
 #include <utility>
 #include <vector>
 
-#include "platform/ipc/Utf8.h"
+#include "platform/value/Utf8.h"
 
 namespace platform::ipc {
 

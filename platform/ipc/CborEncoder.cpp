@@ -5,7 +5,7 @@
 #include <limits>
 
 #include "platform/ipc/Cbor.h"
-#include "platform/ipc/Utf8.h"
+#include "platform/value/Utf8.h"
 
 namespace platform::ipc {
 

@@ -3,8 +3,6 @@
 #include <bit>
 #include <cmath>
 
-#include "platform/plist/Utf8.h"
-
 namespace platform::plist {
 
 namespace {
@@ -18,6 +16,29 @@ std::optional<Value> wideInteger(std::string_view bytes) {
     if (high == ~std::uint64_t{0} && asSigned < 0)
         return Value(asSigned);
     return std::nullopt;
+}
+
+char continuation(char32_t bits) {
+    return static_cast<char>(0x80 | (bits & 0x3f));
+}
+
+// In UTF-8. REQUIRES: a valid scalar value
+void appendCharacter(std::string& out, char32_t character) {
+    if (character < 0x80) {
+        out += static_cast<char>(character);
+    } else if (character < 0x800) {
+        out += static_cast<char>(0xc0 | (character >> 6));
+        out += continuation(character);
+    } else if (character < 0x10000) {
+        out += static_cast<char>(0xe0 | (character >> 12));
+        out += continuation(character >> 6);
+        out += continuation(character);
+    } else {
+        out += static_cast<char>(0xf0 | (character >> 18));
+        out += continuation(character >> 12);
+        out += continuation(character >> 6);
+        out += continuation(character);
+    }
 }
 
 bool isHighSurrogate(char32_t unit) {

@@ -5,7 +5,7 @@
 #include "platform/plist/PropertyList.h"
 #include "platform/plist/Readers.h"
 #include "platform/plist/TextForms.h"
-#include "platform/plist/Utf8.h"
+#include "platform/value/Utf8.h"
 
 namespace platform::plist {
 
@@ -20,6 +20,16 @@ constexpr std::string_view footer = "</plist>\n";
 constexpr std::size_t deepestIndent = 8;
 
 // ---- What can be written
+
+bool isControl(char c) {
+    return static_cast<unsigned char>(c) < 0x20 && c != '\t' && c != '\n' && c != '\r';
+}
+
+// Production 2 (Char) of XML 1.0: besides controls it forbids U+FFFE and U+FFFF.
+bool isXmlText(std::string_view text) {
+    return isUtf8(text) && std::ranges::none_of(text, isControl) &&
+           !text.contains("\xef\xbf\xbe") && !text.contains("\xef\xbf\xbf");
+}
 
 const char* objectionTo(std::string_view text) {
     return isXmlText(text) ? nullptr : "text with a character that XML cannot hold";

@@ -1,10 +1,10 @@
-#include "platform/ipc/Utf8.h"
+#include "platform/value/Utf8.h"
 
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
 
-namespace platform::ipc {
+namespace platform {
 
 namespace {
 
@@ -90,4 +90,4 @@ std::string repairedUtf8(std::string_view text) {
     return repaired;
 }
 
-} // namespace platform::ipc
+} // namespace platform
