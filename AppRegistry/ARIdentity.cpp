@@ -21,13 +21,8 @@ std::optional<SharedBytes> textEntry(const Dictionary& info, const char* key) {
     return text ? std::optional(*text) : std::nullopt;
 }
 
-const Dictionary* declarationOf(const Dictionary& info) {
-    const Value* extension = info.find(platform::InfoKey::extension);
-    return extension ? extension->dictionary() : nullptr;
-}
-
 std::optional<SharedBytes> plugInIdentifier(const Dictionary& info) {
-    if (const Dictionary* declaration = declarationOf(info)) {
+    if (const Dictionary* declaration = info.findDictionary(platform::InfoKey::extension)) {
         if (auto own = textEntry(*declaration, platform::InfoKey::extensionIdentifier))
             return own;
     }
@@ -56,7 +51,7 @@ std::optional<SharedBytes> identifierOf(ARKind kind, std::string_view path,
 Dictionary ARReportedInfo(ARKind kind, Dictionary info) {
     if (kind != ARKind::plugIn || info.contains(platform::InfoKey::extensionPoint))
         return info;
-    const Dictionary* declaration = declarationOf(info);
+    const Dictionary* declaration = info.findDictionary(platform::InfoKey::extension);
     const Value* point =
         declaration ? declaration->find(platform::InfoKey::extensionPoint) : nullptr;
     if (point)

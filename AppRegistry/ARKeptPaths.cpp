@@ -7,7 +7,6 @@
 #include "AppRegistry/ARModel.h"
 #include "platform/file/File.h"
 #include "platform/file/OwnershipTest.h"
-#include "platform/ipc/Utf8.h"
 #include "platform/plist/PropertyList.h"
 
 using platform::Array;
@@ -29,9 +28,7 @@ constexpr unsigned fileMode = 0644;
 // As text where a property list can hold it; any other bytes can be a path too.
 Value valueOf(const std::string& path) {
     const Value text(path);
-    if (platform::ipc::isUtf8(path) && platform::plist::writeXml(text))
-        return text;
-    return Data{SharedBytes(path)};
+    return platform::plist::objectionToXml(text) ? Value(Data{SharedBytes(path)}) : text;
 }
 
 Value valueOf(const std::vector<std::string>& paths) {
@@ -42,11 +39,11 @@ Value valueOf(const std::vector<std::string>& paths) {
 }
 
 std::optional<std::vector<std::string>> pathsIn(const Dictionary& content, const char* key) {
-    const Value* const value = content.find(key);
-    if (!value || !value->array())
+    const Array* const values = content.findArray(key);
+    if (!values)
         return std::nullopt;
     std::vector<std::string> paths;
-    for (const Value& each : *value->array()) {
+    for (const Value& each : *values) {
         const auto text = each.data() ? each.data()->bytes.view() : each.string().value_or("");
         if (!text.starts_with('/'))
             return std::nullopt;

@@ -27,12 +27,11 @@ std::optional<std::string_view> operandOfEquality(std::string_view pattern) {
 }
 
 const Value* ruleValueOf(const platform::Dictionary& info) {
-    const Value* extension = info.find(platform::InfoKey::extension);
-    const auto* declaration = extension ? extension->dictionary() : nullptr;
-    const Value* attributes =
-        declaration ? declaration->find(platform::InfoKey::attributes) : nullptr;
-    if (attributes && attributes->dictionary()) {
-        if (const Value* found = attributes->dictionary()->find(platform::InfoKey::extensionPoint))
+    const auto* declaration = info.findDictionary(platform::InfoKey::extension);
+    const auto* attributes =
+        declaration ? declaration->findDictionary(platform::InfoKey::attributes) : nullptr;
+    if (attributes) {
+        if (const Value* found = attributes->find(platform::InfoKey::extensionPoint))
             return found;
     }
     return info.find(platform::InfoKey::extensionPoint);

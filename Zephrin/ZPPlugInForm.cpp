@@ -21,8 +21,7 @@ std::optional<std::string> textEntry(const Dictionary& form, std::string_view ke
 }
 
 std::optional<Dictionary> dictionaryEntry(const Dictionary& form, std::string_view key) {
-    const Value* const value = form.find(key);
-    const Dictionary* const found = value ? value->dictionary() : nullptr;
+    const Dictionary* const found = form.findDictionary(key);
     return found ? std::optional(*found) : std::nullopt;
 }
 

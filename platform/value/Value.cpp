@@ -119,6 +119,16 @@ const Value* Dictionary::find(std::string_view key) const noexcept {
     return found != end() && found->key.view() == key ? &found->value : nullptr;
 }
 
+const Array* Dictionary::findArray(std::string_view key) const noexcept {
+    const Value* const value = find(key);
+    return value ? value->array() : nullptr;
+}
+
+const Dictionary* Dictionary::findDictionary(std::string_view key) const noexcept {
+    const Value* const value = find(key);
+    return value ? value->dictionary() : nullptr;
+}
+
 std::vector<DictionaryEntry>& Dictionary::unshared() {
     if (!entries_) {
         entries_ = std::make_shared<std::vector<DictionaryEntry>>();

@@ -74,6 +74,9 @@ public:
     [[nodiscard]] const DictionaryEntry* begin() const noexcept;
     [[nodiscard]] const DictionaryEntry* end() const noexcept;
     [[nodiscard]] const Value* find(std::string_view key) const noexcept;
+    // The same for a value that must be of this type; another counts as absent.
+    [[nodiscard]] const Array* findArray(std::string_view key) const noexcept;
+    [[nodiscard]] const Dictionary* findDictionary(std::string_view key) const noexcept;
 
     [[nodiscard]] bool contains(std::string_view key) const noexcept { return find(key); }
 

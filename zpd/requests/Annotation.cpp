@@ -37,8 +37,7 @@ Dictionary extending(const Value& extension) {
 } // namespace
 
 const Dictionary* Transaction::requestedAnnotations() {
-    const Value* const value = request().find("annotations");
-    const Dictionary* const annotations = value ? value->dictionary() : nullptr;
+    const Dictionary* const annotations = request().findDictionary("annotations");
     if (!annotations) {
         fail(ZPDErrorCode::invalidRequest, "invalid request format (bad annotations dictionary)");
     }

@@ -13,8 +13,6 @@
 #include "zpd/ZPDIpcClient.h"
 #include "zpd/ZPDServer.h"
 
-using platform::Value;
-
 void Transaction::addPlugIns() {
     processPaths(server().registrationQueue(), [this](const std::string& path, bool resolved) {
         return addPlugIn(path, resolved);
@@ -65,8 +63,7 @@ bool Transaction::removePlugIn(const RemovalRight& right, const std::string& pat
 
 // False when the walk ends before its first path.
 bool Transaction::hasPathToWalk() const {
-    const Value* const value = request().find("paths");
-    const platform::Array* const paths = value ? value->array() : nullptr;
+    const platform::Array* const paths = request().findArray("paths");
     if (!paths || paths->empty())
         return false;
     const auto first = paths->begin()->string();
