@@ -129,7 +129,18 @@ private:
     void route();
     // Nothing when the transaction has failed.
     [[nodiscard]] const platform::Array* requestedPaths();
-    void processPathsFrom(std::size_t first, platform::SerialQueue& queue, PathBlock block);
+
+    // A list that is walked on some queue: whether to go on after each step, and whether the walk
+    // came to the list's end.
+    struct Walk {
+        std::size_t count;
+        std::function<bool(std::size_t index)> step;
+        std::function<void(bool whole)> finish;
+    };
+
+    // However long the list, whoever else has work for that queue gets a turn in between. The
+    // transaction is kept meanwhile.
+    void takeTurns(platform::SerialQueue& queue, std::size_t first, Walk walk);
     [[nodiscard]] bool marshalPath(const platform::Value& entry, const PathBlock& block);
     void send(const platform::ipc::Reply& reply);
 
@@ -165,7 +176,6 @@ private:
     [[nodiscard]] std::optional<platform::Uuid> listedUuid(const platform::Value& entry);
     [[nodiscard]] std::shared_ptr<ZPDPlugIn>
     listedPlugIn(const platform::Uuid& uuid, const platform::Value* path, std::size_t index) const;
-    void followListedPathsFrom(std::size_t first, std::function<void()> then);
     [[nodiscard]] bool followListedPath(std::size_t index);
 
     // ---- zpd/requests/Annotation.cpp

@@ -13,8 +13,7 @@
 using platform::Value;
 
 const platform::Array* Transaction::requestedPaths() {
-    const Value* const value = request().find("paths");
-    const platform::Array* const paths = value ? value->array() : nullptr;
+    const platform::Array* const paths = request().findArray("paths");
     if (!paths)
         fail(ZPDErrorCode::invalidRequest, "invalid request format");
     return paths;
@@ -42,27 +41,29 @@ bool Transaction::marshalPath(const Value& entry, const PathBlock& block) {
 }
 
 void Transaction::processPaths(platform::SerialQueue& queue, PathBlock block) {
-    leaveOpen();
-    queue.async([self = shared_from_this(), &queue, walk = std::move(block)]() mutable {
-        self->processPathsFrom(0, queue, std::move(walk));
-    });
-}
-
-void Transaction::processPathsFrom(std::size_t first, platform::SerialQueue& queue,
-                                   PathBlock block) {
-    const auto end = std::chrono::steady_clock::now() + longestTurn;
     const platform::Array* const paths = requestedPaths();
     if (!paths)
         return;
-    for (std::size_t next = first; next < paths->size(); ++next) {
-        if (next > first && std::chrono::steady_clock::now() >= end) {
-            return queue.async(
-                [self = shared_from_this(), next, &queue, walk = std::move(block)]() mutable {
-                    self->processPathsFrom(next, queue, std::move(walk));
-                });
+    leaveOpen();
+    const auto step = [this, paths, block = std::move(block)](std::size_t index) {
+        return marshalPath((*paths)[index], block);
+    };
+    const auto finish = [this](bool whole) {
+        if (whole)
+            done();
+    };
+    takeTurns(queue, 0, {paths->size(), step, finish});
+}
+
+void Transaction::takeTurns(platform::SerialQueue& queue, std::size_t first, Walk walk) {
+    queue.async([self = shared_from_this(), &queue, first, walk = std::move(walk)]() mutable {
+        const auto end = std::chrono::steady_clock::now() + longestTurn;
+        for (std::size_t next = first; next < walk.count; ++next) {
+            if (next > first && std::chrono::steady_clock::now() >= end)
+                return self->takeTurns(queue, next, std::move(walk));
+            if (!walk.step(next))
+                return walk.finish(false);
         }
-        if (!marshalPath((*paths)[next], block))
-            return;
-    }
-    done();
+        walk.finish(true);
+    });
 }

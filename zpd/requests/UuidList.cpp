@@ -2,7 +2,6 @@
 // registered anew, and so have another UUID, since the client looked.
 
 #include <algorithm>
-#include <chrono>
 #include <utility>
 
 #include "AppRegistry/ARApplicationWorkspace.h"
@@ -20,14 +19,9 @@ using platform::Value;
 
 namespace {
 
-const Array* arrayIn(const Dictionary& request, std::string_view key) {
-    const Value* const value = request.find(key);
-    return value ? value->array() : nullptr;
-}
-
 struct Lists {
     explicit Lists(const Dictionary& request)
-        : uuids(arrayIn(request, "uuids")), paths(arrayIn(request, "paths")) {}
+        : uuids(request.findArray("uuids")), paths(request.findArray("paths")) {}
 
     // Whether there are paths for the UUIDs.
     [[nodiscard]] bool usable() const { return uuids && paths && uuids->size() == paths->size(); }
@@ -57,7 +51,7 @@ const Array* pathsBeside(const Array& uuids, const Dictionary& request) {
 
 bool Transaction::processUuidList(const PlugInBlock& block) {
     server().assertOnServiceQueue();
-    const Array* const uuids = arrayIn(request(), "uuids");
+    const Array* const uuids = request().findArray("uuids");
     if (!uuids) {
         fail(ZPDErrorCode::invalidRequest, "invalid request format (uuid)");
         return false;
@@ -121,26 +115,11 @@ void Transaction::followListedPaths(std::function<void()> then) {
     if (!lists.usable() || std::ranges::all_of(*lists.uuids, isKnown))
         return then();
     leaveOpen();
-    server().registrationQueue().async(
-        [self = shared_from_this(), then = std::move(then)]() mutable {
-            self->followListedPathsFrom(0, std::move(then));
-        });
-}
-
-void Transaction::followListedPathsFrom(std::size_t first, std::function<void()> then) {
-    const auto end = std::chrono::steady_clock::now() + longestTurn;
-    const std::size_t count = Lists(request()).uuids->size();
-    for (std::size_t next = first; next < count; ++next) {
-        if (next > first && std::chrono::steady_clock::now() >= end) {
-            return server().registrationQueue().async(
-                [self = shared_from_this(), next, then = std::move(then)]() mutable {
-                    self->followListedPathsFrom(next, std::move(then));
-                });
-        }
-        if (!followListedPath(next))
-            break;
-    }
-    server().submitWork([self = shared_from_this(), then = std::move(then)] { then(); });
+    const auto step = [this](std::size_t index) { return followListedPath(index); };
+    const auto finish = [this, then = std::move(then)](bool) {
+        server().submitWork([self = shared_from_this(), then] { then(); });
+    };
+    takeTurns(server().registrationQueue(), 0, {lists.uuids->size(), step, finish});
 }
 
 // False where the walk will end.
