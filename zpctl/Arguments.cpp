@@ -1,12 +1,19 @@
 #include "zpctl/Arguments.h"
 
+#include <CLI/CLI.hpp>
+
 #include "platform/file/File.h"
 #include "platform/value/Uuid.h"
 
 namespace zpctl {
 
-std::string complaintAboutUuid(const std::string& text) {
-    return platform::Uuid::parse(text) ? std::string() : "not a UUID: " + text;
+void addPlugInArgument(CLI::App& command, std::string& uuid) {
+    command.add_option("plug-in", uuid, "The plug-in's registration UUID")
+        ->type_name("UUID")
+        ->required()
+        ->check([](const std::string& text) {
+            return platform::Uuid::parse(text) ? std::string() : "not a UUID: " + text;
+        });
 }
 
 std::string complaintAboutEmpty(const std::string& text) {

@@ -2,10 +2,15 @@
 
 #include <string>
 
+namespace CLI {
+class App;
+}
+
 namespace zpctl {
 
-// What is wrong with a text that should be a plug-in's UUID, for the option parser; empty for none.
-[[nodiscard]] std::string complaintAboutUuid(const std::string& text);
+// Has the command take the UUID of a plug-in as its next argument, which must be one. `uuid` stays
+// as long as the command.
+void addPlugInArgument(CLI::App& command, std::string& uuid);
 
 // The same for a path, or a name: an empty one would mean the current folder, or nothing.
 [[nodiscard]] std::string complaintAboutEmpty(const std::string& text);

@@ -24,19 +24,6 @@ std::string reason(const std::string& path) {
     return path + ": " + std::generic_category().message(errno);
 }
 
-bool writeAll(int file, const char* bytes, std::size_t size) {
-    while (size > 0) {
-        const ssize_t written = ::write(file, bytes, size);
-        if (written < 0 && errno == EINTR)
-            continue;
-        if (written < 0)
-            return false;
-        bytes += written;
-        size -= static_cast<std::size_t>(written);
-    }
-    return true;
-}
-
 // On failure errno tells, of whichever of the two files.
 bool copyBytes(int from, int to) {
     constexpr std::size_t roomSize = std::size_t{256} << 10;
@@ -47,7 +34,7 @@ bool copyBytes(int from, int to) {
             continue;
         if (got <= 0)
             return got == 0;
-        if (!writeAll(to, room.get(), static_cast<std::size_t>(got)))
+        if (!platform::writeAll(to, {room.get(), static_cast<std::size_t>(got)}))
             return false;
     }
 }

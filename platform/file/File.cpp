@@ -137,6 +137,18 @@ std::expected<FileContent, Error> readOpenFile(int file, const std::string& path
     return content;
 }
 
+bool writeAll(int file, std::string_view bytes) {
+    while (!bytes.empty()) {
+        const ssize_t written = ::write(file, bytes.data(), bytes.size());
+        if (written < 0 && errno == EINTR)
+            continue;
+        if (written < 0)
+            return false;
+        bytes.remove_prefix(static_cast<std::size_t>(written));
+    }
+    return true;
+}
+
 std::expected<std::string, int> canonicalPath(std::string_view path) {
     if (hasNul(path))
         return std::unexpected(ENOENT);

@@ -78,6 +78,9 @@ struct FileContent {
 [[nodiscard]] std::expected<FileContent, Error> readOpenFile(int file, const std::string& path,
                                                              std::size_t largest);
 
+// Writes all of it. False when the system refuses, errno tells why; some may be written then.
+[[nodiscard]] bool writeAll(int file, std::string_view bytes);
+
 // Replaces `path` by a complete new file of exactly this mode: written beside it under a name that
 // begins with a dot, synced, renamed, folder synced. On failure nothing is left beside it.
 [[nodiscard]] std::optional<Error>

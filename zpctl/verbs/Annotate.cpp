@@ -69,10 +69,7 @@ Status annotate(const Arguments& arguments, Session& session) {
 
 Action declareAnnotate(CLI::App& command) {
     const auto arguments = std::make_shared<Arguments>();
-    command.add_option("plug-in", arguments->uuid, "The plug-in's registration UUID")
-        ->type_name("UUID")
-        ->check(complaintAboutUuid)
-        ->required();
+    addPlugInArgument(command, arguments->uuid);
     command.add_option("file", arguments->file, "Property list with the annotation")
         ->type_name("FILE.plist")
         ->required();

@@ -63,10 +63,7 @@ Status elect(const Arguments& arguments, Session& session) {
 
 Action declareElect(CLI::App& command) {
     const auto arguments = std::make_shared<Arguments>();
-    command.add_option("plug-in", arguments->uuid, "The plug-in's registration UUID")
-        ->type_name("UUID")
-        ->check(complaintAboutUuid)
-        ->required();
+    addPlugInArgument(command, arguments->uuid);
     command.add_option("choice", arguments->choice, "The choice")
         ->type_name("on|off|default")
         ->check([](const std::string& word) {
