@@ -2,7 +2,6 @@
 #include <csignal>
 #include <cstring>
 #include <fcntl.h>
-#include <filesystem>
 #include <sched.h>
 #include <sys/inotify.h>
 #include <sys/mount.h>
@@ -17,9 +16,6 @@
 namespace e2e {
 namespace {
 
-namespace fs = std::filesystem;
-
-const std::vector<std::string> identifiers = {"a", "b", "c"};
 constexpr int pipelined = 200;
 
 // What is left beside the store.
@@ -53,13 +49,10 @@ public:
     // Since it was asked last.
     int count() const {
         int events = 0;
-        alignas(inotify_event) char room[4096];
-        for (ssize_t size = 0; (size = read(fd_, room, sizeof room)) > 0;) {
-            for (const char* at = room; at < room + size; ++events) {
-                const auto* const event = reinterpret_cast<const inotify_event*>(at);
-                at += sizeof(inotify_event) + event->len;
-            }
-        }
+        // Just enough for one event, with the name of the store.
+        alignas(inotify_event) char room[sizeof(inotify_event) + 16];
+        while (read(fd_, room, sizeof room) > 0)
+            ++events;
         return events;
     }
 
@@ -67,66 +60,69 @@ private:
     int fd_;
 };
 
-// Requests of one client, all at once, each with another number for one of the plug-ins.
-class Flood {
-public:
-    Flood(AnnotatedHome& world, int first) : client_(*world.client) {
-        for (int i = 0; i < pipelined; ++i) {
-            const std::string& identifier = identifiers[static_cast<std::size_t>(i) % 3];
-            asked_[client_.post(world.annotating(identifier, numbered(first + i)))] = {identifier,
-                                                                                       first + i};
+class AnnotationSaving : public AnnotationTest {
+protected:
+    // Requests of one client, all at once, each with another number for one of the plug-ins.
+    class Flood {
+    public:
+        Flood(AnnotationSaving& test, int first) : client_(*test.client) {
+            for (int i = 0; i < pipelined; ++i) {
+                const std::string identifier(1, "abc"[i % 3]);
+                const Item request = test.annotating(identifier, numbered(first + i));
+                asked_[client_.post(request)] = {identifier, first + i};
+            }
         }
+
+        // False when no reply comes any more.
+        bool hear() {
+            const auto frame = client_.receive();
+            if (!frame)
+                return false;
+            const auto& [identifier, number] = asked_.at(frame->id);
+            acknowledged[identifier] = std::max(acknowledged[identifier], number);
+            return true;
+        }
+
+        std::map<std::string, int> acknowledged; // the last number of each plug-in
+
+    private:
+        WireClient& client_;
+        std::map<std::uint64_t, std::pair<std::string, int>> asked_;
+    };
+
+    [[nodiscard]] int current(const std::string& identifier) {
+        return static_cast<int>(annotations().at(identifier)["extension"]["number"].number());
     }
-
-    // False when no reply comes any more.
-    bool hear() {
-        const auto frame = client_.receive();
-        if (!frame)
-            return false;
-        const auto& [identifier, number] = asked_.at(frame->id);
-        acknowledged[identifier] = std::max(acknowledged[identifier], number);
-        return true;
-    }
-
-    std::map<std::string, int> acknowledged; // the last number of each plug-in
-
-private:
-    WireClient& client_;
-    std::map<std::uint64_t, std::pair<std::string, int>> asked_;
 };
 
-TEST(AnnotationSaving, KeepsWhatWasAcknowledgedWhenTheDaemonIsKilled) {
+TEST_F(AnnotationSaving, KeepsWhatWasAcknowledgedWhenTheDaemonIsKilled) {
     constexpr int rounds = 50;
-    AnnotatedHome world(identifiers);
     int number = 1;
     for (int round = 0; round < rounds; ++round, number += pipelined) {
         const int signal = round % 10 == 9 ? SIGTERM : SIGKILL;
-        Flood flood(world, number);
+        Flood flood(*this, number);
         for (int heard = 0; heard < round && flood.hear();)
             ++heard;
         std::this_thread::sleep_for(std::chrono::microseconds(round % 7 * 50));
-        world.daemon->program().signal(signal);
+        daemon->program().signal(signal);
         while (flood.hear()) {}
-        EXPECT_EQ(world.daemon->program().exitStatus(), signal == SIGTERM ? 0 : 128 + SIGKILL);
+        EXPECT_EQ(daemon->program().exitStatus(), signal == SIGTERM ? 0 : 128 + SIGKILL);
         if (signal == SIGTERM) {
-            EXPECT_EQ(unfinishedFiles(world.home.path()), 0U);
+            EXPECT_EQ(unfinishedFiles(home.path()), 0U);
         }
-        world.restart();
-        const auto kept = world.annotations();
+        start();
         for (const auto& [identifier, acknowledged] : flood.acknowledged) {
-            const auto found = kept.at(identifier)["extension"]["number"].number();
-            EXPECT_GE(found, static_cast<std::uint64_t>(acknowledged)) << identifier;
-            EXPECT_LT(found, static_cast<std::uint64_t>(number + pipelined)) << identifier;
+            EXPECT_GE(current(identifier), acknowledged) << identifier;
+            EXPECT_LT(current(identifier), number + pipelined) << identifier;
         }
-        EXPECT_EQ(unfinishedFiles(world.home.path()), 0U);
+        EXPECT_EQ(unfinishedFiles(home.path()), 0U);
     }
-    EXPECT_EQ(world.daemon->linesWith("unable to load annotation database"), 0U);
+    EXPECT_EQ(daemon->linesWith("unable to load annotation database"), 0U);
 }
 
-TEST(AnnotationSaving, OneSaveServesAllWhoWait) {
-    AnnotatedHome world(identifiers);
-    const Replacements saves(world.home.path());
-    Flood flood(world, 1);
+TEST_F(AnnotationSaving, OneSaveServesAllWhoWait) {
+    const Replacements saves(home.path());
+    Flood flood(*this, 1);
     for (int i = 0; i < pipelined; ++i)
         ASSERT_TRUE(flood.hear());
     const int count = saves.count();
@@ -134,32 +130,27 @@ TEST(AnnotationSaving, OneSaveServesAllWhoWait) {
     EXPECT_LT(count, pipelined / 2);
     EXPECT_EQ(flood.acknowledged.at("b"), pipelined);
 
-    (void)world.client->request(world.annotating("b", numbered(pipelined)));
+    (void)client->request(annotating("b", numbered(pipelined)));
     EXPECT_EQ(saves.count(), 0) << "nothing changed";
-    Item every = world.annotating("a", numbered(5000));
-    Item uuids = Item::array({});
-    for (const std::string& identifier : identifiers)
-        uuids.append(Item::uuid(world.uuids.at(identifier)));
-    (void)world.client->request(every.set("uuids", uuids));
+    Item every = annotating("a", numbered(5000));
+    (void)client->request(every.set("uuids", Item::array({uuid("a"), uuid("b"), uuid("c")})));
     EXPECT_EQ(saves.count(), 1);
 }
 
-TEST(AnnotationSaving, DiscoveriesWaitForTheElectionsThatTheyMake) {
-    const Home home;
+using AutoElection = DaemonTest;
+
+TEST_F(AutoElection, IsSavedBeforeTheDiscoveryIsAnswered) {
     const Signer signer(home);
-    const std::string app = home.addApp("Some");
-    for (const std::string& identifier : identifiers) {
-        signer.sign(addPlugIn(app, identifier, {.identifier = identifier}),
-                    Item::map({{"com.tovana.developer.auto-elect-plugin", true}}));
-    }
-    const Daemon daemon(home.path());
-    WireClient client = daemon.connect();
+    const std::string app = home.addAppWithPlugIns("Some", {"a", "b", "c"});
+    for (const auto& plugIn : fs::directory_iterator(app + "/PlugIns"))
+        signer.sign(plugIn.path(), Item::map({{"com.tovana.developer.auto-elect-plugin", true}}));
+    start();
     const Replacements saves(home.path());
-    EXPECT_EQ(matched(client, Item::map({{"HXUserElection", "1"}})), "a b c");
-    EXPECT_EQ(saves.count(), 1);
-    EXPECT_TRUE(readFile(home / "annotations").contains("<key>c</key>"));
-    EXPECT_EQ(matched(client, Item::map({{"HXUserElection", "1"}})), "a b c");
-    EXPECT_EQ(saves.count(), 0);
+    for (const int expected : {1, 0}) {
+        EXPECT_EQ(seen(Item::map({{"HXUserElection", "1"}})), "a b c");
+        EXPECT_EQ(saves.count(), expected);
+        EXPECT_TRUE(readFile(home / "annotations").contains("<key>c</key>"));
+    }
 }
 
 // A small file system that only this process and what it starts can see.
@@ -167,20 +158,16 @@ class SmallDisk {
 public:
     explicit SmallDisk(std::string folder) : folder_(std::move(folder)) {
         fs::create_directory(folder_);
-        ready_ = unshare(CLONE_NEWNS) == 0 &&
-                 mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0 &&
-                 mount("none", folder_.c_str(), "tmpfs", 0, "size=64k,mode=755") == 0;
-        reason_ = std::strerror(errno);
+        if (unshare(CLONE_NEWNS) != 0 ||
+            mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0 ||
+            mount("none", folder_.c_str(), "tmpfs", 0, "size=64k,mode=755") != 0)
+            trouble = std::strerror(errno);
     }
 
     SmallDisk(const SmallDisk&) = delete;
     SmallDisk& operator=(const SmallDisk&) = delete;
 
     ~SmallDisk() { umount2(folder_.c_str(), MNT_DETACH); }
-
-    [[nodiscard]] bool ready() const { return ready_; }
-
-    [[nodiscard]] const std::string& reason() const { return reason_; }
 
     bool fill() const {
         const int file = open(filler().c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600);
@@ -199,6 +186,8 @@ public:
 
     bool makeWritable() const { return remount(0); }
 
+    std::string trouble; // why there is none
+
 private:
     [[nodiscard]] std::string filler() const { return folder_ + "/filler"; }
 
@@ -207,16 +196,13 @@ private:
     }
 
     std::string folder_;
-    bool ready_ = false;
-    std::string reason_;
 };
 
-TEST(AnnotationSaving, OutlivesADiskThatIsFullOrReadOnly) {
-    AnnotatedHome world(identifiers);
-    const SmallDisk disk(world.home / "disk");
-    if (!disk.ready())
-        GTEST_SKIP() << "cannot mount a file system here: " << disk.reason();
-    const std::string file = world.home / "disk/annotations";
+TEST_F(AnnotationSaving, OutlivesADiskThatIsFullOrReadOnly) {
+    const SmallDisk disk(home / "disk");
+    if (!disk.trouble.empty())
+        GTEST_SKIP() << "cannot mount a file system here: " << disk.trouble;
+    const std::string file = home / "disk/annotations";
     const Daemon::Options options{.arguments = {"-d", file}};
 
     const struct {
@@ -233,14 +219,9 @@ TEST(AnnotationSaving, OutlivesADiskThatIsFullOrReadOnly) {
     int number = 1;
     for (const auto& each : cases) {
         SCOPED_TRACE(each.name);
-        const auto annotate = [&](int value) {
-            return errorOf(world.client->request(world.annotating("a", numbered(value))));
-        };
-        const auto current = [&] {
-            return world.annotations().at("a")["extension"]["number"].number();
-        };
-        writeFile(world.home / "zpd.log", "");
-        world.restart(options);
+        const auto annotate = [&](int value) { return answer(annotating("a", numbered(value))); };
+        writeFile(home / "zpd.log", "");
+        start(options);
         EXPECT_EQ(annotate(number), "");
         const std::string good = readFile(file);
         EXPECT_TRUE(good.contains(stored(number))) << good;
@@ -248,24 +229,24 @@ TEST(AnnotationSaving, OutlivesADiskThatIsFullOrReadOnly) {
         ASSERT_TRUE(each.spoil());
         EXPECT_EQ(annotate(number + 1), "");
         EXPECT_TRUE(
-            world.daemon->logs("ops error: unable to save annotations:file://" + file + " error:"));
-        EXPECT_EQ(current(), static_cast<std::uint64_t>(number) + 1) << "memory stands";
+            daemon->logs("ops error: unable to save annotations:file://" + file + " error:"));
+        EXPECT_EQ(current("a"), number + 1) << "memory stands";
         EXPECT_EQ(readFile(file), good);
         for (int i = 0; i < 5; ++i) {
-            Flood flood(world, number + 100);
+            Flood flood(*this, number + 100);
             (void)flood.hear();
-            world.restart(options);
-            EXPECT_EQ(current(), static_cast<std::uint64_t>(number));
+            start(options);
+            EXPECT_EQ(current("a"), number);
         }
         EXPECT_EQ(annotate(number + 2), "");
         EXPECT_EQ(readFile(file), good);
 
         ASSERT_TRUE(each.mend());
-        const Item next = each.again ? world.annotating("a", numbered(number + 2))
-                                     : world.annotating("b", Item::map({{"election", number}}));
-        EXPECT_EQ(errorOf(world.client->request(next)), "");
+        EXPECT_EQ(answer(each.again ? annotating("a", numbered(number + 2))
+                                    : annotating("b", Item::map({{"election", number}}))),
+                  "");
         EXPECT_TRUE(readFile(file).contains(stored(number + 2))) << "the next request saves all";
-        EXPECT_EQ(unfinishedFiles(world.home / "disk"), 0U);
+        EXPECT_EQ(unfinishedFiles(home / "disk"), 0U);
         number += 10;
     }
 }

@@ -2,39 +2,30 @@
 
 namespace e2e {
 
-AnnotatedHome::AnnotatedHome(const std::vector<std::string>& identifiers) {
-    const std::string app = home.addApp("Some");
-    for (const std::string& identifier : identifiers)
-        addPlugIn(app, identifier, {.identifier = identifier});
-    restart();
-    for (const Item& form : match(*client, Item::map({})))
+AnnotationTest::AnnotationTest() {
+    home.addAppWithPlugIns("Some", {"a", "b", "c", "d"});
+    start();
+    for (const Item& form : match(*client))
         uuids[form["identifier"].text()] = form["uuid"].text();
 }
 
-void AnnotatedHome::restart(const Daemon::Options& options) {
-    daemon.reset();
-    daemon = std::make_unique<Daemon>(home.path(), options);
-    client = std::make_unique<WireClient>(daemon->connect());
-}
-
-std::string AnnotatedHome::pathOf(const std::string& identifier) const {
+std::string AnnotationTest::pathOf(const std::string& identifier) const {
     return home / ("Applications/Some.app/PlugIns/" + identifier + ".appex");
 }
 
-std::map<std::string, Item> AnnotatedHome::annotations() {
+std::map<std::string, Item> AnnotationTest::annotations() {
     std::map<std::string, Item> result;
-    for (const Item& form : match(*client, Item::map({})))
+    for (const Item& form : match(*client))
         result[form["identifier"].text()] = form["annotations"];
     return result;
 }
 
-Item AnnotatedHome::annotating(const std::string& identifier, const Item& annotation) const {
-    return envelope("annotate",
-                    Item::map({{"annotations", annotation},
-                               {"uuids", Item::array({Item::uuid(uuids.at(identifier))})}}));
+Item AnnotationTest::annotating(const std::string& identifier, const Item& annotation) const {
+    return envelope("annotate", Item::map({{"annotations", annotation},
+                                           {"uuids", Item::array({uuid(identifier)})}}));
 }
 
-std::uint64_t AnnotatedHome::notifications() const {
+std::uint64_t AnnotationTest::notifications() const {
     std::uint64_t count = 0;
     const std::string counter = readFile(home / "run/notify/com.tovana.zephrin.annotation-change");
     for (std::size_t i = counter.size(); i-- > 0;)

@@ -1,11 +1,5 @@
-#include <filesystem>
-
-#include <gtest/gtest.h>
-
-#include "tests/e2e/Daemon.h"
-#include "tests/e2e/Home.h"
-#include "tests/e2e/PlistWriter.h"
-#include "tests/e2e/Replies.h"
+#include "tests/e2e/DaemonTest.h"
+#include "tests/e2e/Signing.h"
 
 namespace e2e {
 namespace {
@@ -18,8 +12,9 @@ Item only(const char* identifier) {
     return Item::map({{"HXExtensionIdentifier", identifier}});
 }
 
-TEST(Discovery, KeepsOneRegistrationOfAnIdentifier) {
-    const Home home;
+using Discovery = DaemonTest;
+
+TEST_F(Discovery, KeepsOneRegistrationOfAnIdentifier) {
     int number = 0;
     const auto add = [&](const char* identifier, const char* version,
                          const char* folder = "Applications") {
@@ -37,16 +32,9 @@ TEST(Discovery, KeepsOneRegistrationOfAnIdentifier) {
         home, "Versionless",
         {.identifier = "none", .attributes = Item::map({{"HXExtensionVersion", Item::array({})}})});
     add("none", "9.0");
-    const Daemon daemon(home.path());
-    WireClient client = daemon.connect();
+    start();
 
-    struct Case {
-        const char* identifier;
-        unsigned flags;
-        const char* answer;
-    };
-
-    const std::vector<Case> cases = {
+    const std::tuple<const char*, unsigned, const char*> cases[] = {
         {"many", 0, "many 1.10"},
         {"many", allVersions, "many 1.10, many 1.9"},
         {"many", allDuplicates, "many 1.10"},
@@ -55,46 +43,39 @@ TEST(Discovery, KeepsOneRegistrationOfAnIdentifier) {
         {"newer", 0, "newer 2.0"},
         {"newer", systemOnly, "newer 1.0"},
         {"none", 0, "none <none>"}};
-    for (const Case& each : cases) {
-        SCOPED_TRACE(std::string(each.identifier) + " with flags " + std::to_string(each.flags));
-        EXPECT_EQ(versions(client, only(each.identifier), each.flags), each.answer);
-    }
-    const std::vector<Item> kept = match(client, only("equal"));
+    for (const auto& [identifier, flags, answer] : cases)
+        EXPECT_EQ(versions(*client, only(identifier), flags), answer) << identifier << flags;
+    const std::vector<Item> kept = match(*client, only("equal"));
     ASSERT_EQ(kept.size(), 1u);
     EXPECT_EQ(kept[0]["systemResident"], Item(true)); // preferred among equal versions
-    EXPECT_TRUE(daemon.logs("ops info: Candidate plugin count: 9, info: "));
-    EXPECT_TRUE(daemon.logs("ops info: Resulting plugin count: 1, UUIDs: "));
-    EXPECT_TRUE(daemon.logs("equal(1.0) " + kept[0]["uuid"].text()));
+    EXPECT_TRUE(daemon->logs("ops info: Candidate plugin count: 9, info: "));
+    EXPECT_TRUE(daemon->logs("ops info: Resulting plugin count: 1, UUIDs: "));
+    EXPECT_TRUE(daemon->logs("equal(1.0) " + kept[0]["uuid"].text()));
 }
 
-TEST(Discovery, LeavesOutWhatTheUserExcluded) {
-    const Home home;
-    const std::string app = home.addApp("Some");
-    for (const char* identifier : {"a", "b", "c", "d"})
-        addPlugIn(app, identifier, {.identifier = identifier});
-    const Daemon daemon(home.path());
-    WireClient client = daemon.connect();
+TEST_F(Discovery, LeavesOutWhatTheUserExcluded) {
+    home.addAppWithPlugIns("Some", {"a", "b", "c", "d"});
+    start();
     const std::string file = home / "etc/Preferences/com.tovana.zephrin.userprefs.plist";
     const auto leaves = [&](const Item& exclusions) {
         writeFile(file, xmlPlist(Item::map({{"exclusions", exclusions}})));
-        return matched(client, Item::map({}));
+        return seen();
     };
-    EXPECT_EQ(matched(client, Item::map({})), "a b c d");
+    EXPECT_EQ(seen(), "a b c d");
     EXPECT_EQ(leaves(Item::array({only("a"), "junk", only(">c")})), "b c");
-    EXPECT_TRUE(daemon.logs(" globally excluded"));
+    EXPECT_TRUE(daemon->logs(" globally excluded"));
     EXPECT_EQ(leaves(only("a")), "a b c d");
     EXPECT_EQ(leaves(Item::array({Item::map({})})), "");
     writeFile(file, "<plist>junk");
-    EXPECT_EQ(matched(client, Item::map({})), "a b c d");
+    EXPECT_EQ(seen(), "a b c d");
     writeFile(file + ".new", xmlPlist(Item::map({{"exclusions", Item::array({only("b")})}})));
-    std::filesystem::rename(file + ".new", file);
-    EXPECT_EQ(matched(client, Item::map({})), "a c d");
-    std::filesystem::remove_all(home / "etc/Preferences");
-    EXPECT_EQ(matched(client, Item::map({})), "a b c d");
+    fs::rename(file + ".new", file);
+    EXPECT_EQ(seen(), "a c d");
+    fs::remove_all(home / "etc/Preferences");
+    EXPECT_EQ(seen(), "a b c d");
 }
 
-TEST(Discovery, LeavesOutWhatThisClientMayNotUse) {
-    const Home home;
+TEST_F(Discovery, LeavesOutWhatThisClientMayNotUse) {
     const std::string app = home.addApp("Some");
     const auto add = [&](const char* identifier, const char* key, const Item& value) {
         addPlugIn(app, identifier,
@@ -104,16 +85,39 @@ TEST(Discovery, LeavesOutWhatThisClientMayNotUse) {
     add("b", "Dedicated", 1);
     add("c", "HXExtensionHostEntitlement", "com.x");
     add("d", "HXExtensionHostEntitlement", 5);
-    const std::string placeholder = home.addApp("Coming");
-    addPlugIn(placeholder, "e", {.identifier = "e"});
-    writeFile(placeholder + "/.installing", "");
-    const Daemon daemon(home.path());
-    WireClient client = daemon.connect();
-    EXPECT_EQ(matched(client, Item::map({})), "a");
-    EXPECT_TRUE(daemon.logs(": the host does not have the \"com.x\" entitlement"));
-    EXPECT_TRUE(daemon.logs("because its app is a placeholder"));
+    writeFile(home.addAppWithPlugIns("Coming", {"e"}) + "/.installing", "");
+    start();
+    EXPECT_EQ(seen(), "a");
+    EXPECT_TRUE(daemon->logs(": the host does not have the \"com.x\" entitlement"));
+    EXPECT_TRUE(daemon->logs("because its app is a placeholder"));
     // A look-up passes over what discovery filters.
-    EXPECT_EQ(findAt(client, app + "/PlugIns/b.appex")["identifier"], Item("b"));
+    EXPECT_EQ(findAt(*client, app + "/PlugIns/b.appex")["identifier"], Item("b"));
+}
+
+// Makes an application whose executable is a program of ours.
+std::string addHost(const Home& home, const std::string& name) {
+    std::string app = home.addApp(name);
+    addProgram(app + "/" + name);
+    return app;
+}
+
+TEST_F(Discovery, HidesOtherRegistrationsOfTheClientsOwnPlugIns) {
+    const std::string app = addHost(home, "Host");
+    const std::string longer = addHost(home, "Host.app2");
+    const std::string mine = addPlugIn(app, "Mine", {.identifier = "shared"});
+    const std::string theirs =
+        addAppWith(home, "Other", {.identifier = "shared", .version = "2.0"});
+    start();
+    const std::tuple<const char*, std::string, const char*, std::string> cases[] = {
+        {"a program of no bundle", addProgram(home / "probe"), "paths 0", theirs},
+        {"the application itself", app + "/Host", "paths 0", mine},
+        {"the application asking for all versions", app + "/Host", "paths 5", mine},
+        {"an application whose path begins like it", longer + "/Host.app2", "paths 0", mine}};
+    for (const auto& [what, program, question, answer] : cases) {
+        Talk talk(home, {program, daemon->socketPath(), "connect", "listen", question});
+        EXPECT_EQ(talk.hear(), answer) << what;
+    }
+    EXPECT_TRUE(daemon->logs(" @ '" + theirs + "' in favor of bundle-relative '" + mine + "'"));
 }
 
 } // namespace

@@ -1,39 +1,33 @@
-#include <gtest/gtest.h>
-
-#include "tests/e2e/Daemon.h"
-#include "tests/e2e/Home.h"
-#include "tests/e2e/Replies.h"
+#include "tests/e2e/DaemonTest.h"
 
 namespace e2e {
 namespace {
 
-struct Case {
-    const char* what;
-    Item request;
-    std::string answer; // "code text", "" for success
+class Envelope : public DaemonTest {
+protected:
+    struct Case {
+        const char* what;
+        Item request;
+        std::string answer; // "code text", "" for success
+    };
+
+    void expectAnswers(const std::vector<Case>& cases) {
+        for (const Case& each : cases)
+            EXPECT_EQ(answer(each.request), each.answer) << each.what;
+    }
 };
 
-void expectAnswers(WireClient& client, const std::vector<Case>& cases) {
-    for (const Case& each : cases) {
-        SCOPED_TRACE(each.what);
-        EXPECT_EQ(errorOf(client.request(each.request)), each.answer);
-    }
-}
-
-const char* const unsupported = "unsupported protocol version";
-
-TEST(Envelope, IsCheckedInOrder) {
-    const Home home;
-    const Daemon daemon(home.path());
-    WireClient client = daemon.connect();
+TEST_F(Envelope, IsCheckedInOrder) {
+    start();
     const auto version = [](const Item& value) {
         return Item::map({{"request", "match"}, {"version", value}});
     };
     const auto refused = [](const std::string& number) {
-        return std::string("7 ") + unsupported + " " + number + " (current 3)";
+        return "7 unsupported protocol version " + number + " (current 3)";
     };
+    const std::string missing = "4 invalid request format (missing type)";
+    const std::string unrecognized = "4 unrecognized request";
     expectAnswers(
-        client,
         {{"version 3", version(3), ""},
          {"version 2", version(2), ""},
          {"version 1", version(1), refused("1")},
@@ -48,38 +42,31 @@ TEST(Envelope, IsCheckedInOrder) {
          {"nothing at all", Item::map({}), refused("0")},
          {"the version comes before the type", Item::map({{"request", 5}, {"version", 9}}),
           refused("9")},
-         {"no type", Item::map({{"version", 3}}), "4 invalid request format (missing type)"},
-         {"type no text", Item::map({{"version", 3}, {"request", 5}}),
-          "4 invalid request format (missing type)"},
-         {"type as data", Item::map({{"version", 3}, {"request", Item::bytes("match")}}),
-          "4 invalid request format (missing type)"},
-         {"unknown type", envelope("matches"), "4 unrecognized request"},
-         {"type in capitals", envelope("Match"), "4 unrecognized request"},
-         {"empty type", envelope(""), "4 unrecognized request"},
+         {"no type", Item::map({{"version", 3}}), missing},
+         {"type no text", Item::map({{"version", 3}, {"request", 5}}), missing},
+         {"type as data", Item::map({{"version", 3}, {"request", Item::bytes("match")}}), missing},
+         {"unknown type", envelope("matches"), unrecognized},
+         {"type in capitals", envelope("Match"), unrecognized},
+         {"empty type", envelope(""), unrecognized},
          {"type with NUL", Item::map({{"version", 3}, {"request", std::string("match\0", 6)}}),
-          "4 unrecognized request"}});
-    const Item failure = client.request(envelope("nothing"));
-    EXPECT_EQ(failure, Item::map({{"errorcode", 4}, {"error", "unrecognized request"}}));
+          unrecognized}});
+    EXPECT_EQ(client->request(envelope("nothing")),
+              Item::map({{"errorcode", 4}, {"error", "unrecognized request"}}));
 }
 
-TEST(Envelope, VersionTwoGetsNoRecords) {
-    const Home home;
+TEST_F(Envelope, VersionTwoGetsNoRecords) {
     const std::string path = addAppWith(home, "Some", {});
-    const Daemon daemon(home.path());
-    WireClient client = daemon.connect();
-    for (const Item& request :
+    start();
+    for (Item request :
          {envelope("match"), findRequest(Item::map({{"paths", "file://" + path}}))}) {
-        EXPECT_TRUE(client.request(request).has("matches"));
-        Item older = request;
-        EXPECT_EQ(client.request(older.set("version", 2)), Item::map({}));
+        EXPECT_TRUE(client->request(request).has("matches"));
+        EXPECT_EQ(client->request(request.set("version", 2)), Item::map({}));
     }
 }
 
-TEST(Envelope, DiscoveryArgumentsOfOtherKinds) {
-    const Home home;
+TEST_F(Envelope, DiscoveryArgumentsOfOtherKinds) {
     addAppWith(home, "Some", {});
-    const Daemon daemon(home.path());
-    WireClient client = daemon.connect();
+    start();
     const std::string badRules = "4 invalid request format (bad rules dictionary)";
     const auto with = [](const char* key, const Item& value) {
         return envelope("match", Item::map({{key, value}}));
@@ -90,47 +77,41 @@ TEST(Envelope, DiscoveryArgumentsOfOtherKinds) {
         crowd.set("key" + std::to_string(i), "x");
         alternatives.append("x");
     }
-    expectAnswers(client, {{"rules as array", with("rules", Item::array({})), badRules},
-                           {"rules as text", with("rules", "x"), badRules},
-                           {"rules as null", with("rules", Item()), badRules},
-                           {"rules with 5000 keys", with("rules", crowd), badRules},
-                           {"rules with an array of 5000 patterns",
-                            with("rules", Item::map({{"key", alternatives}})), badRules},
-                           {"all plug-ins, by a client that may not", with("flags", 0x200),
-                            "11 unauthorized discovery flag (ZPDiscoverAll)"},
-                           {"the same with further flags", with("flags", 0x20d),
-                            "11 unauthorized discovery flag (ZPDiscoverAll)"},
-                           {"flags as real are 0", with("flags", 512.0), ""},
-                           {"flags as text are 0", with("flags", "512"), ""},
-                           {"unknown flags are ignored", with("flags", 0x10f2), ""}});
-    EXPECT_EQ(matched(client, Item::map({})), "com.example.plugin");
+    const std::string unauthorized = "11 unauthorized discovery flag (ZPDiscoverAll)";
+    expectAnswers({{"rules as array", with("rules", Item::array({})), badRules},
+                   {"rules as text", with("rules", "x"), badRules},
+                   {"rules as null", with("rules", Item()), badRules},
+                   {"rules with 5000 keys", with("rules", crowd), badRules},
+                   {"rules with an array of 5000 patterns",
+                    with("rules", Item::map({{"key", alternatives}})), badRules},
+                   {"all plug-ins, by a client that may not", with("flags", 0x200), unauthorized},
+                   {"the same with further flags", with("flags", 0x20d), unauthorized},
+                   {"flags as real are 0", with("flags", 512.0), ""},
+                   {"flags as text are 0", with("flags", "512"), ""},
+                   {"unknown flags are ignored", with("flags", 0x10f2), ""}});
+    EXPECT_EQ(seen(), "com.example.plugin");
 }
 
-TEST(Envelope, OneWayMessagesAreCarriedOutAndNotAnswered) {
-    const Home home;
-    const Daemon daemon(home.path());
-    WireClient client = daemon.connect();
-    client.post(envelope("no-answer-please"), oneWayFrame);
+TEST_F(Envelope, OneWayMessagesAreCarriedOutAndNotAnswered) {
+    start();
+    client->post(envelope("no-answer-please"), oneWayFrame);
     // The next reply is that of the request after it.
-    EXPECT_EQ(errorOf(client.request(envelope("other"))), "4 unrecognized request");
-    EXPECT_TRUE(daemon.logs("requested no-answer-please"));
+    EXPECT_EQ(answer(envelope("other")), "4 unrecognized request");
+    EXPECT_TRUE(daemon->logs("requested no-answer-please"));
 }
 
-TEST(Envelope, ClientsAreCountedInTheLog) {
-    const Home home;
-    Daemon daemon(home.path());
-    const std::string me = std::to_string(getpid());
-    {
-        WireClient client = daemon.connect();
-        for (int i = 0; i < 2001; ++i)
-            EXPECT_EQ(errorOf(client.request(envelope("x"))), "4 unrecognized request");
-    }
-    EXPECT_TRUE(daemon.logs("client " + me + " is dead"));
-    EXPECT_EQ(daemon.terminate(), 0);
-    EXPECT_GE(daemon.linesWith("new client " + me + " /"), 1u);
-    EXPECT_EQ(daemon.linesWith("client " + me + " used "), 2u);
-    EXPECT_EQ(daemon.linesWith("client " + me + " used 1000 requests so far"), 1u);
-    EXPECT_EQ(daemon.linesWith("client " + me + " used 2000 requests so far"), 1u);
+TEST_F(Envelope, ClientsAreCountedInTheLog) {
+    start();
+    const std::string me = "client " + std::to_string(getpid());
+    for (int i = 0; i < 2001; ++i)
+        EXPECT_EQ(answer(envelope("x")), "4 unrecognized request");
+    client.reset();
+    EXPECT_TRUE(daemon->logs(me + " is dead"));
+    stop();
+    EXPECT_GE(daemon->linesWith("new " + me + " /"), 1u);
+    expectLog({{me + " used ", 2},
+               {me + " used 1000 requests so far", 1},
+               {me + " used 2000 requests so far", 1}});
 }
 
 } // namespace

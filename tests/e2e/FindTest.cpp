@@ -1,35 +1,21 @@
-#include <filesystem>
-
-#include <gtest/gtest.h>
-
-#include "tests/e2e/Daemon.h"
-#include "tests/e2e/Home.h"
-#include "tests/e2e/Replies.h"
+#include "tests/e2e/DaemonTest.h"
 
 namespace e2e {
 namespace {
 
-const char* const notFound = "15 Cannot locate PlugIn";
+using Find = DaemonTest;
 
-TEST(Find, TakesAUuidOrAFileUrl) {
-    const Home home;
+TEST_F(Find, TakesAUuidOrAFileUrl) {
     const std::string path = addAppWith(home, "Some", {});
-    std::filesystem::create_symlink(path, home / "link.appex");
-    const Daemon daemon(home.path());
-    WireClient client = daemon.connect();
-    client.answerGreeting(); // others do not, and are served all the same
-    const Item uuid = Item::uuid(findAt(client, path)["uuid"].text());
+    fs::create_symlink(path, home / "link.appex");
+    start();
+    client->answerGreeting(); // others do not, and are served all the same
+    const Item uuid = Item::uuid(findAt(*client, path)["uuid"].text());
     const Item url = "file://" + path;
     const Item nowhere = "file://" + home / "Applications/None.app";
 
-    struct Case {
-        const char* what;
-        Item arguments;
-        bool found;
-    };
-
     const auto byPath = [](const std::string& text) { return Item::map({{"paths", text}}); };
-    const std::vector<Case> cases = {
+    const std::tuple<const char*, Item, bool> cases[] = {
         {"by UUID", Item::map({{"uuids", uuid}}), true},
         {"by URL", Item::map({{"paths", url}}), true},
         {"the path has the last word", Item::map({{"uuids", uuid}, {"paths", nowhere}}), false},
@@ -38,22 +24,22 @@ TEST(Find, TakesAUuidOrAFileUrl) {
         {"paths as a URL value is ignored",
          Item::map({{"uuids", uuid}, {"paths", Item::url(nowhere.text())}}), true},
         {"neither", Item::map({}), false},
-        {"UUID as text", Item::map({{"uuids", findAt(client, path)["uuid"]}}), false},
+        {"UUID as text", Item::map({{"uuids", findAt(*client, path)["uuid"]}}), false},
         {"dots in the path", byPath("file://" + path + "/../../PlugIns/./Some.appex"), true},
         {"through a link", byPath("file://" + home / "link.appex"), true},
         {"no scheme", byPath(path), false},
         {"an application", byPath("file://" + home / "Applications/Some.app"), false},
         {"NUL at the end", byPath("file://" + path + std::string(1, '\0')), false}};
-    for (const Case& each : cases) {
-        SCOPED_TRACE(each.what);
-        const Item reply = client.request(findRequest(each.arguments));
-        EXPECT_EQ(errorOf(reply), each.found ? "" : notFound);
-        if (each.found) {
+    for (const auto& [what, arguments, found] : cases) {
+        SCOPED_TRACE(what);
+        const Item reply = client->request(findRequest(arguments));
+        EXPECT_EQ(errorOf(reply), found ? "" : "15 Cannot locate PlugIn");
+        if (found) {
             EXPECT_EQ(formOf(reply)["path"], Item(path));
         }
     }
-    EXPECT_TRUE(daemon.logs("ops default: plugin found "));
-    EXPECT_TRUE(daemon.logs("ops default: plugin not found"));
+    EXPECT_TRUE(daemon->logs("ops default: plugin found "));
+    EXPECT_TRUE(daemon->logs("ops default: plugin not found"));
 }
 
 } // namespace

@@ -1,8 +1,4 @@
-#include <gtest/gtest.h>
-
-#include "tests/e2e/Daemon.h"
-#include "tests/e2e/Home.h"
-#include "tests/e2e/Replies.h"
+#include "tests/e2e/DaemonTest.h"
 
 namespace e2e {
 namespace {
@@ -29,10 +25,8 @@ Case body(const char* what, const std::string& encoded) {
 
 // A request with one more entry, whose value is given as it stands on the wire.
 Case value(const char* what, const std::string& encodedValue) {
-    Case result = body(what, head(5, 3) + encode(Item("request")) + encode(Item("match")) +
-                                 encode(Item("version")) + encode(Item(3)) + encode(Item("x")) +
-                                 encodedValue);
-    return result;
+    const std::string request = encode(envelope("match", Item::map({{"x", Item()}})));
+    return body(what, request.substr(0, request.size() - 1) + encodedValue);
 }
 
 std::string nested(std::size_t depth, const std::string& opening, const std::string& inner) {
@@ -42,42 +36,28 @@ std::string nested(std::size_t depth, const std::string& opening, const std::str
     return out + inner;
 }
 
-// The connection of each must end, with one line in the log, while another client is served.
-void expectRefused(const std::vector<Case>& cases) {
-    const Home home;
-    Daemon daemon(home.path(), {.logLevel = "default"});
-    WireClient healthy = daemon.connect();
-    const Item find = findRequest(Item::map({}));
-    std::size_t lines = daemon.log().size();
-    for (const Case& each : cases) {
-        SCOPED_TRACE(each.what);
-        WireClient client = daemon.connect();
-        client.send(each.frame.bytes());
-        EXPECT_TRUE(client.ended());
-        EXPECT_EQ(errorOf(healthy.request(find)), "15 Cannot locate PlugIn");
-        // One line about the frame and one about the "find".
-        EXPECT_TRUE(eventually([&] { return daemon.log().size() >= lines + 2; }));
-        EXPECT_EQ(daemon.log().size(), lines + 2) << daemon.log().back();
-        lines = daemon.log().size();
+class Frames : public DaemonTest {
+protected:
+    // The connection of each must end, with one line in the log, while another client is served.
+    void expectRefused(const std::vector<Case>& cases) {
+        start({.logLevel = "default"});
+        std::size_t lines = daemon->log().size();
+        for (const Case& each : cases) {
+            SCOPED_TRACE(each.what);
+            WireClient broken = daemon->connect();
+            broken.send(each.frame.bytes());
+            EXPECT_TRUE(broken.ended());
+            EXPECT_EQ(answer(findRequest(Item::map({}))), "15 Cannot locate PlugIn");
+            // One line about the frame and one about the "find".
+            EXPECT_TRUE(eventually([&] { return daemon->log().size() >= lines + 2; }));
+            EXPECT_EQ(daemon->log().size(), lines + 2) << daemon->log().back();
+            lines = daemon->log().size();
+        }
+        stop();
     }
-    EXPECT_EQ(daemon.terminate(), 0);
-}
+};
 
-void expectServed(const std::vector<Case>& cases) {
-    const Home home;
-    const Daemon daemon(home.path());
-    WireClient client = daemon.connect();
-    for (const Case& each : cases) {
-        SCOPED_TRACE(each.what);
-        client.send(each.frame.bytes());
-        const std::optional<Frame> reply = client.receive();
-        ASSERT_TRUE(reply);
-        EXPECT_EQ(reply->kind, replyFrame);
-        EXPECT_EQ(errorOf(decode(reply->body)), "");
-    }
-}
-
-TEST(Frames, WithABrokenHeaderEndTheirConnection) {
+TEST_F(Frames, WithABrokenHeaderEndTheirConnection) {
     const std::string good = encode(envelope("match"));
     expectRefused({{"no kind", {.kind = 0, .body = good}},
                    {"a reply", {.kind = replyFrame, .body = good}},
@@ -93,7 +73,7 @@ TEST(Frames, WithABrokenHeaderEndTheirConnection) {
                    {"empty", {.body = ""}}});
 }
 
-TEST(Frames, WhoseBodyIsNotOneMapEndTheirConnection) {
+TEST_F(Frames, WhoseBodyIsNotOneMapEndTheirConnection) {
     const std::string good = encode(envelope("match"));
     expectRefused(
         {body("array", encode(Item::array({}))), body("number", encode(Item(1))),
@@ -112,7 +92,7 @@ TEST(Frames, WhoseBodyIsNotOneMapEndTheirConnection) {
          body("indefinite map", bytes({0xbf, 0xff})), body("only a break", bytes({0xff}))});
 }
 
-TEST(Frames, WithAMalformedValueEndTheirConnection) {
+TEST_F(Frames, WithAMalformedValueEndTheirConnection) {
     expectRefused(
         {value("indefinite array", bytes({0x9f, 0xff})),
          value("indefinite text", bytes({0x7f, 0x61, 0x61, 0xff})),
@@ -149,32 +129,40 @@ TEST(Frames, WithAMalformedValueEndTheirConnection) {
          value("300,000 values", head(4, 300000) + std::string(300000, '\0'))});
 }
 
-TEST(Frames, AtTheLimitsAreServed) {
-    Case half = value("half-precision real", bytes({0xf9, 0x3c, 0x00}));
-    expectServed({half, value("single-precision real", bytes({0xfa, 0x3f, 0x80, 0, 0})),
-                  value("not a number", bytes({0xfb, 0x7f, 0xf8, 0, 0, 0, 0, 0, 0})),
-                  value("smallest integer", head(1, ~std::uint64_t{0} >> 1)),
-                  value("largest integer", head(0, ~std::uint64_t{0})),
-                  value("date as integer", encode(Item::tagged(1, 1000000000))),
-                  value("date", encode(Item::date(-1e300))),
-                  value("UUID", encode(Item::uuid("01234567-89AB-CDEF-0123-456789ABCDEF"))),
-                  value("URL", encode(Item::url("file:///"))),
-                  value("text with NUL", encode(Item(std::string("a\0b", 3)))),
-                  value("63 arrays below the map", nested(62, head(4, 1), encode(Item::array({})))),
-                  value("200,000 values", head(4, 200000) + std::string(200000, '\0')),
-                  value("nearly 16 MiB", encode(Item::bytes(std::string((16 << 20) - 100, 'x'))))});
+TEST_F(Frames, AtTheLimitsAreServed) {
+    const std::vector<Case> cases = {
+        value("half-precision real", bytes({0xf9, 0x3c, 0x00})),
+        value("single-precision real", bytes({0xfa, 0x3f, 0x80, 0, 0})),
+        value("not a number", bytes({0xfb, 0x7f, 0xf8, 0, 0, 0, 0, 0, 0})),
+        value("smallest integer", head(1, ~std::uint64_t{0} >> 1)),
+        value("largest integer", head(0, ~std::uint64_t{0})),
+        value("date as integer", encode(Item::tagged(1, 1000000000))),
+        value("date", encode(Item::date(-1e300))),
+        value("UUID", encode(Item::uuid("01234567-89AB-CDEF-0123-456789ABCDEF"))),
+        value("URL", encode(Item::url("file:///"))),
+        value("text with NUL", encode(Item(std::string("a\0b", 3)))),
+        value("63 arrays below the map", nested(62, head(4, 1), encode(Item::array({})))),
+        value("200,000 values", head(4, 200000) + std::string(200000, '\0')),
+        value("nearly 16 MiB", encode(Item::bytes(std::string((16 << 20) - 100, 'x'))))};
+    start();
+    for (const Case& each : cases) {
+        SCOPED_TRACE(each.what);
+        client->send(each.frame.bytes());
+        const std::optional<Frame> reply = client->receive();
+        ASSERT_TRUE(reply);
+        EXPECT_EQ(reply->kind, replyFrame);
+        EXPECT_EQ(errorOf(decode(reply->body)), "");
+    }
 }
 
-TEST(Frames, AfterABrokenOneAreNotServed) {
-    const Home home;
-    const Daemon daemon(home.path());
-    WireClient client = daemon.connect();
+TEST_F(Frames, AfterABrokenOneAreNotServed) {
+    start();
     const std::string good = Frame{.id = 1, .body = encode(envelope("after-the-break"))}.bytes();
-    client.send(Frame{.kind = 9}.bytes() + good);
-    EXPECT_TRUE(client.ended());
-    WireClient healthy = daemon.connect();
-    EXPECT_EQ(errorOf(healthy.request(envelope("match"))), "");
-    EXPECT_EQ(daemon.linesWith("requested after-the-break"), 0u);
+    client->send(Frame{.kind = 9}.bytes() + good);
+    EXPECT_TRUE(client->ended());
+    client.emplace(daemon->connect());
+    EXPECT_EQ(answer(envelope("match")), "");
+    EXPECT_EQ(daemon->linesWith("requested after-the-break"), 0u);
 }
 
 } // namespace

@@ -1,16 +1,11 @@
 #include "tests/e2e/Home.h"
 
-#include <filesystem>
 #include <fstream>
 #include <sstream>
 #include <stdexcept>
 #include <sys/stat.h>
 
-#include "tests/e2e/PlistWriter.h"
-
 namespace e2e {
-
-namespace fs = std::filesystem;
 
 namespace {
 
@@ -31,6 +26,14 @@ std::string Home::addApp(const std::string& name, const std::string& folder,
         Item::map({{"BQBundleIdentifier", "com.example." + name}, {"BQBundleExecutable", name}});
     writeFile(app + "/Info.plist", xmlPlist(basics.merged(info)));
     writeFile(app + "/" + name, "#!/bin/sh\n", 0755);
+    return app;
+}
+
+std::string Home::addAppWithPlugIns(const std::string& name,
+                                    const std::vector<std::string>& identifiers) const {
+    std::string app = addApp(name);
+    for (const std::string& identifier : identifiers)
+        addPlugIn(app, identifier, {.identifier = identifier});
     return app;
 }
 

@@ -1,11 +1,16 @@
 #pragma once
 
+#include <filesystem>
 #include <string>
+#include <vector>
 
 #include "tests/e2e/Item.h"
+#include "tests/e2e/PlistWriter.h"
 #include "tests/platform/TestFolder.h"
 
 namespace e2e {
+
+namespace fs = std::filesystem;
 
 // A temporary home of the daemon with the bundles in it; removed when this goes.
 class Home {
@@ -20,6 +25,9 @@ public:
     [[nodiscard]] std::string addApp(const std::string& name,
                                      const std::string& folder = "Applications",
                                      const Item& info = Item::map({})) const;
+    // One with plug-ins that are called by their identifiers; answers its path.
+    std::string addAppWithPlugIns(const std::string& name,
+                                  const std::vector<std::string>& identifiers) const;
 
 private:
     TestFolder folder_;

@@ -16,10 +16,11 @@ namespace e2e {
 [[nodiscard]] std::vector<Item> formsOf(const Item& reply);
 [[nodiscard]] Item formOf(const Item& reply);
 
-[[nodiscard]] std::vector<Item> match(WireClient& client, const Item& rules,
+[[nodiscard]] std::vector<Item> match(WireClient& client, const Item& rules = Item::map({}),
                                       std::uint64_t flags = 0);
 // The identifiers of the matches, sorted, with a space between.
-[[nodiscard]] std::string matched(WireClient& client, const Item& rules, std::uint64_t flags = 0);
+[[nodiscard]] std::string matched(WireClient& client, const Item& rules = Item::map({}),
+                                  std::uint64_t flags = 0);
 // "identifier version" of the matches, sorted, with a comma between.
 [[nodiscard]] std::string versions(WireClient& client, const Item& rules, std::uint64_t flags = 0);
 

@@ -1,15 +1,12 @@
-#include <gtest/gtest.h>
-
-#include "tests/e2e/Daemon.h"
-#include "tests/e2e/Home.h"
-#include "tests/e2e/Replies.h"
+#include "tests/e2e/DaemonTest.h"
 
 namespace e2e {
 namespace {
 
+using Rules = DaemonTest;
+
 // One pass over what rules may say; each operator and kind of value has its own tests elsewhere.
-TEST(Rules, OfEveryKindNarrowAMatch) {
-    const Home home;
+TEST_F(Rules, OfEveryKindNarrowAMatch) {
     const std::string app = home.addApp("Some");
     const auto add = [&](const char* identifier, const Item& value) {
         return addPlugIn(app, identifier,
@@ -23,17 +20,11 @@ TEST(Rules, OfEveryKindNarrowAMatch) {
     add("type", "com.example.photo");
     const std::string other = home.addApp("Other");
     const std::string path = addPlugIn(other, "x", {.identifier = "x", .point = "point.x"});
-    const Daemon daemon(home.path());
-    WireClient client = daemon.connect();
-    const std::string uuid = findAt(client, path)["uuid"].text();
+    start();
+    const std::string uuid = findAt(*client, path)["uuid"].text();
 
-    struct Case {
-        const char* key;
-        Item pattern;
-        const char* matches; // identifiers, sorted
-    };
-
-    const std::vector<Case> cases = {
+    // A rule, and the identifiers that it leaves, sorted.
+    const std::tuple<const char*, Item, const char*> cases[] = {
         {"Value", "2.9", "array nine"},
         {"Value", "=2.10", "ten"},
         {"Value", "<>2.9", "ten type"},
@@ -56,17 +47,13 @@ TEST(Rules, OfEveryKindNarrowAMatch) {
         {"HXExtensionContainingApp", other, "x"},
         {"BQBundleExecutable", "plugin", "array false nine offer ten type x"},
         {"ENTITLEMENT:any", true, ""}};
-    for (const Case& each : cases) {
-        std::ostringstream what;
-        what << each.key << " = " << each.pattern;
-        SCOPED_TRACE(what.str());
-        EXPECT_EQ(matched(client, Item::map({{each.key, each.pattern}})), each.matches);
-    }
+    for (const auto& [key, pattern, matches] : cases)
+        EXPECT_EQ(seen(Item::map({{key, pattern}})), matches) << key << " = " << pattern;
     const Item both = Item::map({{"Value", "2.9"}, {"HXExtensionIdentifier", "nine"}});
-    EXPECT_EQ(matched(client, both), "nine");
-    EXPECT_EQ(matched(client, Item()), "array false nine offer ten type x");
-    EXPECT_TRUE(daemon.logs("info: unrecognized match operator:?KM-OTHER:2.9"));
-    EXPECT_TRUE(daemon.logs("debug: evaluating HXExtension filter: "));
+    EXPECT_EQ(seen(both), "nine");
+    EXPECT_EQ(seen(Item()), "array false nine offer ten type x");
+    EXPECT_TRUE(daemon->logs("info: unrecognized match operator:?KM-OTHER:2.9"));
+    EXPECT_TRUE(daemon->logs("debug: evaluating HXExtension filter: "));
 }
 
 } // namespace
