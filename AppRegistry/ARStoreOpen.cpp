@@ -126,11 +126,6 @@ std::expected<ARSqlConnection, int> connect(const std::string& path, int flags,
     return connection;
 }
 
-std::string folderOf(const std::string& path) {
-    const auto slash = path.rfind('/');
-    return slash == std::string::npos ? "." : path.substr(0, slash + 1);
-}
-
 std::optional<std::string> setAside(const std::string& path) {
     const std::string kept = ARDamagedStorePath(path);
     ::unlink((kept + "-wal").c_str());
@@ -144,7 +139,7 @@ std::optional<std::string> setAside(const std::string& path) {
 // What stands in the database is believed, entitlements above all: nobody else may have written it.
 std::optional<std::string> writableByOthers(const std::string& path) {
     platform::OwnershipTest ownership;
-    for (const std::string& part : {folderOf(path), path, path + "-wal"}) {
+    for (const std::string& part : {platform::folderOf(path), path, path + "-wal"}) {
         const auto canonical = platform::canonicalPath(part);
         auto refusal = canonical ? ownership.refusal(*canonical) : std::nullopt;
         if (refusal)
@@ -263,7 +258,7 @@ std::string ARDamagedStorePath(const std::string& path) {
 }
 
 std::expected<AROpenedStore, platform::Error> AROpenStore(const std::string& usualPath) {
-    if (auto error = platform::makeFolders(folderOf(usualPath), 0755))
+    if (auto error = platform::makeFolders(platform::folderOf(usualPath), 0755))
         return std::unexpected(std::move(*error));
     auto locked = lockFor(usualPath);
     if (!locked)

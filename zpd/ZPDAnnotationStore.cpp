@@ -53,12 +53,12 @@ std::expected<Dictionary, Error> readStore(const std::string& path) {
                                                   "found database version %d needed version %d",
                                                   found, storeVersion));
     }
-    const Value* const data = entries->find(dataKey);
-    if (!data || !data->dictionary()) {
+    const Dictionary* const data = entries->findDictionary(dataKey);
+    if (!data) {
         return std::unexpected(Error{&platform::formatErrorDomain, platform::formatErrorCorrupt,
                                      "the data of the annotation database is not a dictionary"});
     }
-    return *data->dictionary();
+    return *data;
 }
 
 // Fires the probe with what went wrong, at each of the two places that are tried.
@@ -143,11 +143,6 @@ std::expected<std::string, Error> storeText(const Dictionary& annotations) {
         Dictionary{{versionKey, storeVersion}, {dataKey, annotations}});
 }
 
-std::string folderOf(const std::string& path) {
-    const auto slash = path.rfind('/');
-    return slash == std::string::npos ? "." : path.substr(0, slash + 1);
-}
-
 } // namespace
 
 // ---- Places
@@ -227,7 +222,7 @@ std::optional<Error> ZPDAnnotationStore::loadDb(const std::string& path) {
 // Makes the usual folder where it is missing, and says now, rather than at the first change, when
 // nothing can be written.
 void ZPDAnnotationStore::prepareFolder(bool usualPlace) const {
-    const std::string folder = folderOf(path_);
+    const std::string folder = platform::folderOf(path_);
     std::optional<Error> failure;
     if (usualPlace)
         failure = platform::makeFolders(folder, globalFolderMode);

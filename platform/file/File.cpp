@@ -162,6 +162,11 @@ std::expected<std::string, int> canonicalPath(std::string_view path) {
     return canonical ? std::expected<std::string, int>(std::move(*canonical)) : realPath(text);
 }
 
+std::string folderOf(const std::string& path) {
+    const auto slash = path.rfind('/');
+    return slash == std::string::npos ? "." : path.substr(0, slash == 0 ? 1 : slash);
+}
+
 bool isPlainName(std::string_view name) {
     constexpr std::size_t longest = 255;
     const auto allowed = [](char c) {

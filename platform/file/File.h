@@ -94,6 +94,9 @@ void removeUnfinishedFiles(const std::string& path);
 // resolves, nor does one that is longer than a path can be. On failure the errno value.
 [[nodiscard]] std::expected<std::string, int> canonicalPath(std::string_view path);
 
+// The folder in which a path's last name lies, as far as the text tells.
+[[nodiscard]] std::string folderOf(const std::string& path);
+
 // True for the name of one file: 1 to 255 bytes without "/", NUL or control characters, and neither
 // "." nor "..".
 [[nodiscard]] bool isPlainName(std::string_view name);

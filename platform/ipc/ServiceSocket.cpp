@@ -39,11 +39,6 @@ std::expected<sockaddr_un, Error> addressOf(const std::string& path) {
     return address;
 }
 
-std::string folderOf(const std::string& path) {
-    const std::size_t slash = path.rfind('/');
-    return slash == std::string::npos ? "." : path.substr(0, slash == 0 ? 1 : slash);
-}
-
 // Makes the folder for everybody to pass through, whatever the umask; leaves one that is there.
 std::optional<Error> makeFolder(const std::string& folder) {
     if (::access(folder.c_str(), F_OK) == 0)
