@@ -17,6 +17,26 @@ Value dataOf(std::size_t size) {
 
 const std::string someKey(64, 'a');
 
+struct Damage {
+    const char* key;
+    std::optional<Value> value;   // instead of the sound one
+    const char* reason = nullptr; // else one that names the key
+};
+
+template <class Decoded>
+void expectRefused(const Dictionary& sound, const std::vector<Damage>& damages) {
+    ASSERT_TRUE(Decoded::decoded(plist::writeXml(sound).value()));
+    for (const auto& [key, value, reason] : damages) {
+        Dictionary damaged = sound;
+        damaged.remove(key);
+        if (value)
+            damaged.set(key, *value);
+        const auto read = Decoded::decoded(plist::writeXml(damaged).value());
+        ASSERT_FALSE(read) << key;
+        EXPECT_THAT(read.error(), HasSubstr(reason ? reason : "\"" + std::string(key) + "\""));
+    }
+}
+
 TEST(SignatureFileTest, ComesBackAsItWasWritten) {
     SignedStatement statement;
     statement.identifier = "com.example.player";
@@ -45,35 +65,18 @@ TEST(SignatureFileTest, IsRefusedWithAReasonWhenDamaged) {
                            {"keyIdentifier", someKey},
                            {"signature", dataOf(64)},
                            {"statement", dataOf(10)}};
-
-    const struct {
-        const char* key;
-        std::optional<Value> value;
-        const char* reason;
-    } cases[] = {
-        {"version", std::nullopt, "not of version 1"},
-        {"version", 2, "not of version 1"},
-        {"version", "1", "not of version 1"},
-        {"keyIdentifier", std::nullopt, "\"keyIdentifier\""},
-        {"keyIdentifier", std::string(63, 'a'), "\"keyIdentifier\""},
-        {"keyIdentifier", std::string(64, 'A'), "\"keyIdentifier\""},
-        {"signature", dataOf(63), "\"signature\""},
-        {"signature", std::string(64, 's'), "\"signature\""},
-        {"statement", Dictionary(), "\"statement\""},
-        {"comment", "new", "unknown key \"comment\""},
-    };
-
-    for (const auto& [key, value, reason] : cases) {
-        Dictionary damaged = sound;
-        damaged.remove(key);
-        if (value)
-            damaged.set(key, *value);
-        const auto read = SignatureFile::decoded(plist::writeXml(damaged).value());
-        ASSERT_FALSE(read) << key;
-        EXPECT_THAT(read.error(), HasSubstr(reason));
-    }
+    const char* const version = "not of version 1";
+    expectRefused<SignatureFile>(sound, {{"version", std::nullopt, version},
+                                         {"version", 2, version},
+                                         {"version", "1", version},
+                                         {"keyIdentifier", std::nullopt},
+                                         {"keyIdentifier", std::string(63, 'a')},
+                                         {"keyIdentifier", std::string(64, 'A')},
+                                         {"signature", dataOf(63)},
+                                         {"signature", std::string(64, 's')},
+                                         {"statement", Dictionary()},
+                                         {"comment", "new", "unknown key \"comment\""}});
     const std::string bytes = plist::writeXml(sound).value();
-    ASSERT_TRUE(SignatureFile::decoded(bytes));
     for (std::size_t size = 0; size < bytes.rfind('>'); ++size)
         EXPECT_FALSE(SignatureFile::decoded(std::string_view(bytes).substr(0, size))) << size;
     EXPECT_FALSE(SignatureFile::decoded(bytes + std::string(SignatureFile::largest, '\n')));
@@ -87,35 +90,23 @@ TEST(SignedStatementTest, IsRefusedWithAReasonWhenDamaged) {
                            {"executable", executable},
                            {"info", dataOf(32)},
                            {"entitlements", Dictionary()}};
-
-    const struct {
-        const char* key;
-        std::optional<Value> value;
-    } cases[] = {
-        {"identifier", std::nullopt},
-        {"identifier", 1},
-        {"entitlements", std::nullopt},
-        {"entitlements", Array()},
-        {"info", dataOf(31)},
-        {"info", std::string(32, 'x')},
-        {"executable", "none"},
-        {"executable", Dictionary{{"size", 7}}},
-        {"executable", Dictionary{{"size", -7}, {"sha256", dataOf(32)}}},
-        {"executable", Dictionary{{"size", 7}, {"sha256", dataOf(33)}}},
-        {"executable", Dictionary{{"size", 7}, {"sha256", dataOf(32)}, {"more", 1}}},
-        {"platform", "all"},
+    const auto with = [&](const char* key, const Value& value) {
+        Dictionary changed = executable;
+        changed.set(key, value);
+        return changed;
     };
-
-    ASSERT_TRUE(SignedStatement::decoded(plist::writeXml(sound).value()));
-    for (const auto& [key, value] : cases) {
-        Dictionary damaged = sound;
-        damaged.remove(key);
-        if (value)
-            damaged.set(key, *value);
-        const auto read = SignedStatement::decoded(plist::writeXml(damaged).value());
-        ASSERT_FALSE(read) << key;
-        EXPECT_THAT(read.error(), HasSubstr(std::string("\"") + key + "\""));
-    }
+    expectRefused<SignedStatement>(sound, {{"identifier", std::nullopt},
+                                           {"identifier", 1},
+                                           {"entitlements", std::nullopt},
+                                           {"entitlements", Array()},
+                                           {"info", dataOf(31)},
+                                           {"info", std::string(32, 'x')},
+                                           {"executable", "none"},
+                                           {"executable", Dictionary{{"size", 7}}},
+                                           {"executable", with("size", -7)},
+                                           {"executable", with("sha256", dataOf(33))},
+                                           {"executable", with("more", 1)},
+                                           {"platform", "all"}});
 }
 
 TEST(SignedStatementTest, IsNotMadeOfEntitlementsThatNobodyCouldRead) {

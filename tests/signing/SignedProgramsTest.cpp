@@ -37,7 +37,7 @@ protected:
 };
 
 TEST_F(SignedProgramsTest, GivesAProgramItsEntitlementsOncePrepared) {
-    const auto files = sign(SignedFiles::ofBundle(bundle("Main.app")).value());
+    const auto files = signedBundle("Main.app");
     letFilesSettle();
     const auto task = taskOf(*files.executable);
     EXPECT_FALSE(may(*task));
@@ -70,7 +70,7 @@ TEST_F(SignedProgramsTest, KnowsAReplacedProgramFromTheOneThatRuns) {
 }
 
 TEST_F(SignedProgramsTest, TakesEntitlementsBackWhenWhatTheyRestOnChanges) {
-    const auto files = sign(SignedFiles::ofBundle(bundle("Main.app")).value());
+    const auto files = signedBundle("Main.app");
     const std::string key = home_ / "trust.d/key.pem";
     const std::string elsewhere = home_ / "key.off";
     letFilesSettle();
@@ -92,9 +92,9 @@ TEST_F(SignedProgramsTest, TakesEntitlementsBackWhenWhatTheyRestOnChanges) {
 }
 
 TEST_F(SignedProgramsTest, VerifiesABundleFromWhatIsKnownOfIt) {
-    const auto files = sign(SignedFiles::ofBundle(bundle("Main.app")).value());
-    const std::string signature = readRegularFile(files.signature(), 1 << 20)->bytes;
+    const auto files = signedBundle("Main.app");
     Sha256 hash;
+    const std::string signature = contentOf(files.signature());
     const SignedBundle sound{signature, hash.ofFile(*files.info()).value(),
                              SignedBundle::Executable{fs::file_size(*files.executable),
                                                       hash.ofFile(*files.executable).value()}};

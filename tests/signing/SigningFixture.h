@@ -1,7 +1,5 @@
 #pragma once
 
-#include <filesystem>
-#include <fstream>
 #include <string>
 
 #include <gtest/gtest.h>
@@ -12,6 +10,7 @@
 #include "platform/signing/SignedFiles.h"
 #include "platform/signing/Signer.h"
 #include "tests/platform/TestFolder.h"
+#include "tests/support/Files.h"
 
 // A home with a trusted key, and programs and bundles in it that are signed with that key.
 class SigningFixture : public testing::Test {
@@ -35,6 +34,10 @@ protected:
         if (withExecutable)
             program(name + "/Main");
         return home_ / name;
+    }
+
+    platform::SignedFiles signedBundle(const std::string& name) const {
+        return sign(platform::SignedFiles::ofBundle(bundle(name)).value());
     }
 
     platform::SignedFiles sign(const platform::SignedFiles& files,

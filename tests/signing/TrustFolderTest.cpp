@@ -2,12 +2,12 @@
 
 #include <filesystem>
 #include <set>
-#include <sys/stat.h>
 
 #include <gtest/gtest.h>
 
 #include "platform/log/Log.h"
 #include "tests/platform/TestFolder.h"
+#include "tests/support/Files.h"
 
 namespace fs = std::filesystem;
 using namespace platform;
@@ -70,11 +70,11 @@ TEST_F(TrustFolderTest, IgnoresWhatIsNoSoundKey) {
     addKey("good.txt");
     addKey(".hidden.pem");
     addKey("writable.pem");
-    fs::permissions(path_ + "/writable.pem", fs::perms(0664));
+    setMode(path_ + "/writable.pem", 0664);
     addKey("elsewhere");
     fs::create_symlink("elsewhere", path_ + "/link.pem");
     fs::create_directory(path_ + "/folder.pem");
-    ASSERT_EQ(::mkfifo((path_ + "/fifo.pem").c_str(), 0644), 0);
+    makeFifo(path_ + "/fifo.pem");
     EXPECT_EQ(trusted(), Keys{good});
 }
 
@@ -88,17 +88,17 @@ TEST_F(TrustFolderTest, CountsOnlyWhileNobodyElseCanWriteItOrAFolderAbove) {
     const Keys good{addKey("a.pem")};
     for (const std::string& folder : {path_, home_.path()}) {
         EXPECT_EQ(trusted(), good);
-        fs::permissions(folder, fs::perms(0777));
+        setMode(folder, 0777);
         EXPECT_EQ(trusted(), Keys()) << folder;
-        fs::permissions(folder, fs::perms(0755));
+        setMode(folder, 0755);
     }
     EXPECT_EQ(trusted(), good);
     if (::geteuid() != 0)
         return;
     for (const std::string& owned : {path_, path_ + "/a.pem"}) {
-        ASSERT_EQ(::chown(owned.c_str(), 12345, 0), 0);
+        giveAway(owned);
         EXPECT_EQ(trusted(), Keys()) << owned;
-        ASSERT_EQ(::chown(owned.c_str(), 0, 0), 0);
+        giveAway(owned, 0);
     }
     EXPECT_EQ(trusted(), good);
 }

@@ -1,12 +1,10 @@
 #include "platform/signing/Verifier.h"
 
 #include <functional>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <gmock/gmock.h>
 
-#include "platform/file/File.h"
 #include "tests/signing/SigningFixture.h"
 
 namespace fs = std::filesystem;
@@ -22,23 +20,15 @@ protected:
         file.seekp(static_cast<std::streamoff>(at)).put('!');
     }
 
-    static void allow(const std::string& path, unsigned mode) {
-        fs::permissions(path, static_cast<fs::perms>(mode));
-    }
-
     // Signs `files` anew as `change` wants the statement to be.
     void forge(const SignedFiles& files, const std::function<void(SignedStatement&)>& change) {
-        const auto file = SignatureFile::decoded(read(files.signature())).value();
+        const auto file = SignatureFile::decoded(contentOf(files.signature())).value();
         auto statement = SignedStatement::decoded(file.statement).value();
         change(statement);
         const std::string bytes = statement.encoded().value();
         const std::string signature = key_.sign(SignatureFile::signedBytes(bytes)).value();
         const SignatureFile forged{file.keyIdentifier, signature, bytes};
-        std::ofstream(files.signature(), std::ios::trunc) << forged.encoded().value();
-    }
-
-    static std::string read(const std::string& path) {
-        return readRegularFile(path, 1 << 20).value().bytes;
+        std::ofstream(files.signature()) << forged.encoded().value();
     }
 
     Verifier verifier_{home_ / "trust.d"};
@@ -62,32 +52,32 @@ TEST_F(VerifierTest, GrantsWhatWasSigned) {
 }
 
 TEST_F(VerifierTest, RefusesWhateverIsNotAsItWasSigned) {
-    struct Case {
+    static constexpr std::uintmax_t terabyte = std::uintmax_t{1} << 40;
+
+    const struct {
         const char* what;
         std::function<void(const SignedFiles&)> tamper;
         const char* reason;
-    };
-
-    const Case cases[] = {
+    } cases[] = {
         {"unsigned", [](const auto& f) { fs::remove(f.signature()); }, "not signed"},
         {"one byte of the executable", [&](const auto& f) { alter(*f.executable); },
          "the executable is not what it was"},
         {"a longer executable", [&](const auto& f) { alter(*f.executable, 1000); },
          "the executable has 1001 bytes"},
         {"a sparse executable of 1 TB",
-         [](const auto& f) { fs::resize_file(*f.executable, 1ULL << 40); },
+         [](const auto& f) { fs::resize_file(*f.executable, terabyte); },
          "the executable has 1099511627776 bytes"},
         {"the same, and signed so",
          [&](const auto& f) {
-             fs::resize_file(*f.executable, 1ULL << 40);
-             forge(f, [](SignedStatement& s) { s.executable->size = 1ULL << 40; });
+             fs::resize_file(*f.executable, terabyte);
+             forge(f, [](auto& statement) { statement.executable->size = terabyte; });
          },
          "larger than 268435456 bytes"},
         {"a replaced executable with another's signature",
          [&](const auto& f) { forge(f, [](SignedStatement& s) { s.executable->digest[0] ^= 1; }); },
          "the executable is not what it was"},
         {"one byte of Info.plist",
-         [&](const auto& f) { alter(*f.info(), read(*f.info()).find("Main.app")); },
+         [&](const auto& f) { alter(*f.info(), contentOf(*f.info()).find("Main.app")); },
          "Info.plist is not what it was"},
         {"a broken signature file", [&](const auto& f) { alter(f.signature(), 60); },
          "the signature file: "},
@@ -106,15 +96,15 @@ TEST_F(VerifierTest, RefusesWhateverIsNotAsItWasSigned) {
              EXPECT_EQ(stranger.sign(f, {}), std::nullopt);
          },
          "is not trusted"},
-        {"an executable that others can write", [](const auto& f) { allow(*f.executable, 0775); },
+        {"an executable that others can write", [](const auto& f) { setMode(*f.executable, 0775); },
          "Main can be written by others"},
-        {"an Info.plist that others can write", [](const auto& f) { allow(*f.info(), 0666); },
+        {"an Info.plist that others can write", [](const auto& f) { setMode(*f.info(), 0666); },
          "can be written by others"},
         {"a signature file that others can write",
-         [](const auto& f) { allow(f.signature(), 0664); }, "Signature can be written by others"},
-        {"a folder that others can write", [](const auto& f) { allow(*f.bundle, 0777); },
+         [](const auto& f) { setMode(f.signature(), 0664); }, "Signature can be written by others"},
+        {"a folder that others can write", [](const auto& f) { setMode(*f.bundle, 0777); },
          "Main.app can be written by others"},
-        {"a folder above that others can write", [&](const auto&) { allow(home_.path(), 0777); },
+        {"a folder above that others can write", [&](const auto&) { setMode(home_.path(), 0777); },
          "can be written by others"},
         {"a signature file behind a link",
          [](const auto& f) {
@@ -122,24 +112,21 @@ TEST_F(VerifierTest, RefusesWhateverIsNotAsItWasSigned) {
              fs::create_symlink("elsewhere", f.signature());
          },
          "Signature"},
-        {"a FIFO for a signature file",
-         [](const auto& f) {
-             fs::remove(f.signature());
-             ASSERT_EQ(::mkfifo(f.signature().c_str(), 0644), 0);
-         },
+        {"a FIFO for a signature file", [](const auto& f) { makeFifo(f.signature()); },
          "not a regular file"},
         {"the key is gone", [&](const auto&) { fs::remove_all(home_ / "trust.d"); },
          "is not trusted"},
     };
+
     for (const auto& [what, tamper, reason] : cases) {
         SCOPED_TRACE(what);
-        const auto files = sign(SignedFiles::ofBundle(bundle("Main.app")).value());
+        const auto files = signedBundle("Main.app");
         ASSERT_EQ(verifier_.bundle(files).refusal(), std::nullopt);
         tamper(files);
         EXPECT_THAT(verifier_.bundle(files).refusal().value_or("granted"), HasSubstr(reason));
         EXPECT_NE(verifier_.program(*files.executable).refusal(), std::nullopt);
         fs::remove_all(*files.bundle);
-        allow(home_.path(), 0755);
+        setMode(home_.path(), 0755);
     }
 }
 
@@ -156,19 +143,19 @@ TEST_F(VerifierTest, RefusesABundleWhoseExecutableLiesElsewhere) {
 TEST_F(VerifierTest, TakesNoFilesOfStrangers) {
     if (::geteuid() != 0)
         GTEST_SKIP() << "only root can give files away";
-    const auto files = sign(SignedFiles::ofBundle(bundle("Main.app")).value());
+    const auto files = signedBundle("Main.app");
     for (const std::string& owned :
          {*files.executable, *files.info(), files.signature(), *files.bundle, home_ / "trust.d"}) {
-        ASSERT_EQ(::chown(owned.c_str(), 12345, 0), 0);
+        giveAway(owned);
         EXPECT_NE(verifier_.bundle(files).refusal(), std::nullopt) << owned;
-        ASSERT_EQ(::chown(owned.c_str(), 0, 0), 0);
+        giveAway(owned, 0);
         EXPECT_EQ(verifier_.bundle(files).refusal(), std::nullopt) << owned;
     }
 }
 
 TEST_F(VerifierTest, NoByteOfASignatureFileMayChange) {
     const auto files = sign({std::nullopt, program("lone")});
-    const std::string sound = read(files.signature());
+    const std::string sound = contentOf(files.signature());
     const TrustedKeys keys = *verifier_.trust().keys();
     for (std::size_t at = 0; at < sound.size(); ++at) {
         std::string damaged = sound;
