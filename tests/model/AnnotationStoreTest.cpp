@@ -1,12 +1,10 @@
 #include <filesystem>
 #include <fstream>
 #include <sstream>
-#include <unistd.h>
 
 #include <gmock/gmock.h>
 
 #include "Zephrin/ZPDError.h"
-#include "platform/file/File.h"
 #include "platform/plist/PropertyList.h"
 #include "tests/model/Samples.h"
 #include "tests/platform/TestFolder.h"

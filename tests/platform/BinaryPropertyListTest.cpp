@@ -5,7 +5,6 @@
 #include <vector>
 
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 #include "platform/plist/PropertyList.h"
 

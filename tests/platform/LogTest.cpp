@@ -9,7 +9,6 @@
 #include <vector>
 
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 #include "platform/log/Render.h"
 #include "platform/log/Sink.h"

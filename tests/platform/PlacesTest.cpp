@@ -7,7 +7,6 @@
 #include <utility>
 
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 #include "tests/platform/TestFolder.h"
 

@@ -4,7 +4,6 @@
 #include <string>
 
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 using namespace platform;
 using testing::HasSubstr;

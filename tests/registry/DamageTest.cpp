@@ -1,5 +1,4 @@
 #include <fstream>
-#include <functional>
 #include <signal.h>
 #include <sys/wait.h>
 #include <unistd.h>

@@ -1,7 +1,6 @@
 #include "platform/signing/SignatureFile.h"
 
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
 #include "platform/plist/PropertyList.h"
 
