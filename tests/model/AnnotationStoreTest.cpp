@@ -162,11 +162,7 @@ TEST_F(StoreTest, CutAnywhereStartsEmptyAndIsMendedByTheNextChange) {
 }
 
 TEST_F(StoreTest, RefusesWhatIsNoStore) {
-    const struct {
-        std::string content;
-        platform::ErrorDomain const* domain;
-        std::int64_t code;
-    } cases[] = {
+    const std::tuple<std::string, platform::ErrorDomain const*, std::int64_t> cases[] = {
         {"text", &platform::formatErrorDomain, platform::formatErrorCorrupt},
         {platform::plist::writeXml(Array{1}).value(), &ZPDErrorDomain, 7},
         {storeText(15, someAnnotations), &ZPDErrorDomain, 7},
@@ -177,15 +173,15 @@ TEST_F(StoreTest, RefusesWhatIsNoStore) {
          &platform::formatErrorDomain, platform::formatErrorCorrupt},
     };
 
-    for (const auto& c : cases) {
+    for (const auto& [content, domain, code] : cases) {
         write(storeText(16, someAnnotations));
         auto store = open();
-        write(c.content);
+        write(content);
         const auto failure = store.loadDb(path);
-        ASSERT_TRUE(failure) << c.content;
-        EXPECT_EQ(failure->domain, c.domain) << c.content;
-        EXPECT_EQ(failure->code, c.code) << c.content;
-        EXPECT_TRUE(store.annotationForPlugIn(*plugIn)) << c.content; // unchanged
+        ASSERT_TRUE(failure) << content;
+        EXPECT_EQ(failure->domain, domain) << content;
+        EXPECT_EQ(failure->code, code) << content;
+        EXPECT_TRUE(store.annotationForPlugIn(*plugIn)) << content; // unchanged
     }
     write(storeText(15, someAnnotations));
     EXPECT_EQ(open().loadDb(path)->description, "found database version 15 needed version 16");
@@ -223,11 +219,7 @@ TEST_F(StoreTest, ReadsBackWhatCanBeHeld) {
 TEST_F(StoreTest, TakesOverTheOlderStoreOnlyWhereNoneCouldBeLoaded) {
     const Dictionary older{{sampleKey, Dictionary{{"election", 5}}}};
 
-    const struct {
-        const char* name;
-        std::optional<std::string> content;
-        bool takenOver;
-    } cases[] = {
+    const std::tuple<const char*, std::optional<std::string>, bool> cases[] = {
         {"no file", std::nullopt, true},
         {"damaged", "text", true},
         {"another version", storeText(15, someAnnotations), true},
@@ -236,18 +228,18 @@ TEST_F(StoreTest, TakesOverTheOlderStoreOnlyWhereNoneCouldBeLoaded) {
     };
 
     writeOlder(storeText(16, older));
-    for (const auto& c : cases) {
+    for (const auto& [name, content, takenOver] : cases) {
         std::filesystem::remove(path);
         world.platform.containers.asked.clear();
-        if (c.content)
-            write(*c.content);
+        if (content)
+            write(*content);
         auto store = open();
-        if (c.takenOver) {
-            EXPECT_EQ(saved(), savedWith(older)) << c.name;
-            EXPECT_EQ(store.annotationForPlugIn(*plugIn), (Dictionary{{"election", 5}})) << c.name;
+        if (takenOver) {
+            EXPECT_EQ(saved(), savedWith(older)) << name;
+            EXPECT_EQ(store.annotationForPlugIn(*plugIn), (Dictionary{{"election", 5}})) << name;
             EXPECT_THAT(world.platform.containers.asked, ElementsAre("com.tovana.zpd"));
         } else {
-            EXPECT_EQ(contentOf(path), *c.content) << c.name;
+            EXPECT_EQ(contentOf(path), *content) << name;
             EXPECT_THAT(world.platform.containers.asked, IsEmpty());
         }
     }

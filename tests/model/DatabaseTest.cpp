@@ -136,22 +136,19 @@ TEST_F(DatabaseTest, SharesAnAnswerUntilSomethingMoves) {
     const Dictionary query{{"HXExtensionPointIdentifier", "x"}};
     const auto record = database->findPlugIn(plugIn->uuid);
 
-    const struct {
-        const char* name;
-        std::function<void()> change;
-    } cases[] = {
+    const std::pair<const char*, std::function<void()>> cases[] = {
         {"registry", [&] { platform.workspace.move(); }},
         {"annotations", [&] { database->setAnnotation(Dictionary{{"election", 1}}, *record); }},
         {"language", [&] { platform.locale.changed(); }},
         {"removal", [&] { platform.workspace.observer->pluginsWillUninstall({plugIn}); }},
     };
 
-    for (const auto& c : cases) {
+    for (const auto& [name, change] : cases) {
         const auto answer = database->findPlugIns(query);
-        EXPECT_EQ(database->findPlugIns(query), answer) << c.name;
-        EXPECT_NE(database->findPlugIns(std::nullopt), answer) << c.name;
-        c.change();
-        EXPECT_NE(database->findPlugIns(query), answer) << c.name;
+        EXPECT_EQ(database->findPlugIns(query), answer) << name;
+        EXPECT_NE(database->findPlugIns(std::nullopt), answer) << name;
+        change();
+        EXPECT_NE(database->findPlugIns(query), answer) << name;
     }
 
     const auto oldest = database->findPlugIns(query);

@@ -3,10 +3,7 @@
 #include <gtest/gtest.h>
 
 TEST(FileURL, GivesAPathOnlyForLocalFiles) {
-    const struct {
-        const char* url;
-        std::optional<std::string> path;
-    } cases[] = {
+    const std::pair<const char*, std::optional<std::string>> cases[] = {
         {"file:///System/X.appex", "/System/X.appex"},
         {"file:///System/X.appex/", "/System/X.appex"},
         {"file://localhost/a", "/a"},
@@ -26,8 +23,8 @@ TEST(FileURL, GivesAPathOnlyForLocalFiles) {
         {"file:///a%zz", std::nullopt},
     };
 
-    for (const auto& c : cases)
-        EXPECT_EQ(pathFromFileURL(c.url), c.path) << c.url;
+    for (const auto& [url, path] : cases)
+        EXPECT_EQ(pathFromFileURL(url), path) << url;
     EXPECT_EQ(pathFromFileURL(std::string_view("file:///a\0b", 11)), std::nullopt);
 }
 

@@ -172,10 +172,7 @@ TEST(Diagnosis, FindsTheFirstFaultOnly) {
         return d;
     };
 
-    const struct {
-        ZPPlugInCore::Ptr record;
-        std::optional<std::string> fault;
-    } cases[] = {
+    const std::pair<ZPPlugInCore::Ptr, std::optional<std::string>> cases[] = {
         {recordWith(sound), std::nullopt},
         {recordWith(with(sound, "PrincipalClass", "HXObject")), std::nullopt},
         {other(with(sound, "HXExtensionProtocol", "#Data")), std::nullopt},
@@ -196,9 +193,9 @@ TEST(Diagnosis, FindsTheFirstFaultOnly) {
          "hybrid plug-ins are not supported on this platform"},
     };
 
-    for (const auto& c : cases) {
-        const auto found = c.record->diagnose();
-        EXPECT_EQ(found ? found->description : std::nullopt, c.fault);
+    for (const auto& [record, fault] : cases) {
+        const auto found = record->diagnose();
+        EXPECT_EQ(found ? found->description : std::nullopt, fault);
         EXPECT_EQ(found ? found->code : 12, 12);
     }
 }

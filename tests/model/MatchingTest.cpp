@@ -79,18 +79,16 @@ TEST(Rules, AskHowTypesConform) {
 }
 
 TEST(Rules, TellWhetherAPropertyIsThere) {
-    const struct {
-        Value value;
-        bool isThere;
-    } cases[] = {{"text", true},  {"", true},     {"NO", true}, {true, true}, {7, true},
-                 {Array(), true}, {false, false}, {0, false},   {0.0, false}};
+    const std::pair<Value, bool> cases[] = {{"text", true}, {"", true}, {"NO", true},
+                                            {true, true},   {7, true},  {Array(), true},
+                                            {false, false}, {0, false}, {0.0, false}};
 
-    for (const auto& c : cases) {
-        AttributeWorld world(c.value);
+    for (const auto& [value, isThere] : cases) {
+        AttributeWorld world(value);
         for (const auto& yes : {Value(true), Value(1), Value(1.0)})
-            EXPECT_EQ(world.holds(yes), c.isThere) << describe(c.value);
+            EXPECT_EQ(world.holds(yes), isThere) << describe(value);
         for (const auto& no : {Value(false), Value(0), Value(0.0)})
-            EXPECT_EQ(world.holds(no), !c.isThere) << describe(c.value);
+            EXPECT_EQ(world.holds(no), !isThere) << describe(value);
     }
     RecordWorld world;
     EXPECT_TRUE(world.record()->match(Dictionary{{"Absent", false}}));
@@ -99,11 +97,7 @@ TEST(Rules, TellWhetherAPropertyIsThere) {
 }
 
 TEST(Rules, HoldForAnyOfSeveral) {
-    const struct {
-        Value value;
-        Value pattern;
-        bool holds;
-    } cases[] = {
+    const std::tuple<Value, Value, bool> cases[] = {
         {Array{"a", "b"}, "b", true},
         {Array{"a", "b"}, Array{"c", "a"}, true},
         {Array{"a", "b"}, Array{"c", "d"}, false},
@@ -119,9 +113,9 @@ TEST(Rules, HoldForAnyOfSeveral) {
         {platform::Date{1}, "1", false},
     };
 
-    for (const auto& c : cases) {
-        EXPECT_EQ(AttributeWorld(c.value).holds(c.pattern), c.holds)
-            << describe(c.value) << " with " << describe(c.pattern);
+    for (const auto& [value, pattern, holds] : cases) {
+        EXPECT_EQ(AttributeWorld(value).holds(pattern), holds)
+            << describe(value) << " with " << describe(pattern);
     }
 }
 
@@ -134,11 +128,7 @@ TEST(Rules, ReadTheirPropertyWhereTheKeySays) {
     plugIn->granted = Dictionary{{"right", "x"}, {"off", false}, {"HXExtensionIdentifier", "e"}};
     const auto record = world.record(plugIn);
 
-    const struct {
-        std::string key;
-        Value pattern;
-        bool holds;
-    } cases[] = {
+    const std::tuple<std::string, Value, bool> cases[] = {
         {"Both", "attribute", true},
         {"BQBundleDisplayName", "Sample", true},
         {"HXExtensionPointIdentifier", "com.example.point", true},
@@ -155,9 +145,9 @@ TEST(Rules, ReadTheirPropertyWhereTheKeySays) {
         {"ENTITLEMENT:", true, false},
     };
 
-    for (const auto& c : cases)
-        EXPECT_EQ(record->match(Dictionary{{c.key, c.pattern}}), c.holds)
-            << c.key << " with " << describe(c.pattern);
+    for (const auto& [key, pattern, holds] : cases)
+        EXPECT_EQ(record->match(Dictionary{{key, pattern}}), holds)
+            << key << " with " << describe(pattern);
 }
 
 TEST(Rules, AboutTheContainingApplicationFailWithoutOne) {

@@ -46,11 +46,7 @@ TEST(Record, SpeaksTheHubVersionThatItSays) {
 TEST(Record, IsOnlyMadeOfAcceptablePlugIns) {
     using Spoil = void (*)(FakePlugIn&);
 
-    const struct {
-        const char* name;
-        bool accepted;
-        Spoil spoil;
-    } cases[] = {
+    const std::tuple<const char*, bool, Spoil> cases[] = {
         {"sound", true, [](FakePlugIn&) {}},
         {"no path", false, [](FakePlugIn& p) { p.path.reset(); }},
         {"no identifier", false, [](FakePlugIn& p) { p.identifier.reset(); }},
@@ -77,11 +73,11 @@ TEST(Record, IsOnlyMadeOfAcceptablePlugIns) {
          }},
     };
 
-    for (const auto& c : cases) {
+    for (const auto& [name, accepted, spoil] : cases) {
         RecordWorld world;
         auto plugIn = samplePlugIn();
-        c.spoil(*plugIn);
-        EXPECT_EQ(world.record(plugIn) != nullptr, c.accepted) << c.name;
+        spoil(*plugIn);
+        EXPECT_EQ(world.record(plugIn) != nullptr, accepted) << name;
     }
 }
 

@@ -99,11 +99,7 @@ TEST(PropertyListBinary, ReadsNestedAndSharedObjects) {
 }
 
 TEST(PropertyListBinary, RefusesBadObjects) {
-    const struct {
-        const char* what;
-        std::vector<std::string> objects;
-        const char* reason;
-    } cases[] = {
+    const std::tuple<const char*, std::vector<std::string>, const char*> cases[] = {
         {"null", {std::string(1, '\0')}, "unknown kind"},
         {"fill", {"\x0f"}, "unknown kind"},
         {"unique id", {bytes({0x80, 1})}, "unknown kind"},
@@ -134,8 +130,8 @@ TEST(PropertyListBinary, RefusesBadObjects) {
          "nested too deeply"},
     };
 
-    for (const auto& c : cases)
-        EXPECT_THAT(reason(plist::parse(list(c.objects))), HasSubstr(c.reason)) << c.what;
+    for (const auto& [what, objects, complaint] : cases)
+        EXPECT_THAT(reason(plist::parse(list(objects))), HasSubstr(complaint)) << what;
 }
 
 TEST(PropertyListBinary, RefusesBadTables) {
@@ -145,10 +141,7 @@ TEST(PropertyListBinary, RefusesBadTables) {
     };
     constexpr std::uint64_t huge = ~std::uint64_t{0};
 
-    const struct {
-        const char* what;
-        std::string whole;
-    } cases[] = {
+    const std::pair<const char*, std::string> cases[] = {
         {"no trailer", object},
         {"only a trailer", "bplist00" + trailer(1, 1, 1, 0, 8)},
         {"offset size 0", with("\x08", trailer(0, 1, 1, 0, 9))},
@@ -166,8 +159,8 @@ TEST(PropertyListBinary, RefusesBadTables) {
     };
 
     ASSERT_EQ(plist::parse(with("\x08", trailer(1, 1, 1, 0, 9))), Value(true));
-    for (const auto& c : cases)
-        EXPECT_FALSE(plist::parse(c.whole)) << c.what;
+    for (const auto& [what, whole] : cases)
+        EXPECT_FALSE(plist::parse(whole)) << what;
 }
 
 TEST(PropertyListBinary, BoundsWhatSharingCanGrowTo) {

@@ -23,10 +23,7 @@ TEST(ReadRegularFile, TellsWhyAFileCannotBeRead) {
     folder.write("big", std::string(101, 'x'));
     folder.write("plain", "");
 
-    const struct {
-        std::string path;
-        std::int64_t code;
-    } cases[] = {
+    const std::pair<std::string, std::int64_t> cases[] = {
         {folder / "missing", fileErrorNoSuchFile},
         {folder / "fifo", fileErrorNotRegular},
         {folder.path(), fileErrorNotRegular},
@@ -36,11 +33,11 @@ TEST(ReadRegularFile, TellsWhyAFileCannotBeRead) {
         {(folder / "plain") + std::string("\0x", 2), fileErrorReadUnknown},
     };
 
-    for (const auto& c : cases) {
-        const auto content = readRegularFile(c.path, 100);
-        ASSERT_FALSE(content) << c.path;
-        EXPECT_EQ(content.error().code, c.code) << c.path;
-        EXPECT_TRUE(content.error().description->find(c.path) == 0);
+    for (const auto& [path, code] : cases) {
+        const auto content = readRegularFile(path, 100);
+        ASSERT_FALSE(content) << path;
+        EXPECT_EQ(content.error().code, code) << path;
+        EXPECT_TRUE(content.error().description->find(path) == 0);
     }
 }
 
@@ -136,11 +133,7 @@ TEST(OwnershipTest, RefusesWhatOthersCanChange) {
     const TestFolder folder;
     const auto file = folder.write("outer/inner/file", "");
 
-    const struct {
-        const char* changed;
-        mode_t mode;
-        bool passes;
-    } cases[] = {
+    const std::tuple<const char*, mode_t, bool> cases[] = {
         {"outer/inner/file", 0644, true},
         {"outer/inner/file", 0664, false},
         {"outer/inner/file", 0646, false},
@@ -151,15 +144,15 @@ TEST(OwnershipTest, RefusesWhatOthersCanChange) {
         {"outer", 01775, true},
     };
 
-    for (const auto& c : cases) {
+    for (const auto& [changed, mode, passes] : cases) {
         fs::permissions(file, fs::perms(0644));
         fs::permissions(folder / "outer/inner", fs::perms(0755));
         fs::permissions(folder / "outer", fs::perms(0755));
-        ASSERT_EQ(::chmod((folder / c.changed).c_str(), c.mode), 0);
+        ASSERT_EQ(::chmod((folder / changed).c_str(), mode), 0);
         const auto reason = OwnershipTest().refusal(file);
-        EXPECT_EQ(!reason, c.passes) << c.changed << " " << std::oct << c.mode;
+        EXPECT_EQ(!reason, passes) << changed << " " << std::oct << mode;
         EXPECT_EQ(reason.value_or(""),
-                  c.passes ? "" : (folder / c.changed) + " can be written by others");
+                  passes ? "" : (folder / changed) + " can be written by others");
     }
     EXPECT_TRUE(OwnershipTest().refusal(folder / "missing"));
     EXPECT_TRUE(OwnershipTest().refusal("relative"));

@@ -11,28 +11,21 @@ TEST(Locale, LooksUpTheLongestSuffixFirst) {
     const Dictionary info{{"Name", "plain"}, {"Name[de]", "deutsch"}, {"Name[de_CH]", "schweiz"},
                           {"Name[fr]", 1},   {"Only[de]", "nur"},     {"Number", 5}};
 
-    const struct {
-        const char* key;
-        const char* locale;
-        std::optional<Value> found;
-    } cases[] = {
+    const std::tuple<const char*, const char*, std::optional<Value>> cases[] = {
         {"Name", "de_CH", "schweiz"}, {"Name", "de_AT", "deutsch"}, {"Name", "de", "deutsch"},
         {"Name", "en_GB", "plain"},   {"Name", "", "plain"},        {"Name", "fr_FR", "plain"},
         {"Only", "de_CH", "nur"},     {"Only", "en", std::nullopt}, {"Number", "de", std::nullopt},
     };
 
-    for (const auto& c : cases)
-        EXPECT_EQ(Locale::localized(info, c.key, c.locale), c.found) << c.key << " " << c.locale;
+    for (const auto& [key, locale, found] : cases)
+        EXPECT_EQ(Locale::localized(info, key, locale), found) << key << " " << locale;
 }
 
 TEST(SystemLocale, ReadsItsFileAndElseTheEnvironment) {
     const TestFolder folder;
     ::setenv("LANG", "fr_FR.UTF-8", 1);
 
-    const struct {
-        const char* content;
-        const char* locale;
-    } cases[] = {
+    const std::pair<const char*, const char*> cases[] = {
         {"LANG=de_CH.UTF-8\n", "de_CH"},
         {"LANG=\"de_DE.UTF-8@euro\"", "de_DE"},
         {"# LANG=it\n  LANG='pt_BR'\r\nLC_TIME=en_GB\n", "pt_BR"},
@@ -47,9 +40,8 @@ TEST(SystemLocale, ReadsItsFileAndElseTheEnvironment) {
         {"", "fr_FR"},
     };
 
-    for (const auto& c : cases)
-        EXPECT_EQ(SystemLocale(folder.write("locale.conf", c.content)).current(), c.locale)
-            << c.content;
+    for (const auto& [content, locale] : cases)
+        EXPECT_EQ(SystemLocale(folder.write("locale.conf", content)).current(), locale) << content;
     EXPECT_EQ(SystemLocale(folder / "missing").current(), "fr_FR");
     ::unsetenv("LANG");
     EXPECT_EQ(SystemLocale(folder / "missing").current(), "");

@@ -128,10 +128,7 @@ TEST(LogRender, HidesPrivateArgumentsWithoutAskingThem) {
 }
 
 TEST(LogRender, LeavesWhatItDoesNotKnow) {
-    const struct {
-        const char* format;
-        const char* text;
-    } cases[] = {
+    const std::pair<const char*, const char*> cases[] = {
         {"%q %@", "%q first"},
         {"%", "%"},
         {"%{public", "%{public"},
@@ -142,8 +139,8 @@ TEST(LogRender, LeavesWhatItDoesNotKnow) {
         {"%{uuid_t}.16P", "first"},
     };
 
-    for (const auto& c : cases)
-        EXPECT_EQ(shown(true, c.format, "first", "second"), c.text);
+    for (const auto& [format, text] : cases)
+        EXPECT_EQ(shown(true, format, "first", "second"), text);
 }
 
 TEST(LogRender, EscapesControlCharactersInArguments) {

@@ -32,11 +32,7 @@ TEST(FileNotificationObserver, NoticesPostsAndNothingElse) {
     const auto moveAway = [&] { fs::rename(home / "run", home / "away"); };
     const auto moveBack = [&] { fs::rename(home / "away", home / "run"); };
 
-    const struct {
-        const char* what;
-        bool tells;
-        std::function<void()> act;
-    } steps[] = {
+    const std::tuple<const char*, bool, std::function<void()>> steps[] = {
         {"the folder comes", false, [&] { fs::create_directories(home / "run/notify"); }},
         {"another one's post", false, [&] { notifications.post("other"); }},
         {"the first post", true, post},
@@ -67,9 +63,9 @@ TEST(FileNotificationObserver, NoticesPostsAndNothingElse) {
          }},
     };
 
-    for (const auto& step : steps) {
-        step.act();
-        EXPECT_EQ(noticed(observer) > 0, step.tells) << step.what;
+    for (const auto& [what, tells, act] : steps) {
+        act();
+        EXPECT_EQ(noticed(observer) > 0, tells) << what;
     }
 }
 

@@ -31,11 +31,7 @@ TEST(PathWatch, NoticesWhateverConcernsAFolder) {
     const TestFolder home;
     PathWatch watch(home / "etc/zephrin/trust.d"); // nothing of which is there yet
 
-    const struct {
-        const char* what;
-        bool concerns;
-        std::function<void()> act;
-    } steps[] = {
+    const std::tuple<const char*, bool, std::function<void()>> steps[] = {
         {"nothing", false, [] {}},
         {"a folder above", false, [&] { fs::create_directories(home / "etc/zephrin"); }},
         {"a file beside", false, [&] { home.write("etc/zephrin/other", ""); }},
@@ -59,8 +55,8 @@ TEST(PathWatch, NoticesWhateverConcernsAFolder) {
         {"a file behind it", true, [&] { home.write("real/trust.d/b.pem", "b"); }},
     };
 
-    for (const auto& step : steps) {
-        step.act();
-        EXPECT_EQ(changed(watch), step.concerns) << step.what;
+    for (const auto& [what, concerns, act] : steps) {
+        act();
+        EXPECT_EQ(changed(watch), concerns) << what;
     }
 }

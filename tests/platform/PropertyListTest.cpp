@@ -73,10 +73,7 @@ TEST(PropertyListXml, AcceptsADocumentTypeAndComments) {
 }
 
 TEST(PropertyListXml, RefusesEverythingElse) {
-    const struct {
-        std::string text;
-        const char* reason;
-    } cases[] = {
+    const std::pair<std::string, const char*> cases[] = {
         {"", "no element found"},
         {"text", "syntax error"},
         {document(""), "no value"},
@@ -119,8 +116,8 @@ TEST(PropertyListXml, RefusesEverythingElse) {
          "an unknown entity"},
     };
 
-    for (const auto& c : cases)
-        EXPECT_THAT(reason(plist::parse(c.text)), HasSubstr(c.reason)) << c.text;
+    for (const auto& [text, complaint] : cases)
+        EXPECT_THAT(reason(plist::parse(text)), HasSubstr(complaint)) << text;
 }
 
 TEST(PropertyListXml, RefusesEntityDeclarationsBeforeTheyGrow) {

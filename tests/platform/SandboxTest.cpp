@@ -82,19 +82,15 @@ TEST(Confinement, ComparesFiltersAndNamespaces) {
     const Confinement self{1, "user:[1]", "mnt:[1]"};
     const Confinement first{0, "user:[1]", "mnt:[9]"};
 
-    const struct {
-        Confinement process;
-        bool confined;
-        bool confinedWithoutFirst;
-    } cases[] = {
+    const std::tuple<Confinement, bool, bool> cases[] = {
         {{1, "user:[1]", "mnt:[1]"}, false, false}, {{0, "user:[1]", "mnt:[1]"}, false, false},
         {{2, "user:[1]", "mnt:[1]"}, true, true},   {{1, "user:[2]", "mnt:[1]"}, true, true},
         {{1, "user:[1]", "mnt:[9]"}, false, true},  {{1, "user:[1]", "mnt:[2]"}, true, true},
     };
 
-    for (const auto& c : cases) {
-        EXPECT_EQ(isMoreConfined(c.process, self, first), c.confined);
-        EXPECT_EQ(isMoreConfined(c.process, self, std::nullopt), c.confinedWithoutFirst);
+    for (const auto& [process, confined, confinedWithoutFirst] : cases) {
+        EXPECT_EQ(isMoreConfined(process, self, first), confined);
+        EXPECT_EQ(isMoreConfined(process, self, std::nullopt), confinedWithoutFirst);
     }
 }
 

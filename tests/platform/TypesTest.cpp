@@ -32,11 +32,7 @@ TEST(DeclaredTypes, ConformThroughDeclarations) {
     const TestFolder folder;
     DeclaredTypes types(folder.write("Types.plist", *plist::writeXml(declarations())));
 
-    const struct {
-        const char* type;
-        const char* target;
-        bool conforms;
-    } cases[] = {
+    const std::tuple<const char*, const char*, bool> cases[] = {
         {"jpeg", "jpeg", true},     {"jpeg", "image", true},    {"jpeg", "data", true},
         {"png", "web", true},       {"image", "jpeg", false},   {"movie", "image", false},
         {"Jpeg", "image", false},   {"unknown", "data", false}, {"unknown", "unknown", true},
@@ -44,8 +40,8 @@ TEST(DeclaredTypes, ConformThroughDeclarations) {
         {"odder", "image", false},
     };
 
-    for (const auto& c : cases)
-        EXPECT_EQ(types.conforms(c.type, c.target), c.conforms) << c.type << " " << c.target;
+    for (const auto& [type, target, conforms] : cases)
+        EXPECT_EQ(types.conforms(type, target), conforms) << type << " " << target;
 }
 
 TEST(DeclaredTypes, ComeFromTheFileAndFromBundles) {
@@ -77,11 +73,7 @@ TEST(DeclaredTypes, EvaluateActivationRules) {
     DeclaredTypes types(folder.write("Types.plist", *plist::writeXml(declarations())));
     const Value rule = Dictionary{{"image", 2}, {"png", 3}, {"movie", true}, {"text", "many"}};
 
-    const struct {
-        Value rule;
-        Dictionary offer;
-        bool accepted;
-    } cases[] = {
+    const std::tuple<Value, Dictionary, bool> cases[] = {
         {true, {{"jpeg", 1}}, true},
         {1, {{"jpeg", 1}}, true},
         {false, {{"jpeg", 1}}, false},
@@ -104,7 +96,7 @@ TEST(DeclaredTypes, EvaluateActivationRules) {
         {rule, {{"jpeg", true}}, true},
     };
 
-    for (const auto& c : cases)
-        EXPECT_EQ(types.evaluateActivationRule(c.rule, c.offer), c.accepted)
-            << describe(c.rule) << " " << describe(c.offer);
+    for (const auto& [asked, offer, accepted] : cases)
+        EXPECT_EQ(types.evaluateActivationRule(asked, offer), accepted)
+            << describe(asked) << " " << describe(offer);
 }

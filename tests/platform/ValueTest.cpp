@@ -24,11 +24,7 @@ constexpr auto leastSigned = std::numeric_limits<std::int64_t>::min();
 } // namespace
 
 TEST(Value, ComparesNumbersByValueAcrossKinds) {
-    const struct {
-        Value a;
-        Value b;
-        bool equal;
-    } cases[] = {
+    const std::tuple<Value, Value, bool> cases[] = {
         {true, 1, true},
         {true, 1.0, true},
         {false, 0U, true},
@@ -51,9 +47,9 @@ TEST(Value, ComparesNumbersByValueAcrossKinds) {
         {Date{1}, 1, false},
     };
 
-    for (const auto& c : cases) {
-        EXPECT_EQ(c.a == c.b, c.equal) << describe(c.a) << " " << describe(c.b);
-        EXPECT_EQ(c.b == c.a, c.equal) << describe(c.b) << " " << describe(c.a);
+    for (const auto& [a, b, equal] : cases) {
+        EXPECT_EQ(a == b, equal) << describe(a) << " " << describe(b);
+        EXPECT_EQ(b == a, equal) << describe(b) << " " << describe(a);
     }
 }
 
@@ -88,11 +84,7 @@ TEST(Value, ComparesOtherKindsByContent) {
 }
 
 TEST(Value, TakesAnyNumberWhereANumberIsAskedFor) {
-    const struct {
-        Value value;
-        std::optional<std::int64_t> integer;
-        std::optional<bool> truth;
-    } cases[] = {
+    const std::tuple<Value, std::optional<std::int64_t>, std::optional<bool>> cases[] = {
         {true, 1, true},
         {-7, -7, true},
         {mostUnsigned, std::numeric_limits<std::int64_t>::max(), true},
@@ -107,9 +99,9 @@ TEST(Value, TakesAnyNumberWhereANumberIsAskedFor) {
         {Value(), std::nullopt, std::nullopt},
     };
 
-    for (const auto& c : cases) {
-        EXPECT_EQ(c.value.integerValue(), c.integer) << describe(c.value);
-        EXPECT_EQ(c.value.booleanValue(), c.truth) << describe(c.value);
+    for (const auto& [value, integer, truth] : cases) {
+        EXPECT_EQ(value.integerValue(), integer) << describe(value);
+        EXPECT_EQ(value.booleanValue(), truth) << describe(value);
     }
 }
 
@@ -180,11 +172,7 @@ TEST(Uuid, ReadsBothCasesAndWritesUpper) {
 }
 
 TEST(NumericOrder, ComparesDigitRunsByValue) {
-    const struct {
-        const char* a;
-        const char* b;
-        std::weak_ordering order;
-    } cases[] = {
+    const std::tuple<const char*, const char*, std::weak_ordering> cases[] = {
         {"1.10", "1.9", std::weak_ordering::greater},
         {"1.2", "1.2.0", std::weak_ordering::less},
         {"", "0", std::weak_ordering::less},
@@ -200,10 +188,9 @@ TEST(NumericOrder, ComparesDigitRunsByValue) {
         {"99999999999999999999999", "100000000000000000000000", std::weak_ordering::less},
     };
 
-    for (const auto& c : cases) {
-        EXPECT_EQ(compareNumerically(c.a, c.b), c.order) << c.a << " " << c.b;
-        EXPECT_EQ(compareNumerically(c.b, c.a), 0 <=> c.order) << c.a << " " << c.b;
-        EXPECT_EQ(numericEqualityKey(c.a) == numericEqualityKey(c.b), c.order == 0)
-            << c.a << " " << c.b;
+    for (const auto& [a, b, order] : cases) {
+        EXPECT_EQ(compareNumerically(a, b), order) << a << " " << b;
+        EXPECT_EQ(compareNumerically(b, a), 0 <=> order) << a << " " << b;
+        EXPECT_EQ(numericEqualityKey(a) == numericEqualityKey(b), order == 0) << a << " " << b;
     }
 }

@@ -32,11 +32,7 @@ TEST_F(RegistryTest, AgreesWithHostsOnExtensionPoints) {
     const std::string file = std::string(identifier) + ".plist";
     const std::string first = "a/" + file;
 
-    struct {
-        const char* what;
-        std::function<void()> prepare;
-        bool known;
-    } const cases[] = {
+    const std::tuple<const char*, std::function<void()>, bool> cases[] = {
         {"none", [] {}, false},
         {"in one folder", [&] { home.write("z/" + file, listOf("z")); }, true},
         {"in both",
@@ -76,17 +72,17 @@ TEST_F(RegistryTest, AgreesWithHostsOnExtensionPoints) {
          false},
     };
 
-    for (const auto& c : cases) {
-        SCOPED_TRACE(c.what);
+    for (const auto& [what, prepare, known] : cases) {
+        SCOPED_TRACE(what);
         for (const char* folder : {"a", "z", "else"}) {
             remove(folder);
             std::filesystem::create_directories(home / folder);
         }
-        c.prepare();
+        prepare();
         open();
         const auto point = registry->extensionPointForIdentifier(identifier);
         const auto read = platform::readExtensionPoint(places.extensionPointFolders, identifier);
-        EXPECT_EQ(point.has_value(), c.known);
+        EXPECT_EQ(point.has_value(), known);
         EXPECT_EQ(read, point ? point->sdkEntry : std::nullopt);
     }
 }

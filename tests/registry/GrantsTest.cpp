@@ -225,10 +225,7 @@ TEST_F(Grants, WhatTheDatabaseLostIsJudgedAgainOrAbsent) {
     sign(one, "good");
     letClockTick();
 
-    const struct {
-        const char* sql;
-        std::optional<Dictionary> entitlements;
-    } cases[] = {
+    const std::pair<const char*, std::optional<Dictionary>> cases[] = {
         {"UPDATE signatures SET entitlements = x'ff'", some},
         {"UPDATE signatures SET key = x''", some},
         {"UPDATE signatures SET content = 'bad', key = 'unknown'", std::nullopt},
@@ -236,12 +233,12 @@ TEST_F(Grants, WhatTheDatabaseLostIsJudgedAgainOrAbsent) {
         {"DELETE FROM details", std::nullopt},
     };
 
-    for (const auto& c : cases) {
-        SCOPED_TRACE(c.sql);
+    for (const auto& [sql, entitlements] : cases) {
+        SCOPED_TRACE(sql);
         open();
-        execute(c.sql);
+        execute(sql);
         open();
-        EXPECT_EQ(at(one)->entitlements(), c.entitlements);
+        EXPECT_EQ(at(one)->entitlements(), entitlements);
     }
 }
 

@@ -117,20 +117,17 @@ TEST_F(Trust, RefusesIdentifiersThatCannotBeFileNames) {
     const std::string longest(255, 'i');
     const std::string tooLong(256, 'i');
 
-    struct {
-        std::string identifier;
-        bool fine;
-    } const cases[] = {
+    const std::pair<std::string, bool> cases[] = {
         {"", false},     {".", false},     {"..", false},        {"a/b", false},
         {"a\tb", false}, {"a\x7f", false}, {"a\u0085b", false},  {tooLong, false},
         {longest, true}, {"...", true},    {"\u00fc ber", true}, {"a:b", true},
     };
 
-    for (const auto& c : cases) {
-        SCOPED_TRACE(c.identifier);
-        makePlugIn(bad, c.identifier);
+    for (const auto& [identifier, fine] : cases) {
+        SCOPED_TRACE(identifier);
+        makePlugIn(bad, identifier);
         open();
-        EXPECT_EQ(at(bad) != nullptr, c.fine);
+        EXPECT_EQ(at(bad) != nullptr, fine);
         EXPECT_TRUE(at(good));
     }
 }
