@@ -20,49 +20,43 @@ struct AttributeWorld : RecordWorld {
     ZPDPlugIn::Ptr plugIn;
 };
 
-struct Comparison {
-    const char* pattern;
-    const char* value;
-    bool holds;
-};
-
 } // namespace
 
 TEST(Rules, CompareTextsByTheirOperators) {
-    const Comparison cases[] = {
-        {"a", "a", true},
-        {"a", "A", false},
-        {"", "", true},
-        {"=a", "a", true},
-        {"=", "", true},
-        {"=<x", "<x", true},
-        {"=<x", "a", false},
-        {"<>a", "b", true},
-        {"<>a", "a", false},
-        {"<>", "", false},
-        {"<>", "a", true},
-        {">=2.10", "2.9", false},
-        {">=2.10", "2.10.1", true},
-        {">=2.10", "2.10", true},
-        {"<=2.10", "2.9", true},
-        {"<=2.10", "2.11", false},
-        {"<2", "10", false},
-        {"<10", "2", true},
-        {"<2", "2", false},
-        {">9", "10", true},
-        {">10", "10", false},
-        {"<=>", "=", true},
-        {"<=>", "?", false},
-        {"01", "1", true},
-        {"*", "a", false},
-        {"*", "*", true},
-        {"a*", "ab", false},
-        {"?KM-OTHER:a", "a", false},
-        {"?", "?", false},
+    using Texts = std::vector<const char*>;
+
+    const struct {
+        const char* pattern;
+        Texts held; // by these values
+        Texts others = {};
+    } cases[] = {
+        {"a", {"a"}, {"A"}},
+        {"", {""}},
+        {"=a", {"a"}},
+        {"=", {""}},
+        {"=<x", {"<x"}, {"a"}},
+        {"<>a", {"b"}, {"a"}},
+        {"<>", {"a"}, {""}},
+        {">=2.10", {"2.10", "2.10.1"}, {"2.9"}},
+        {"<=2.10", {"2.9"}, {"2.11"}},
+        {"<2", {}, {"2", "10"}},
+        {"<10", {"2"}},
+        {">9", {"10"}},
+        {">10", {}, {"10"}},
+        {"<=>", {"="}, {"?"}},
+        {"01", {"1"}},
+        {"*", {"*"}, {"a"}},
+        {"a*", {}, {"ab"}},
+        {"?KM-OTHER:a", {}, {"a"}},
+        {"?", {}, {"?"}},
     };
-    for (const auto& c : cases) {
-        EXPECT_EQ(AttributeWorld(c.value).holds(c.pattern), c.holds)
-            << "\"" << c.value << "\" with \"" << c.pattern << "\"";
+
+    for (const auto& [pattern, held, others] : cases) {
+        SCOPED_TRACE(pattern);
+        for (const char* value : held)
+            EXPECT_TRUE(AttributeWorld(value).holds(pattern)) << value;
+        for (const char* value : others)
+            EXPECT_FALSE(AttributeWorld(value).holds(pattern)) << value;
     }
 }
 

@@ -73,51 +73,53 @@ TEST(PropertyListXml, AcceptsADocumentTypeAndComments) {
 }
 
 TEST(PropertyListXml, RefusesEverythingElse) {
-    const std::pair<std::string, const char*> cases[] = {
-        {"", "no element found"},
-        {"text", "syntax error"},
-        {document(""), "no value"},
-        {document("<true/><true/>"), "a value where none belongs"},
-        {document("<array><true></array>"), "mismatched tag"},
-        {document("<true/>") + "<plist/>", "junk after"},
-        {"<dict/>", "a value where none belongs"},
-        {document("<plist><true/></plist>"), "a plist inside a plist"},
-        {document("<array><other/></array>"), "an unknown element"},
-        {document("<array><true/>text</array>"), "text between values"},
-        {document("<string a='b'>x</string>"), "an attribute"},
-        {document("<string>x<true/></string>"), "an element inside a simple value"},
-        {document("<true>x</true>"), "a malformed value"},
-        {document("<key>a</key>"), "a key where a value belongs"},
-        {document("<array><key>a</key></array>"), "a key where a value belongs"},
-        {document("<dict><key>a</key><key>b</key></dict>"), "a key where a value belongs"},
-        {document("<dict><true/></dict>"), "a value where none belongs"},
-        {document("<dict><key>a</key></dict>"), "a key without value"},
-        {document("<dict><key>a</key><dict><array/></dict></dict>"), "a value where none belongs"},
-        {document("<integer></integer>"), "a malformed value"},
-        {document("<integer>1 2</integer>"), "a malformed value"},
-        {document("<integer>--1</integer>"), "a malformed value"},
-        {document("<integer>18446744073709551616</integer>"), "a malformed value"},
-        {document("<integer>-9223372036854775809</integer>"), "a malformed value"},
-        {document("<integer>0x</integer>"), "a malformed value"},
-        {document("<real>nan</real>"), "a malformed value"},
-        {document("<real>1e999</real>"), "a malformed value"},
-        {document("<date>2026-02-29T00:00:00Z</date>"), "a malformed value"},
-        {document("<date>2026-11-22T24:00:00Z</date>"), "a malformed value"},
-        {document("<date>2026-11-22 22:05:00Z</date>"), "a malformed value"},
-        {document("<date>2026-11-22T22:05:00.Z</date>"), "a malformed value"},
-        {document("<date>2026-11-22T22:05:00.5</date>"), "a malformed value"},
-        {document("<date>2026-11-22T22:05:00.1e3Z</date>"), "a malformed value"},
-        {document("<data>AAE</data>"), "a malformed value"},
-        {document("<data>A=E=</data>"), "a malformed value"},
-        {document("<data>A!==</data>"), "a malformed value"},
-        {document("<string>\xff</string>"), "invalid token"},
-        {document("<string>&unknown;</string>"), "undefined entity"},
-        {"<!DOCTYPE plist SYSTEM \"file:///etc/passwd\"><plist><string>&x;</string></plist>",
-         "an unknown entity"},
+    const std::pair<const char*, std::vector<std::string>> cases[] = {
+        {"no element found", {""}},
+        {"syntax error", {"text"}},
+        {"no value", {document("")}},
+        {"a value where none belongs",
+         {"<dict/>", document("<true/><true/>"), document("<dict><true/></dict>"),
+          document("<dict><key>a</key><dict><array/></dict></dict>")}},
+        {"mismatched tag", {document("<array><true></array>")}},
+        {"junk after", {document("<true/>") + "<plist/>"}},
+        {"a plist inside a plist", {document("<plist><true/></plist>")}},
+        {"an unknown element", {document("<array><other/></array>")}},
+        {"text between values", {document("<array><true/>text</array>")}},
+        {"an attribute", {document("<string a='b'>x</string>")}},
+        {"an element inside a simple value", {document("<string>x<true/></string>")}},
+        {"a key where a value belongs",
+         {document("<key>a</key>"), document("<array><key>a</key></array>"),
+          document("<dict><key>a</key><key>b</key></dict>")}},
+        {"a key without value", {document("<dict><key>a</key></dict>")}},
+        {"invalid token", {document("<string>\xff</string>")}},
+        {"undefined entity", {document("<string>&unknown;</string>")}},
+        {"an unknown entity",
+         {"<!DOCTYPE plist SYSTEM \"file:///etc/passwd\"><plist><string>&x;</string></plist>"}},
     };
 
-    for (const auto& [text, complaint] : cases)
-        EXPECT_THAT(reason(plist::parse(text)), HasSubstr(complaint)) << text;
+    for (const auto& [complaint, texts] : cases) {
+        for (const std::string& text : texts)
+            EXPECT_THAT(reason(plist::parse(text)), HasSubstr(complaint)) << text;
+    }
+}
+
+TEST(PropertyListXml, RefusesMalformedValues) {
+    const std::pair<const char*, std::vector<const char*>> cases[] = {
+        {"true", {"x"}},
+        {"integer", {"", "1 2", "--1", "18446744073709551616", "-9223372036854775809", "0x"}},
+        {"real", {"nan", "1e999"}},
+        {"date",
+         {"2026-02-29T00:00:00Z", "2026-11-22T24:00:00Z", "2026-11-22 22:05:00Z",
+          "2026-11-22T22:05:00.Z", "2026-11-22T22:05:00.5", "2026-11-22T22:05:00.1e3Z"}},
+        {"data", {"AAE", "A=E=", "A!=="}},
+    };
+    for (const auto& [element, contents] : cases) {
+        const std::string name = element;
+        for (const std::string content : contents) {
+            const auto text = document("<" + name + ">" + content + "</" + name + ">");
+            EXPECT_THAT(reason(plist::parse(text)), HasSubstr("a malformed value")) << text;
+        }
+    }
 }
 
 TEST(PropertyListXml, RefusesEntityDeclarationsBeforeTheyGrow) {
@@ -159,31 +161,24 @@ TEST(PropertyListXml, WritesWhatItReads) {
     std::string everyByte;
     for (int i = 0; i < 256; ++i)
         everyByte += static_cast<char>(i);
-    const Value values[] = {"",
-                            "a\r\n\tb <&> \"'\xe2\x82\xac\xf0\x9f\x98\x80 ]]>",
-                            "  blanks  ",
-                            true,
-                            false,
-                            0,
-                            -1,
-                            std::numeric_limits<std::uint64_t>::max(),
-                            std::numeric_limits<std::int64_t>::min(),
-                            0.1,
-                            -1e300,
-                            5e-324,
-                            3.0,
-                            Date{0},
-                            Date{-62167219200},
-                            Date{253402300799.99997},
-                            Date{1795385100.1},
-                            Date{-0.25},
-                            Date{-5e-324},
-                            Date{-62167219199.5},
-                            Data{SharedBytes(everyByte)},
-                            Data{SharedBytes(everyByte.substr(0, 254))},
-                            Array{},
-                            Dictionary{},
-                            Array{Array{}, Dictionary{{"", Array{1, "x"}}, {"k<\r", false}}}};
+    std::vector<Value> values = {true,
+                                 false,
+                                 0,
+                                 -1,
+                                 std::numeric_limits<std::uint64_t>::max(),
+                                 std::numeric_limits<std::int64_t>::min(),
+                                 Data{SharedBytes(everyByte)},
+                                 Data{SharedBytes(everyByte.substr(0, 254))},
+                                 Array{},
+                                 Dictionary{},
+                                 Array{Array{}, Dictionary{{"", Array{1, "x"}}, {"k<\r", false}}}};
+    for (const char* text : {"", "a\r\n\tb <&> \"'\xe2\x82\xac\xf0\x9f\x98\x80 ]]>", "  blanks  "})
+        values.emplace_back(text);
+    for (const double number : {0.1, -1e300, 5e-324, 3.0})
+        values.emplace_back(number);
+    for (const double time :
+         {0.0, -62167219200.0, 253402300799.99997, 1795385100.1, -0.25, -5e-324, -62167219199.5})
+        values.emplace_back(Date{time});
     for (const Value& value : values) {
         const auto text = plist::writeXml(value);
         ASSERT_TRUE(text) << describe(value);
