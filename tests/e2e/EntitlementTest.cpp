@@ -1,19 +1,12 @@
 // Whose entitlements count: what a signed program may do, and what takes it away.
 
-#include <filesystem>
 #include <functional>
 #include <unistd.h>
 
-#include <gtest/gtest.h>
-
-#include "tests/e2e/PlistWriter.h"
-#include "tests/e2e/Replies.h"
 #include "tests/e2e/Signing.h"
 
 namespace e2e {
 namespace {
-
-namespace fs = std::filesystem;
 
 constexpr uid_t stranger = 4711;
 
@@ -29,47 +22,44 @@ void giveAway(const std::string& path) {
     ASSERT_EQ(chown(path.c_str(), stranger, stranger), 0);
 }
 
-// A home with a signed application and a signed lone program, both of them probes.
-class Entitlements : public testing::Test {
+// Beside the lone program that is signed an application, both of them probes.
+class Entitlements : public ManagerTest {
 protected:
     Entitlements() {
         addProgram(app + "/Manager");
-        addProgram(lone);
         key.sign(app);
-        key.sign(lone);
-        daemon.emplace(home.path());
+        start();
     }
 
-    [[nodiscard]] std::vector<std::string> command(const std::string& program) const {
-        return {program, daemon->socketPath(), "hello", "ask"};
+    struct Spoiling {
+        const char* what;
+        std::string program;
+        std::function<void()> spoil;
+    };
+
+    // Each program is what it should be until it is spoilt.
+    void expectLost(const std::vector<Spoiling>& cases) const {
+        for (const auto& [what, program, spoil] : cases) {
+            SCOPED_TRACE(what);
+            ASSERT_EQ(answerTo(program), granted);
+            spoil();
+            EXPECT_EQ(answerTo(program), refused);
+        }
     }
 
-    [[nodiscard]] std::string answerTo(const std::vector<std::string>& command) const {
-        return Talk(home, command).hear();
-    }
-
-    void restart() {
-        EXPECT_EQ(daemon->terminate(), 0);
-        daemon.emplace(home.path());
-    }
-
-    const Home home;
-    const Signer key{home};
     const std::string app = home.addApp("Manager");
     const std::string executable = app + "/Manager";
-    const std::string lone = home / "tools/probe";
-    std::optional<Daemon> daemon;
+    const std::string& lone = manager;
 };
 
 TEST_F(Entitlements, CountForSignedPrograms) {
-    EXPECT_EQ(answerTo(command(lone)), granted);
-    EXPECT_EQ(answerTo(command(executable)), granted);
-    auto managed = command(lone);
+    EXPECT_EQ(answerTo(lone), granted);
+    EXPECT_EQ(answerTo(executable), granted);
+    Words managed = command(lone, {"hello", "ask"});
     managed.insert(managed.begin(), {"/bin/sh", "-c", R"(exec "$0" "$@")"});
-    EXPECT_EQ(answerTo(managed), granted) << "becomes the program before it connects";
-    EXPECT_EQ(answerTo({lone, daemon->socketPath(), "connect", "listen", "ask"}), refused)
-        << "leaves the greeting";
-    EXPECT_EQ(answerTo({lone, daemon->socketPath(), "connect", "listen", "names"}), "plug-ins: ");
+    EXPECT_EQ(Talk(home, managed).hear(), granted) << "becomes the program before it connects";
+    Talk rude(home, command(lone, {"connect", "listen", "ask", "names"}));
+    EXPECT_EQ(rude.rest(), (Words{refused, "plug-ins: "})) << "no greeting";
 }
 
 TEST_F(Entitlements, CountAgainAfterTheDaemonsRestart) {
@@ -80,44 +70,27 @@ TEST_F(Entitlements, CountAgainAfterTheDaemonsRestart) {
     independent.tell("hello");
     EXPECT_EQ(independent.ask(), granted);
     EXPECT_EQ(withLibrary.ask(), granted);
-    restart();
+    stop();
+    start();
     independent.tell("hello");
     EXPECT_EQ(independent.ask(), granted);
     EXPECT_EQ(withLibrary.ask(), granted);
 }
 
-struct Spoiling {
-    const char* what;
-    std::string program;
-    std::function<void()> spoil;
-};
-
 TEST_F(Entitlements, DoNotCountForWhatIsNotAsItWasSigned) {
     const Signer untrusted(home, "other", false);
-    const std::string unsignedCopy = addProgram(home / "tools/unsigned");
     const std::string open = addProgram(home / "open/probe");
     key.sign(open);
-    const std::vector<Spoiling> cases = {
-        {"unsigned", unsignedCopy, [] {}},
-        {"in a folder that others can write", open,
-         [&] { fs::permissions(home / "open", fs::perms(0777)); }},
-        {"one byte of Info.plist", executable, [&] { changeByte(app + "/Info.plist", 1); }},
-        {"one byte of a lone executable", lone, [&] { changeByte(lone, 1); }},
-        {"one byte of its signature", lone,
-         [&] {
-             key.sign(lone);
-             ASSERT_EQ(answerTo(command(lone)), granted);
-             changeByte(lone + ".signature", 200);
-         }},
-        {"signed with a key that is not trusted", lone, [&] { untrusted.sign(lone); }}};
-    for (const Spoiling& each : cases) {
-        SCOPED_TRACE(each.what);
-        if (each.program != unsignedCopy && each.program != lone) {
-            ASSERT_EQ(answerTo(command(each.program)), granted);
-        }
-        each.spoil();
-        EXPECT_EQ(answerTo(command(each.program)), refused);
-    }
+    EXPECT_EQ(answerTo(addProgram(home / "tools/unsigned")), refused);
+    expectLost({{"in a folder that others can write", open,
+                 [&] { fs::permissions(home / "open", fs::perms(0777)); }},
+                {"one byte of Info.plist", executable, [&] { changeByte(app + "/Info.plist", 1); }},
+                {"one byte of a lone executable", lone, [&] { changeByte(lone, 1); }}});
+    key.sign(lone);
+    expectLost(
+        {{"one byte of its signature", lone, [&] { changeByte(lone + ".signature", 200); }}});
+    key.sign(lone);
+    expectLost({{"signed with a key that is not trusted", lone, [&] { untrusted.sign(lone); }}});
 }
 
 TEST_F(Entitlements, AreLostWhileTheProgramRuns) {
@@ -148,33 +121,24 @@ TEST_F(Entitlements, RestOnFilesThatNobodyElseOwns) {
     const std::string folder = home / "other/folder";
     const std::string below = addProgram(folder + "/probe");
     key.sign(below);
-    const std::vector<Spoiling> cases = {
-        {"the bundle", executable, [&] { giveAway(app); }},
-        {"a folder above the program", below, [&] { giveAway(home / "other"); }},
-        {"the signature", lone, [&] { giveAway(lone + ".signature"); }}};
-    for (const Spoiling& each : cases) {
-        SCOPED_TRACE(each.what);
-        ASSERT_EQ(answerTo(command(each.program)), granted);
-        each.spoil();
-        EXPECT_EQ(answerTo(command(each.program)), refused);
-    }
+    expectLost({{"the bundle", executable, [&] { giveAway(app); }},
+                {"a folder above the program", below, [&] { giveAway(home / "other"); }},
+                {"the signature", lone, [&] { giveAway(lone + ".signature"); }}});
     key.sign(lone);
     ASSERT_EQ(chown((lone + ".signature").c_str(), 0, 0), 0);
-    ASSERT_EQ(answerTo(command(lone)), granted);
-    giveAway(home / "etc/trust.d");
-    EXPECT_EQ(answerTo(command(lone)), refused) << "the trust folder";
+    expectLost({{"the trust folder", lone, [&] { giveAway(home / "etc/trust.d"); }}});
 }
 
 TEST_F(Entitlements, DecideWhatAHostIsOffered) {
-    addAppWith(home, "Free", {.identifier = "free"});
-    addAppWith(home, "Other", {.identifier = "other"});
+    home.addAppWithPlugIns("Some", {"free", "other"});
     addAppWith(home, "Asking",
                {.identifier = "asking",
                 .extension = Item::map({{"HXExtensionHostEntitlement", "com.example.host"}})});
-    restart();
+    stop();
+    start();
     const auto offered = [&](const Item& entitlements) {
         key.sign(lone, entitlements);
-        return answerTo({lone, daemon->socketPath(), "hello", "names"});
+        return answerTo(lone, {"hello", "names"});
     };
     const char* const allowed = "com.tovana.developer.zephrin.allowedplugins";
     const Item justFree = Item::map({{"BQBundleIdentifier", "free"}});

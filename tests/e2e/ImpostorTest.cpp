@@ -1,13 +1,9 @@
 // Programs that would pass for the one that connected: by becoming a signed program, by keeping its
 // socket, by its pid.
 
-#include <filesystem>
 #include <memory>
 #include <unistd.h>
 
-#include <gtest/gtest.h>
-
-#include "tests/e2e/Replies.h"
 #include "tests/e2e/Signing.h"
 
 namespace e2e {
@@ -15,36 +11,27 @@ namespace {
 
 constexpr int tries = 200;
 
-class Impostors : public testing::Test {
+class Impostors : public ManagerTest {
 protected:
     Impostors() {
-        key.sign(probe);
-        std::filesystem::copy_file("/bin/sleep", sleeper);
+        fs::copy_file("/bin/sleep", sleeper);
         key.sign(sleeper);
-        daemon.emplace(home.path());
-    }
-
-    using Command = std::vector<std::string>;
-
-    [[nodiscard]] Command command(const std::string& program, const Command& steps) const {
-        Command result = {program, daemon->socketPath()};
-        result.insert(result.end(), steps.begin(), steps.end());
-        return result;
+        start();
     }
 
     // Each says `expected`, line by line.
-    void paced(const Command& command, const Command& expected) const {
+    void paced(const Words& probes, const Words& expected) const {
         for (int i = 0; i < tries && !HasFailure(); ++i)
-            EXPECT_EQ(Talk(home, command).rest(), expected);
+            EXPECT_EQ(Talk(home, probes).rest(), expected);
     }
 
     // All at once. They run before the daemon looks at any of them when it is `stopped` meanwhile.
-    void burst(const Command& command, const Command& expected, bool stopped) const {
+    void burst(const Words& probes, const Words& expected, bool stopped) const {
         std::vector<std::unique_ptr<Talk>> all;
         if (stopped)
             kill(daemon->pid(), SIGSTOP);
         for (int i = 0; i < tries; ++i)
-            all.push_back(std::make_unique<Talk>(home, command));
+            all.push_back(std::make_unique<Talk>(home, probes));
         if (stopped) {
             std::this_thread::sleep_for(500ms);
             kill(daemon->pid(), SIGCONT);
@@ -53,18 +40,15 @@ protected:
             EXPECT_EQ(each->rest(), expected);
     }
 
-    const Home home;
-    const Signer key{home};
-    const std::string probe = addProgram(home / "tools/probe");
+    const std::string& probe = manager;
     const std::string unsignedProbe = addProgram(home / "tools/unsigned");
     const std::string sleeper = home / "tools/sleeper";
-    std::optional<Daemon> daemon;
 };
 
 TEST_F(Impostors, BecomeASignedProgramAfterConnecting) {
-    const Command both = {refused, refused};
-    const Command whole = command(unsignedProbe, {"exec-aside " + sleeper + " 60"});
-    const Command half = command(unsignedProbe, {"exec-aside-half " + sleeper + " 60"});
+    const Words both = {refused, refused};
+    const Words whole = command(unsignedProbe, {"exec-aside " + sleeper + " 60"});
+    const Words half = command(unsignedProbe, {"exec-aside-half " + sleeper + " 60"});
     paced(whole, both);
     burst(half, both, false);
     const std::size_t before = daemon->linesWith(" " + sleeper);
@@ -74,8 +58,8 @@ TEST_F(Impostors, BecomeASignedProgramAfterConnecting) {
 }
 
 TEST_F(Impostors, KeepTheSocketOfASignedProgram) {
-    Command steps = {"hello", "ask"};
-    Command answers = {granted};
+    Words steps = {"hello", "ask"};
+    Words answers = {granted};
     for (int i = 0; i < tries; ++i) {
         steps.emplace_back("child-asks");
         answers.push_back(refused);
@@ -84,7 +68,7 @@ TEST_F(Impostors, KeepTheSocketOfASignedProgram) {
     answers.push_back(granted);
     EXPECT_EQ(Talk(home, command(probe, steps)).rest(), answers);
 
-    const Command heir = command(probe, {"hello", "ask", "heir-asks"});
+    const Words heir = command(probe, {"hello", "ask", "heir-asks"});
     paced(heir, {granted, refused});
     burst(heir, {granted, refused}, false);
 }
@@ -105,7 +89,7 @@ TEST_F(Impostors, HaveThePidOfTheSignedProgramThatLeftThemItsSocket) {
 }
 
 TEST_F(Impostors, ForgeThePidOfASignedProgramFromNamespacesOfTheirOwn) {
-    const Command attack = command(unsignedProbe, {"forge " + sleeper});
+    const Words attack = command(unsignedProbe, {"forge " + sleeper});
     const auto user = geteuid() == 0 ? std::optional<uid_t>(4711) : std::nullopt;
     Talk talk(home, attack, user);
     kill(daemon->pid(), SIGSTOP);
@@ -121,11 +105,11 @@ TEST_F(Impostors, StallNobodyWithHugeFiles) {
     constexpr std::uintmax_t terabyte = std::uintmax_t{1} << 40;
     const std::string huge = addProgram(home / "tools/huge");
     key.sign(huge);
-    std::filesystem::resize_file(huge, terabyte);
+    fs::resize_file(huge, terabyte);
     const auto start = std::chrono::steady_clock::now();
     Talk talk(home, command(huge, {"hello", "ask"}));
     for (int i = 0; i < 20; ++i)
-        EXPECT_EQ(Talk(home, command(probe, {"hello", "ask"})).hear(), granted);
+        EXPECT_EQ(answerTo(probe), granted);
     EXPECT_EQ(talk.hear(), refused);
     EXPECT_LT(std::chrono::steady_clock::now() - start, 10s);
 }

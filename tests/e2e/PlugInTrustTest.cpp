@@ -1,21 +1,10 @@
-#include <filesystem>
-#include <thread>
-
-#include <gtest/gtest.h>
-
-#include "tests/e2e/Daemon.h"
-#include "tests/e2e/Home.h"
-#include "tests/e2e/PlistWriter.h"
-#include "tests/e2e/Replies.h"
 #include "tests/e2e/Signing.h"
 
 namespace e2e {
 namespace {
 
-namespace fs = std::filesystem;
-
 // Plug-ins that the keys of a test make what they are. Somebody elected "old".
-class PlugInTrust : public testing::Test {
+class PlugInTrust : public DaemonTest {
 protected:
     PlugInTrust() {
         signer.sign(elected, Item::map({{"com.tovana.developer.auto-elect-plugin", true},
@@ -34,32 +23,24 @@ protected:
     }
 
     // Who is elected, who has an entitlement, who is replaced.
-    [[nodiscard]] static std::string seen(WireClient& client) {
+    [[nodiscard]] std::string state() {
         std::string replaced;
-        for (const Item& form : match(client, Item::map({}))) {
+        for (const Item& form : match(*client)) {
             if (form.has("overrider"))
                 replaced += form["identifier"].text();
         }
-        return matched(client, Item::map({{"HXUserElection", "1"}})) + ", " +
-               matched(client, Item::map({{"ENTITLEMENT:com.example.may", true}})) + ", " +
-               replaced;
+        return seen(Item::map({{"HXUserElection", "1"}})) + ", " +
+               seen(Item::map({{"ENTITLEMENT:com.example.may", true}})) + ", " + replaced;
     }
 
-    // The same as soon as it is what was expected.
-    [[nodiscard]] static std::string becomes(WireClient& client, const std::string& expected) {
-        std::string now = seen(client);
-        for (int i = 0; i < 200 && now != expected; ++i) {
-            std::this_thread::sleep_for(std::chrono::milliseconds(25));
-            now = seen(client);
-        }
-        return now;
+    void expectSoon(const std::string& expected) {
+        EXPECT_TRUE(eventually([&] { return state() == expected; })) << state();
     }
 
-    [[nodiscard]] std::size_t complaints(const Daemon& daemon, const std::string& plugIn) const {
-        return daemon.linesWith("the signature of " + plugIn + " does not count: ");
+    void expectComplaints(const std::string& plugIn, std::size_t count) const {
+        expectLog({{"the signature of " + plugIn + " does not count: ", count}});
     }
 
-    const Home home;
     const std::string app = home.addApp("Some");
     const std::string elected = add("elected");
     const std::string forged = add("forged");
@@ -77,30 +58,29 @@ constexpr const char* afterwards = "elected old, , ";
 
 TEST_F(PlugInTrust, FollowsTheKeysWhileTheDaemonRuns) {
     fs::remove_all(home / "etc");
-    Daemon daemon(home.path());
-    WireClient client = daemon.connect();
-    EXPECT_EQ(seen(client), nothing);
+    start();
+    EXPECT_EQ(state(), nothing);
 
-    const Item before = findAt(client, replacing);
+    const Item before = findAt(*client, replacing);
     fs::create_directories(fs::path(key).parent_path());
     fs::copy_file(home / "keys-key/zephrin.pub.pem", key);
-    EXPECT_EQ(becomes(client, everything), everything);
-    EXPECT_EQ(findAt(client, replacing)["uuid"], before["uuid"]);
-    EXPECT_EQ(findAt(client, replacing)["annotations"], Item::map({{"election", 1}}));
+    expectSoon(everything);
+    EXPECT_EQ(findAt(*client, replacing)["uuid"], before["uuid"]);
+    EXPECT_EQ(findAt(*client, replacing)["annotations"], Item::map({{"election", 1}}));
 
     fs::rename(key, away);
-    EXPECT_EQ(becomes(client, afterwards), afterwards);
+    expectSoon(afterwards);
     fs::rename(away, key);
-    EXPECT_EQ(becomes(client, everything), everything);
-    fs::permissions(fs::path(key).parent_path(), fs::perms(0777));
-    EXPECT_EQ(becomes(client, afterwards), afterwards) << "others may add keys";
+    expectSoon(everything);
+    fs::permissions(fs::path(key).parent_path(), fs::perms(0777)); // others may add keys
+    expectSoon(afterwards);
 
-    EXPECT_EQ(daemon.terminate(), 0);
-    EXPECT_GE(daemon.linesWith("ops default: trust change detected; purging cache"), 4u);
-    EXPECT_EQ(complaints(daemon, forged), 2u) << "untrusted, and made for another bundle";
-    EXPECT_EQ(complaints(daemon, elected), 1u) << "untrusted";
-    EXPECT_EQ(complaints(daemon, replacing), 1u) << "untrusted";
-    EXPECT_EQ(complaints(daemon, old), 0u);
+    stop();
+    EXPECT_GE(daemon->linesWith("ops default: trust change detected; purging cache"), 4u);
+    expectComplaints(forged, 2); // untrusted, and made for another bundle
+    expectComplaints(elected, 1);
+    expectComplaints(replacing, 1);
+    expectComplaints(old, 0);
 }
 
 TEST_F(PlugInTrust, OutlivesTheDaemonButNoChangeOfAByte) {
@@ -110,11 +90,7 @@ TEST_F(PlugInTrust, OutlivesTheDaemonButNoChangeOfAByte) {
         writeFile(file, content);
     };
 
-    const struct {
-        const char* what;
-        std::function<void()> change;
-        const char* seen;
-    } steps[] = {
+    const std::tuple<const char*, std::function<void()>, std::string> steps[] = {
         {"as it was signed", [] {}, everything},
         {"without a change", [] {}, everything},
         {"without a key", [&] { fs::rename(key, away); }, afterwards},
@@ -137,18 +113,16 @@ TEST_F(PlugInTrust, OutlivesTheDaemonButNoChangeOfAByte) {
          afterwards},
     };
 
-    for (const auto& step : steps) {
-        SCOPED_TRACE(step.what);
-        step.change();
+    for (const auto& [what, change, expected] : steps) {
+        SCOPED_TRACE(what);
+        change();
         writeFile(home / "zpd.log", "");
-        Daemon daemon(home.path());
-        {
-            WireClient client = daemon.connect();
-            EXPECT_EQ(seen(client), step.seen);
-        }
-        EXPECT_EQ(daemon.terminate(), 0);
-        EXPECT_EQ(complaints(daemon, forged), 1u);
-        EXPECT_EQ(complaints(daemon, elected), step.seen == std::string(afterwards) ? 1u : 0u);
+        start();
+        EXPECT_EQ(state(), expected);
+        client.reset();
+        stop();
+        expectComplaints(forged, 1);
+        expectComplaints(elected, expected == afterwards ? 1 : 0);
     }
 }
 

@@ -1,18 +1,13 @@
 #include <algorithm>
 #include <cstring>
 #include <elf.h>
-#include <filesystem>
 #include <linux/perf_event.h>
 #include <map>
 #include <sstream>
 #include <sys/syscall.h>
 #include <unistd.h>
 
-#include <gtest/gtest.h>
-
-#include "tests/e2e/Daemon.h"
-#include "tests/e2e/Home.h"
-#include "tests/e2e/Replies.h"
+#include "tests/e2e/DaemonTest.h"
 
 namespace e2e {
 namespace {
@@ -49,13 +44,16 @@ std::map<std::string, Probe> probesOf(const std::string& notes) {
     return probes;
 }
 
-std::map<std::string, Probe> probesOfDaemon(const Home& home) {
-    Program readelf({.command = {"/usr/bin/readelf", "-n", builtProgram("zpd")},
-                     .errorFile = home / "errors",
-                     .outputFile = home / "notes"});
-    EXPECT_EQ(readelf.exitStatus(), 0) << readelf.errors();
-    return probesOf(readFile(home / "notes"));
-}
+class Probes : public DaemonTest {
+protected:
+    [[nodiscard]] std::map<std::string, Probe> probesOfDaemon() const {
+        Program readelf({.command = {"/usr/bin/readelf", "-n", builtProgram("zpd")},
+                         .errorFile = home / "errors",
+                         .outputFile = home / "notes"});
+        EXPECT_EQ(readelf.exitStatus(), 0) << readelf.errors();
+        return probesOf(readFile(home / "notes"));
+    }
+};
 
 // Counts how often one probe of a program fires, in whichever process, as tracers do it: with the
 // probe's semaphore counted up while this lives.
@@ -113,9 +111,8 @@ private:
     std::vector<int> files_;
 };
 
-TEST(Probes, StandInTheProgramWithTheirSemaphores) {
-    const Home home;
-    const std::map<std::string, Probe> probes = probesOfDaemon(home);
+TEST_F(Probes, StandInTheProgramWithTheirSemaphores) {
+    const std::map<std::string, Probe> probes = probesOfDaemon();
     const std::map<std::string, std::size_t> expected = {
         {"client__new", 1},     {"client__done", 1},  {"request__input", 2}, {"request", 2},
         {"request__output", 2}, {"discover__raw", 1}, {"plugin__add", 1},    {"plugin__remove", 2},
@@ -130,25 +127,21 @@ TEST(Probes, StandInTheProgramWithTheirSemaphores) {
     }
 }
 
-TEST(Probes, FireWithWhatTheyTellOf) {
-    const Home home;
+TEST_F(Probes, FireWithWhatTheyTellOf) {
     const std::string in = addAppWith(home, "In", {});
     const std::string program = home / "zpd"; // its own: other daemons do not count
-    std::filesystem::copy(builtProgram("zpd"), program);
+    fs::copy(builtProgram("zpd"), program);
     std::map<std::string, Counter> counters;
-    for (const auto& [name, probe] : probesOfDaemon(home))
+    for (const auto& [name, probe] : probesOfDaemon())
         counters.try_emplace(name, program, probe);
     if (!std::ranges::all_of(counters, [](const auto& each) { return each.second.works(); }))
         GTEST_SKIP() << "cannot trace programs here";
     writeFile(home / "annotations", "damaged");
-    {
-        Daemon daemon(home.path(), {.program = program});
-        WireClient client = daemon.connect();
-        for (const Item& request :
-             {pathsRequest("add", {in, in, "/none"}), pathsRequest("remove", {"/none", in}),
-              envelope("match", Item::map({{"rules", Item::map({})}}))})
-            (void)client.request(request);
-    }
+    start({.program = program});
+    (void)client->request(pathsRequest("add", {in, in, "/none"}));
+    (void)client->request(pathsRequest("remove", {"/none", in}));
+    (void)match(*client);
+    daemon.reset();
     const std::map<std::string, std::uint64_t> expected = {
         {"request__input", 3}, {"request", 3},  {"request__output", 3}, {"discover__raw", 1},
         {"plugin__add", 2},    {"db__load", 2}, {"plugin__remove", 1},  {"plugin__ready", 0}};

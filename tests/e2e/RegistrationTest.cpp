@@ -1,84 +1,60 @@
 // "add", "remove" and "bulk": bundles that are registered by path.
 
-#include <algorithm>
-#include <filesystem>
-#include <optional>
 #include <poll.h>
 
-#include <gtest/gtest.h>
-
-#include "tests/e2e/Replies.h"
 #include "tests/e2e/Signing.h"
 
 namespace e2e {
 namespace {
 
-namespace fs = std::filesystem;
-
-// A watched application with the plug-in "in"; outside the watched folders one with "out" and
-// "sibling"; and a program that may remove.
-class Registration : public testing::Test {
+// A watched application with the plug-in "in", and outside the watched folders one with "out" and
+// "sibling".
+class Registration : public ManagerTest {
 protected:
     Registration() {
-        addProgram(manager);
-        key.sign(manager);
         (void)addPlugIn(elsewhere, "Sibling", {.identifier = "sibling"});
-        restart();
+        start();
     }
 
-    void restart() {
-        if (daemon) {
-            EXPECT_EQ(daemon->terminate(), 0);
-        }
-        daemon.emplace(home.path());
-    }
-
-    [[nodiscard]] std::string answer(const Item& request) const {
-        WireClient client = daemon->connect();
-        return errorOf(client.request(request));
-    }
-
-    [[nodiscard]] std::string add(const std::vector<std::string>& paths) const {
+    [[nodiscard]] std::string add(const std::vector<std::string>& paths) {
         return answer(pathsRequest("add", paths));
     }
 
-    // By the program that may.
-    [[nodiscard]] std::string remove(const std::vector<std::string>& paths) const {
-        std::string command = "remove";
-        for (const std::string& path : paths)
-            command += " " + path;
-        return Talk(home, {manager, daemon->socketPath(), "hello", command}).hear();
+    void restart() {
+        stop();
+        start();
     }
 
-    [[nodiscard]] std::string seen() const {
-        WireClient client = daemon->connect();
-        return matched(client, Item::map({}));
+    // The daemon ends; the next one finds no database.
+    void removeDatabase() {
+        stop();
+        for (const char* part : {"", "-wal", "-shm"})
+            fs::remove(database + part);
     }
 
-    [[nodiscard]] Item uuidOf(const std::string& path) const {
-        WireClient client = daemon->connect();
-        return findAt(client, path)["uuid"];
-    }
+    [[nodiscard]] Item uuidOf(const std::string& path) { return findAt(*client, path)["uuid"]; }
 
-    const Home home;
-    const Signer key{home};
-    const std::string manager = home / "tools/manager";
+    const std::string database = home / "lib/AppRegistry.db";
     const std::string in = addAppWith(home, "In", {.identifier = "in"});
     const std::string out = addAppWith(home, "Out", {.identifier = "out"}, "Elsewhere");
     const std::string elsewhere = home / "Elsewhere/Out.app";
-    std::optional<Daemon> daemon;
 };
 
 TEST_F(Registration, RefusesWhatTheTablesSay) {
-    const std::string alone = home / "Elsewhere/Alone.appex";
-    fs::copy(in, alone, fs::copy_options::recursive);
-    writeFile(home / "Elsewhere/Broken.appex/Info.plist", "broken");
-    fs::create_directories(home / "Elsewhere/Empty.appex");
-    fs::copy(in, home / "Elsewhere/Other.bundle", fs::copy_options::recursive);
-    fs::copy(in, home / "Elsewhere/Open.appex", fs::copy_options::recursive);
-    fs::permissions(home / "Elsewhere/Open.appex/plugin", fs::perms(0666));
-    fs::copy(elsewhere, home / "Elsewhere/Bare.app", fs::copy_options::recursive);
-    fs::remove(home / "Elsewhere/Bare.app/Info.plist");
+    const auto outside = [&](const char* name) { return home / "Elsewhere/" + name; };
+    const auto copyOf = [&](const std::string& bundle, const char* name) {
+        fs::copy(bundle, outside(name), fs::copy_options::recursive);
+        return outside(name);
+    };
+    const std::string alone = copyOf(in, "Alone.appex");
+    writeFile(outside("Broken.appex/Info.plist"), "broken");
+    fs::create_directories(outside("Empty.appex"));
+    fs::permissions(copyOf(in, "Open.appex") + "/plugin", fs::perms(0666));
+    fs::remove(copyOf(elsewhere, "Bare.app") + "/Info.plist");
+    for (const std::string& bundle :
+         {copyOf(in, "Other.bundle"), elsewhere, outside("Broken.appex"), outside("Empty.appex"),
+          outside("Open.appex"), outside("Bare.app/PlugIns/Out.appex")})
+        EXPECT_EQ(add({bundle}), "2 unable to register plug-in at " + bundle);
 
     const std::string format = "4 invalid request format";
     const auto with = [](const char* type, const Item& paths) {
@@ -86,61 +62,40 @@ TEST_F(Registration, RefusesWhatTheTablesSay) {
     };
     const std::string lacks = "11 caller lacks entitlement for this operation";
 
-    const struct {
-        const char* what;
-        Item request;
-        std::string answer;
-    } cases[] = {
-        {"no paths", envelope("add"), format},
-        {"paths as text", with("add", in), format},
-        {"a path as number", with("add", Item::array({5, in})), format},
-        {"no path at all", pathsRequest("add", {}), ""},
-        {"a relative path", pathsRequest("add", {"relative/x", in}),
-         "9 absolute path required: relative/x"},
-        {"nothing there", pathsRequest("add", {home / "./none.appex"}),
+    const std::pair<Item, std::string> cases[] = {
+        {envelope("add"), format},
+        {with("add", in), format},
+        {with("add", Item::array({5, in})), format},
+        {pathsRequest("add", {}), ""},
+        {pathsRequest("add", {"relative/x", in}), "9 absolute path required: relative/x"},
+        {pathsRequest("add", {home / "./none.appex"}),
          "9 invalid plugin path: " + (home / "./none.appex")},
-        {"no bundle's name", pathsRequest("add", {home / "Elsewhere/Other.bundle"}),
-         "2 unable to register plug-in at " + (home / "Elsewhere/Other.bundle")},
-        {"an application", pathsRequest("add", {elsewhere}),
-         "2 unable to register plug-in at " + elsewhere},
-        {"a broken Info.plist", pathsRequest("add", {home / "Elsewhere/Broken.appex"}),
-         "2 unable to register plug-in at " + (home / "Elsewhere/Broken.appex")},
-        {"no Info.plist", pathsRequest("add", {home / "Elsewhere/Empty.appex"}),
-         "2 unable to register plug-in at " + (home / "Elsewhere/Empty.appex")},
-        {"others can write it", pathsRequest("add", {home / "Elsewhere/Open.appex"}),
-         "2 unable to register plug-in at " + (home / "Elsewhere/Open.appex")},
-        {"its application is none",
-         pathsRequest("add", {home / "Elsewhere/Bare.app/PlugIns/Out.appex"}),
-         "2 unable to register plug-in at " + (home / "Elsewhere/Bare.app/PlugIns/Out.appex")},
-        {"alone", pathsRequest("add", {alone}), ""},
-        {"known", pathsRequest("add", {in + "/."}), ""},
-        {"remove without paths", envelope("remove"), format},
-        {"remove without path", pathsRequest("remove", {}), ""},
-        {"remove a number", with("remove", Item::array({5})), format},
-        {"remove a relative path", pathsRequest("remove", {"x"}), "9 absolute path required: x"},
-        {"remove without right", pathsRequest("remove", {in + "/.", "x"}), lacks},
-        {"remove nothing without right", pathsRequest("remove", {"/none\n"}), lacks},
-        {"bulk", envelope("bulk"), ""},
-        {"bulk with flags", envelope("bulk", Item::map({{"flags", 5}})), ""},
+        {pathsRequest("add", {alone}), ""},
+        {pathsRequest("add", {in + "/."}), ""},
+        {envelope("remove"), format},
+        {pathsRequest("remove", {}), ""},
+        {with("remove", Item::array({5})), format},
+        {pathsRequest("remove", {"x"}), "9 absolute path required: x"},
+        {pathsRequest("remove", {in + "/.", "x"}), lacks},
+        {pathsRequest("remove", {"/none\n"}), lacks},
+        {envelope("bulk"), ""},
+        {envelope("bulk", Item::map({{"flags", 5}})), ""},
     };
 
-    for (const auto& each : cases) {
-        SCOPED_TRACE(each.what);
-        EXPECT_EQ(answer(each.request), each.answer);
-    }
+    for (const auto& [request, expected] : cases)
+        EXPECT_EQ(answer(request), expected) << request;
     EXPECT_EQ(seen(), "in") << "one that stands alone is seen below /System only";
-    EXPECT_EQ(daemon->terminate(), 0);
-    const std::string refused =
+    stop();
+    const std::string from =
         "default default: refused request from pid=" + std::to_string(getpid()) +
         " to remove plug-in at ";
-    for (const std::string& line : {refused + in + " - client lacks required entitlement",
-                                    refused + "/none\\n - client lacks required entitlement",
-                                    "ops default: failed to register plug-in at " + elsewhere,
-                                    (home / "Elsewhere/Empty.appex") + ": it has no Info.plist",
-                                    std::string("ops info: bulk options 0x0 not supported"),
-                                    std::string("ops info: bulk options 0x5 not supported")})
-        EXPECT_EQ(daemon->linesWith(line), 1u) << line;
-    EXPECT_EQ(daemon->linesWith("ar error:"), 0u) << "what clients ask for is no complaint";
+    expectLog({{from + in + " - client lacks required entitlement", 1},
+               {from + "/none\\n - client lacks required entitlement", 1},
+               {"ops default: failed to register plug-in at " + elsewhere, 1},
+               {outside("Empty.appex") + ": it has no Info.plist", 1},
+               {"ops info: bulk options 0x0 not supported", 1},
+               {"ops info: bulk options 0x5 not supported", 1},
+               {"ar error:", 0}}); // what clients ask for is no complaint
 }
 
 TEST_F(Registration, StopsAtTheFirstFailureAndKeepsWhatWasDone) {
@@ -177,28 +132,23 @@ TEST_F(Registration, OutlivesTheDaemon) {
 TEST_F(Registration, OutlivesTheDatabase) {
     for (const bool damaged : {true, false}) {
         SCOPED_TRACE(damaged);
-        const std::string database = home / "lib/AppRegistry.db";
         EXPECT_EQ(add({out, in}), "");
         EXPECT_EQ(remove({in}), granted);
-        EXPECT_EQ(daemon->terminate(), 0);
-        daemon.reset();
-        for (const char* part : {"", "-wal", "-shm"})
-            fs::remove(database + part);
+        removeDatabase();
         if (damaged)
             writeFile(database, "no database, however long it may be" + std::string(9999, 'x'));
-        restart();
+        start();
         EXPECT_EQ(seen(), "out");
         restart();
         EXPECT_EQ(seen(), "out");
     }
     // What others could have written is not believed.
-    EXPECT_EQ(daemon->terminate(), 0);
-    daemon.reset();
-    fs::remove(home / "lib/AppRegistry.db");
-    fs::permissions(home / "lib/AppRegistry.plist", fs::perms(0666));
-    restart();
+    const std::string list = home / "lib/AppRegistry.plist";
+    removeDatabase();
+    fs::permissions(list, fs::perms(0666));
+    start();
     EXPECT_EQ(seen(), "in");
-    EXPECT_TRUE(daemon->logs("ignoring " + (home / "lib/AppRegistry.plist") + ": "));
+    EXPECT_TRUE(daemon->logs("ignoring " + list + ": "));
 }
 
 TEST_F(Registration, KeepsTheOrderOfEachClientAndNobodyElseWaiting) {
@@ -210,12 +160,11 @@ TEST_F(Registration, KeepsTheOrderOfEachClientAndNobodyElseWaiting) {
         fs::resize_file(large.back() + "/plugin", std::uintmax_t{250} << 20);
     }
     WireClient slow = daemon->connect();
-    WireClient quick = daemon->connect();
     slow.post(pathsRequest("add", large));
     slow.post(envelope("match", Item::map({{"rules", Item::map({})}})));
     int answers = 0;
     for (pollfd first{slow.fd(), POLLIN, 0}; poll(&first, 1, 0) == 0; ++answers)
-        EXPECT_FALSE(matched(quick, Item::map({})).empty());
+        EXPECT_FALSE(seen().empty());
     EXPECT_GT(answers, 2);
     const auto added = slow.receive();
     const auto matches = slow.receive();

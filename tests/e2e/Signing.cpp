@@ -1,17 +1,12 @@
 #include "tests/e2e/Signing.h"
 
 #include <fcntl.h>
-#include <filesystem>
 #include <poll.h>
 #include <stdexcept>
 #include <unistd.h>
 #include <utility>
 
-#include "tests/e2e/PlistWriter.h"
-
 namespace e2e {
-
-namespace fs = std::filesystem;
 
 namespace {
 
@@ -112,6 +107,19 @@ std::string addProgram(const std::string& path, const char* name) {
     fs::create_directories(fs::path(path).parent_path());
     fs::copy_file(builtProgram(name), path, fs::copy_options::overwrite_existing);
     return path;
+}
+
+ManagerTest::Words ManagerTest::command(const std::string& program, const Words& steps) const {
+    Words result = {program, daemon->socketPath()};
+    result.insert(result.end(), steps.begin(), steps.end());
+    return result;
+}
+
+std::string ManagerTest::remove(const Words& paths) const {
+    std::string words = "remove";
+    for (const std::string& path : paths)
+        words += " " + path;
+    return answerTo(manager, {"hello", words});
 }
 
 } // namespace e2e

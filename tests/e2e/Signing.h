@@ -3,8 +3,7 @@
 #include <string>
 #include <vector>
 
-#include "tests/e2e/Daemon.h"
-#include "tests/e2e/Home.h"
+#include "tests/e2e/DaemonTest.h"
 
 namespace e2e {
 
@@ -61,6 +60,28 @@ private:
 
 // A copy of a program of this build, which a test may sign.
 std::string addProgram(const std::string& path, const char* name = "e2e_probe");
+
+// Beside the daemon a probe that is signed for a manager of plug-ins.
+class ManagerTest : public DaemonTest {
+protected:
+    ManagerTest() { key.sign(manager); }
+
+    using Words = std::vector<std::string>;
+
+    [[nodiscard]] Words command(const std::string& program, const Words& steps) const;
+
+    // What the probe says first.
+    [[nodiscard]] std::string answerTo(const std::string& program,
+                                       const Words& steps = {"hello", "ask"}) const {
+        return Talk(home, command(program, steps)).hear();
+    }
+
+    // By the program that may.
+    [[nodiscard]] std::string remove(const Words& paths) const;
+
+    const Signer key{home};
+    const std::string manager = addProgram(home / "tools/probe");
+};
 
 inline const std::string granted = "granted";
 inline const std::string refused = "11 unauthorized discovery flag (ZPDiscoverAll)";

@@ -3,16 +3,10 @@
 #include <algorithm>
 #include <csignal>
 #include <fcntl.h>
-#include <filesystem>
 #include <unistd.h>
 
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
-#include "tests/e2e/Daemon.h"
-#include "tests/e2e/Home.h"
-#include "tests/e2e/PlistWriter.h"
-#include "tests/e2e/Replies.h"
 #include "tests/e2e/Signing.h"
 
 namespace e2e {
@@ -21,163 +15,143 @@ namespace {
 using testing::AllOf;
 using testing::HasSubstr;
 
-// The tool on a home, as a person starts it.
-class Tool {
-public:
-    explicit Tool(const Home& home) : home_(home) {}
-
-    [[nodiscard]] Program start(const std::vector<std::string>& words, int output = -1,
+// The tool, as a person starts it.
+class Tool : public DaemonTest {
+protected:
+    [[nodiscard]] Program begin(const std::vector<std::string>& words, int outputFd = -1,
                                 const std::string& program = builtProgram("zpctl")) const {
         std::vector<std::string> command = {program, "--service", "e2e"};
         command.insert(command.end(), words.begin(), words.end());
-        std::filesystem::remove(home_ / "errors");
+        fs::remove(home / "errors");
         return Program({.command = command,
-                        .settings = {{"ZEPHRIN_HOME", home_.path()}, {"TZ", "UTC"}},
-                        .errorFile = home_ / "errors",
-                        .outputFile = home_ / "output",
-                        .outputFd = output});
+                        .settings = {{"ZEPHRIN_HOME", home.path()}, {"TZ", "UTC"}},
+                        .errorFile = home / "errors",
+                        .outputFile = home / "output",
+                        .outputFd = outputFd});
     }
 
     // "STATUS OUTPUT ERRORS".
     [[nodiscard]] std::string run(const std::vector<std::string>& words,
                                   const std::string& program = builtProgram("zpctl")) const {
-        const int status = start(words, -1, program).exitStatus();
-        return std::to_string(status) + " " + output() + readFile(home_ / "errors");
+        const int status = begin(words, -1, program).exitStatus();
+        return std::to_string(status) + " " + output() + readFile(home / "errors");
     }
 
-    [[nodiscard]] std::string output() const { return readFile(home_ / "output"); }
+    [[nodiscard]] std::string output() const { return readFile(home / "output"); }
 
-private:
-    const Home& home_;
+    [[nodiscard]] std::string uuidAt(const std::string& path) {
+        return findAt(*client, path)["uuid"].text();
+    }
 };
 
-std::string uuidAt(const Daemon& daemon, const std::string& path) {
-    WireClient client = daemon.connect();
-    return findAt(client, path)["uuid"].text();
-}
-
-TEST(Tool, ChangesWhatTheDaemonKeeps) {
-    const Home home;
+TEST_F(Tool, ChangesWhatTheDaemonKeeps) {
     const std::string plugIn = addAppWith(home, "Some", {.identifier = "some"});
-    addPlugIn(home.addApp("Away", "elsewhere"), "Away", {.identifier = "away"});
-    const Daemon daemon(home.path());
-    const Tool tool(home);
-    const std::string uuid = uuidAt(daemon, plugIn);
-
-    const struct {
-        const char* choice;
-        const char* tree;
-    } elections[] = {{"on", "  elected  "}, {"off", "  not elected  "}, {"default", "widget  "}};
-
+    const std::string away = addAppWith(home, "Away", {.identifier = "away"}, "elsewhere");
+    start();
+    const std::string uuid = uuidAt(plugIn);
+    const std::pair<const char*, const char*> elections[] = {
+        {"on", "  elected  "}, {"off", "  not elected  "}, {"default", "widget  "}};
     for (const auto& [choice, tree] : elections) {
-        EXPECT_THAT(tool.run({"elect", uuid, choice}), testing::StartsWith("0 " + uuid));
-        EXPECT_THAT(tool.run({"tree"}), HasSubstr(tree + uuid)) << choice;
+        EXPECT_THAT(run({"elect", uuid, choice}), testing::StartsWith("0 " + uuid));
+        EXPECT_THAT(run({"tree"}), HasSubstr(tree + uuid)) << choice;
     }
-    writeFile(home / "annotation.plist", xmlPlist(Item::map({{"extension", "no dictionary"}})));
-    EXPECT_EQ(tool.run({"annotate", uuid, home / "annotation.plist"}),
+    const auto annotate = [&](const Item& extension) {
+        const std::string file = home / "annotation.plist";
+        writeFile(file, xmlPlist(Item::map({{"extension", extension}})));
+        return run({"annotate", uuid, file});
+    };
+    EXPECT_EQ(annotate("no dictionary"),
               "1 zpctl: invalid request format (annotation extension) (code 4)\n");
-    writeFile(home / "annotation.plist",
-              xmlPlist(Item::map({{"extension", Item::map({{"some", "settings"}})}})));
-    EXPECT_EQ(tool.run({"annotate", uuid, home / "annotation.plist"}),
-              "0 " + uuid + " is annotated\n");
-    EXPECT_THAT(tool.run({"--json", "find", uuid}), HasSubstr("\"some\": \"settings\""));
+    EXPECT_EQ(annotate(Item::map({{"some", "settings"}})), "0 " + uuid + " is annotated\n");
+    EXPECT_THAT(run({"--json", "find", uuid}), HasSubstr("\"some\": \"settings\""));
 
-    const std::string away = home / "elsewhere/Away.app/PlugIns/Away.appex";
-    EXPECT_EQ(tool.run({"add", away, home / "nowhere"}),
+    EXPECT_EQ(run({"add", away, home / "nowhere"}),
               "1 zpctl: invalid plugin path: " + (home / "nowhere") + " (code 9)\n");
-    EXPECT_THAT(tool.run({"match", "--flags", "1"}), AllOf(HasSubstr("some"), HasSubstr("away")));
-    EXPECT_THAT(tool.run({"remove", away}), testing::StartsWith("1 zpctl: caller lacks"));
+    EXPECT_THAT(run({"match", "--flags", "1"}), AllOf(HasSubstr("some"), HasSubstr("away")));
+    EXPECT_THAT(run({"remove", away}), testing::StartsWith("1 zpctl: caller lacks"));
     const std::string manager = addProgram(home / "bin/manager", "zpctl");
     Signer(home).sign(manager);
-    std::filesystem::create_directories(home / "lib");
-    const char* library = "lib/libZephrin.so.0";
-    std::filesystem::copy_file(builtProgram("../") + library, home / library);
-    EXPECT_EQ(tool.run({"remove", away}, manager), "0 1 plug-in unregistered\n");
-    EXPECT_THAT(tool.run({"match", "--flags", "1"}), testing::Not(HasSubstr("away")));
+    (void)addProgram(home / "lib/libZephrin.so.0", "../lib/libZephrin.so.0");
+    EXPECT_EQ(run({"remove", away}, manager), "0 1 plug-in unregistered\n");
+    EXPECT_THAT(run({"match", "--flags", "1"}), testing::Not(HasSubstr("away")));
+    kill(daemon->pid(), SIGSTOP);
+    EXPECT_EQ(run({"--timeout", "0.2", "tree"}),
+              "3 zpctl: the daemon did not answer within 0.2 s\n");
 }
 
 // All of an application's plug-ins change at once, for everybody who asks.
-TEST(Tool, InstallsOverAnApplicationInOneStepForClients) {
-    constexpr int plugIns = 8;
-    const Home home;
+TEST_F(Tool, InstallsOverAnApplicationInOneStepForClients) {
+    const std::vector<std::string> identifiers = {"a", "b", "c", "d", "e", "f", "g", "h"};
     const auto source = [&](const std::string& version) {
         const std::string app = home.addApp("Some", "source" + version);
-        for (int i = 0; i < plugIns; ++i)
-            addPlugIn(app, "P" + std::to_string(i),
-                      {.identifier = "p" + std::to_string(i), .version = version});
+        for (const std::string& identifier : identifiers)
+            addPlugIn(app, identifier, {.identifier = identifier, .version = version});
         return app;
     };
     const std::string sources[] = {source("1"), source("2")};
-    const Tool tool(home);
-    ASSERT_THAT(tool.run({"install", sources[0]}), testing::StartsWith("0 "));
-    const Daemon daemon(home.path());
-    WireClient client = daemon.connect();
+    ASSERT_THAT(run({"install", sources[0]}), testing::StartsWith("0 "));
+    start();
     for (int change = 1; change <= 6; ++change) {
-        Program install = tool.start({"install", sources[change % 2]});
-        const std::string wanted = change % 2 == 0 ? "1" : "2";
+        SCOPED_TRACE(change);
+        Program install = begin({"install", sources[change % 2]});
+        const Item wanted = change % 2 == 0 ? "1" : "2";
         const auto arrived = [&] {
-            int found = 0;
-            int old = 0;
-            for (const Item& form : match(client, Item::map({}), 1)) {
-                ++found;
-                old += form["version"].text() == wanted ? 0 : 1;
-            }
-            EXPECT_EQ(found, plugIns) << "change " << change;
-            EXPECT_TRUE(old == 0 || old == plugIns) << "change " << change << ": " << old;
-            return old == 0 || testing::Test::HasFailure();
+            const std::vector<Item> found = match(*client, Item::map({}), 1);
+            EXPECT_EQ(found.size(), identifiers.size());
+            const auto fresh = static_cast<std::size_t>(std::ranges::count_if(
+                found, [&](const Item& form) { return form["version"] == wanted; }));
+            EXPECT_TRUE(fresh == 0 || fresh == found.size()) << fresh;
+            return fresh != 0 || HasFailure();
         };
-        ASSERT_TRUE(eventually(arrived)) << "change " << change;
+        ASSERT_TRUE(eventually(arrived));
         EXPECT_EQ(install.exitStatus(), 0) << install.errors();
     }
 }
 
-TEST(Tool, MonitorTellsOfChangesAndEndsWell) {
-    const Home home;
+TEST_F(Tool, MonitorTellsOfChangesAndEndsWell) {
     const std::string plugIn = addAppWith(home, "Some", {.identifier = "some"});
-    const Tool tool(home);
     const auto waits = [](const Program& monitor) {
         return eventually(
             [&] { return monitor.errors().find("waiting for") != std::string::npos; });
     };
     const auto lines = [&] {
-        const std::string output = tool.output();
-        return std::ranges::count(output, '\n');
+        const std::string text = output();
+        return std::ranges::count(text, '\n');
     };
-    Program monitor = tool.start({"--json", "monitor"}); // before there is a daemon
+    Program monitor = begin({"--json", "monitor"}); // before there is a daemon
     ASSERT_TRUE(waits(monitor));
-    std::optional<Daemon> daemon(std::in_place, home.path());
+    start();
     const auto elect = [&] {
-        WireClient elector = daemon->connect();
-        const Item uuid = Item::uuid(findAt(elector, plugIn)["uuid"].text());
-        elector.request(
-            envelope("annotate", Item::map({{"uuids", Item::array({uuid})},
-                                            {"annotations", Item::map({{"election", Item(1)}})}})));
+        const Item uuids = Item::array({Item::uuid(uuidAt(plugIn))});
+        const Item annotation = Item::map({{"election", 1}});
+        client->request(
+            envelope("annotate", Item::map({{"uuids", uuids}, {"annotations", annotation}})));
     };
     for (int changes = 1; changes <= 3; ++changes) {
         elect();
-        EXPECT_TRUE(eventually([&] { return lines() == changes; })) << tool.output();
+        EXPECT_TRUE(eventually([&] { return lines() == changes; })) << output();
     }
-    EXPECT_THAT(tool.output(),
+    EXPECT_THAT(output(),
                 HasSubstr("Z\",\"notification\":\"com.tovana.zephrin.annotation-change\"}\n"));
     daemon->program().signal(SIGKILL);
     daemon->program().exitStatus();
-    std::filesystem::remove_all(home / "run");
-    daemon.emplace(home.path()); // counts from the beginning
+    fs::remove_all(home / "run");
+    start(); // counts from the beginning
     elect();
-    EXPECT_TRUE(eventually([&] { return lines() == 4; })) << tool.output();
+    EXPECT_TRUE(eventually([&] { return lines() == 4; })) << output();
     monitor.signal(SIGTERM);
     EXPECT_EQ(monitor.exitStatus(), 0);
 
     int ends[2];
     ASSERT_EQ(::pipe2(ends, O_CLOEXEC), 0);
-    Program unread = tool.start({"monitor"}, ends[1]);
+    Program unread = begin({"monitor"}, ends[1]);
     ::close(ends[1]);
     EXPECT_TRUE(waits(unread));
     EXPECT_TRUE(unread.running());
     ::close(ends[0]);
     EXPECT_EQ(unread.exitStatus(), 0) << "its reader is gone";
 
-    Program counted = tool.start({"monitor", "--count", "1"});
+    Program counted = begin({"monitor", "--count", "1"});
     ASSERT_TRUE(waits(counted));
     elect();
     EXPECT_EQ(counted.exitStatus(), 0);
