@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <atomic>
 #include <chrono>
-#include <future>
 #include <memory>
 #include <mutex>
 #include <string>
@@ -12,10 +11,9 @@
 #include <unistd.h>
 #include <vector>
 
-#include <gtest/gtest.h>
-
 #include "platform/ipc/Cbor.h"
 #include "tests/ipc/Harness.h"
+#include "tests/support/Gate.h"
 
 namespace {
 
@@ -72,24 +70,6 @@ void tellOrigin(Connection& connection, const Message& message) {
 void settle(int milliseconds) {
     std::this_thread::sleep_for(std::chrono::milliseconds(milliseconds));
 }
-
-// Keeps the service queue busy until it is let go.
-class Block {
-public:
-    explicit Block(SerialQueue& queue) {
-        std::promise<void> begun;
-        queue.async([&begun, end = end_.get_future().share()] {
-            begun.set_value();
-            end.wait();
-        });
-        begun.get_future().wait();
-    }
-
-    void release() { end_.set_value(); }
-
-private:
-    std::promise<void> end_;
-};
 
 TEST_F(ConnectionTest, GreetsFirstAndTakesOneRightAnswer) {
     EchoServer server(path_, {}, tellOrigin);
@@ -170,7 +150,7 @@ TEST_F(ConnectionTest, AFloodDoesNotDelayOthersByMoreThanItsTurn) {
         order.push_back(message.id);
         connection.send(createReply(message));
     });
-    Block block(server.queue());
+    Gate gate(server.queue());
     RawClient flooder(path_);
     RawClient polite(path_);
     flooder.write(requests(1000, 200));
@@ -178,7 +158,7 @@ TEST_F(ConnectionTest, AFloodDoesNotDelayOthersByMoreThanItsTurn) {
     settle(50);
     polite.write(requests(0, 5));
     settle(50);
-    block.release();
+    gate.open();
     expectRepliesInOrder(polite, 5);
     const std::lock_guard lock(mutex);
     // Their turns alternate, so the last of the five has about as many of the flood before it.
@@ -196,7 +176,7 @@ TEST_F(ConnectionTest, MoreRequestsThanMayWaitAreAllCarriedOut) {
 
 TEST_F(ConnectionTest, ReadingPausesAtTheLimitAndGoesOn) {
     EchoServer server(path_, {.waitingRequests = 8});
-    Block block(server.queue());
+    Gate gate(server.queue());
     RawClient client(path_);
     // More than the sockets hold, so that writing stops when reading does.
     const Dictionary body{{"data", Data{SharedBytes(std::string(100'000, 'x'))}}};
@@ -209,13 +189,13 @@ TEST_F(ConnectionTest, ReadingPausesAtTheLimitAndGoesOn) {
     });
     settle(300);
     EXPECT_LT(written, 20);
-    block.release();
+    gate.open();
     expectRepliesInOrder(client, 60);
 }
 
 TEST_F(ConnectionTest, AHangUpIsNoticedWhileReadingIsPaused) {
     EchoServer server(path_, {.waitingRequests = 4});
-    Block block(server.queue());
+    Gate gate(server.queue());
     {
         RawClient client(path_);
         client.write(requests(0, 50));
@@ -223,14 +203,14 @@ TEST_F(ConnectionTest, AHangUpIsNoticedWhileReadingIsPaused) {
         EXPECT_EQ(server.gone.value(), 0);
     }
     EXPECT_TRUE(server.gone.reaches(1)); // with the service queue still busy
-    block.release();
+    gate.open();
     expectServed();
     EXPECT_EQ(server.requests.value(), 2); // the one that was handed out, and this
 }
 
 TEST_F(ConnectionTest, WaitingRequestsOfAUserAreLimitedTogether) {
     EchoServer server(path_, {.userWaitingBytes = 1'000'000});
-    Block block(server.queue());
+    Gate gate(server.queue());
     const Dictionary body{{"data", Data{SharedBytes(std::string(300'000, 'x'))}}};
     std::vector<std::unique_ptr<RawClient>> clients;
     std::vector<std::jthread> threads;
@@ -252,7 +232,7 @@ TEST_F(ConnectionTest, WaitingRequestsOfAUserAreLimitedTogether) {
     // Small requests of others go through all the same, as soon as the queue does.
     RawClient small(path_);
     small.write(requests(1, 1));
-    block.release();
+    gate.open();
     EXPECT_TRUE(small.read());
     EXPECT_TRUE(answered.reaches(60));
 }
@@ -275,10 +255,10 @@ TEST_F(ConnectionTest, FindsWhatOneReadLeftBehind) {
     client.write(text);
     ASSERT_TRUE(client.read());
     const auto whileTheLoopIsHeld = [&](auto&& act) {
-        std::promise<void> release;
-        server.loop().post([held = release.get_future()]() mutable { held.wait(); });
+        const Signal release;
+        server.loop().post([release] { EXPECT_TRUE(release.comes()); });
         act();
-        release.set_value();
+        release.give();
     };
     whileTheLoopIsHeld([&] {
         client.write(text);

@@ -1,56 +1,13 @@
 #include "platform/queue/SerialQueue.h"
 
 #include <algorithm>
-#include <future>
 #include <memory>
 #include <thread>
 #include <vector>
 
-#include <gtest/gtest.h>
+#include "tests/support/Gate.h"
 
 using namespace platform;
-
-namespace {
-
-constexpr auto longEnough = std::chrono::seconds(20);
-
-// Something that one thread tells another. Copies share it, so that it outlives both.
-template <class T = bool>
-class Signal {
-public:
-    void give(T value = T()) const { promise_->set_value(value); }
-
-    // False when nothing came.
-    [[nodiscard]] bool comes() const {
-        return future_.wait_for(longEnough) == std::future_status::ready;
-    }
-
-    [[nodiscard]] T value() const { return comes() ? future_.get() : T(); }
-
-private:
-    std::shared_ptr<std::promise<T>> promise_ = std::make_shared<std::promise<T>>();
-    std::shared_future<T> future_ = promise_->get_future().share();
-};
-
-// A block that keeps its queue busy until `open` is called.
-class Gate {
-public:
-    void hold(SerialQueue& queue) {
-        const Signal entered;
-        queue.async([entered, opened = opened_] {
-            entered.give();
-            EXPECT_TRUE(opened.comes());
-        });
-        EXPECT_TRUE(entered.comes());
-    }
-
-    void open() { opened_.give(); }
-
-private:
-    Signal<> opened_;
-};
-
-} // namespace
 
 TEST(SerialQueue, RunsBlocksInTheOrderOfTheirSubmission) {
     std::vector<int> order;
@@ -88,8 +45,7 @@ TEST(SerialQueue, RunsASynchronousBlockOnTheCallingThread) {
     SerialQueue queue("test");
     const auto here = std::this_thread::get_id();
     EXPECT_EQ(queue.sync([] { return std::this_thread::get_id(); }), here) << "idle";
-    Gate gate;
-    gate.hold(queue);
+    Gate gate(queue);
     std::thread opener([&] { gate.open(); });
     EXPECT_EQ(queue.sync([] { return std::this_thread::get_id(); }), here) << "after waiting";
     opener.join();
@@ -102,8 +58,7 @@ TEST(SerialQueue, TriesOnlyWhenNobodyElseIsThere) {
     bool ran = false;
     EXPECT_TRUE(queue.tryRun([&] { ran = true; }));
     EXPECT_TRUE(ran);
-    Gate gate;
-    gate.hold(queue);
+    Gate gate(queue);
     EXPECT_FALSE(queue.tryRun([] { FAIL(); }));
     gate.open();
 }
@@ -128,8 +83,7 @@ TEST(SerialQueue, MayBeLetGoFromItsOwnBlock) {
 
 TEST(SerialQueue, FinishesWhatIsQueuedWhenLetGoFromItsOwnBlock) {
     auto queue = std::make_unique<SerialQueue>("test");
-    Gate gate;
-    gate.hold(*queue);
+    Gate gate(*queue);
     const Signal last;
     auto* const borrowed = queue.get();
     borrowed->async([&queue] { queue.reset(); });
