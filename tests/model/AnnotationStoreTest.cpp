@@ -1,13 +1,10 @@
-#include <filesystem>
-#include <fstream>
-#include <sstream>
-
 #include <gmock/gmock.h>
 
 #include "Zephrin/ZPDError.h"
 #include "platform/plist/PropertyList.h"
 #include "tests/model/Samples.h"
 #include "tests/platform/TestFolder.h"
+#include "tests/support/Files.h"
 #include "zpd/ZPDAnnotationStore.h"
 
 using platform::Array;
@@ -28,12 +25,6 @@ std::string storeText(Value version, Value data) {
 
 const Dictionary someAnnotations{{sampleKey, Dictionary{{"election", 1}, {"note", "x"}}},
                                  {"com.example.other", Dictionary{{"election", -1}}}};
-
-std::string contentOf(const std::string& path) {
-    std::ostringstream content;
-    content << std::ifstream(path, std::ios::binary).rdbuf();
-    return content.str();
-}
 
 // A store in a folder of its own, and a plug-in to annotate.
 struct StoreTest : testing::Test {

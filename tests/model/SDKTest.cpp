@@ -3,10 +3,10 @@
 #include <gmock/gmock.h>
 
 #include "Zephrin/ZPPlugInCore.h"
-#include "platform/log/Log.h"
 #include "platform/plist/PropertyList.h"
 #include "tests/model/Samples.h"
 #include "tests/platform/TestFolder.h"
+#include "tests/support/LogOf.h"
 
 using platform::Array;
 using platform::Dictionary;
@@ -45,27 +45,10 @@ protected:
                                     std::nullopt);
     }
 
-    // What `act` logs.
-    template <class Act>
-    static std::string logOf(Act&& act) {
-        platform::log::flush();
-        testing::internal::CaptureStderr();
-        act();
-        platform::log::flush();
-        return testing::internal::GetCapturedStderr();
-    }
-
     static std::unique_ptr<TestFolder> home_;
 };
 
 std::unique_ptr<TestFolder> SDK::home_;
-
-Array texts(std::initializer_list<const char*> all) {
-    Array made;
-    for (const char* text : all)
-        made.append(text);
-    return made;
-}
 
 } // namespace
 
@@ -78,9 +61,9 @@ TEST_F(SDK, GivesWhatThePlugInDoesNotSay) {
         {{{"A", 1}, {"CleanTimeout", 5}, {"D", Dictionary{{"x", 1}, {"y", 2}}}},
          {{"A", 2}, {"CleanTimeout", 9}, {"D", Dictionary{{"x", 3}}}},
          {{"A", 2}, {"CleanTimeout", 5}, {"D", Dictionary{{"x", 3}, {"y", 2}}}}},
-        {{{"Shared", texts({"a", "b"})}},
-         {{"Shared", texts({"b", "c"})}, {"Own", true}},
-         {{"Shared", texts({"b", "c", "a"})}, {"Own", true}}},
+        {{{"Shared", Array{"a", "b"}}},
+         {{"Shared", Array{"b", "c"}}, {"Own", true}},
+         {{"Shared", Array{"b", "c", "a"}}, {"Own", true}}},
         {{{"D", Dictionary{{"CleanTimeout", 5}, {"Shared", Array{1, true, "1"}}}}},
          {{"D", Dictionary{{"CleanTimeout", 9}, {"Shared", "s"}}}},
          {{"D", Dictionary{{"CleanTimeout", 5}, {"Shared", Array{"s", 1, "1"}}}}}},

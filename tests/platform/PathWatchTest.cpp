@@ -2,11 +2,11 @@
 
 #include <functional>
 #include <poll.h>
-#include <sys/stat.h>
 
 #include <gtest/gtest.h>
 
 #include "tests/platform/TestFolder.h"
+#include "tests/support/Files.h"
 
 using namespace platform;
 namespace fs = std::filesystem;
@@ -19,10 +19,6 @@ bool changed(PathWatch& watch) {
     while (::poll(&ready, 1, 20) > 0)
         any = watch.handleEvents() || any;
     return any;
-}
-
-void setMode(const std::string& path, ::mode_t mode) {
-    ASSERT_EQ(::chmod(path.c_str(), mode), 0);
 }
 
 } // namespace

@@ -2,9 +2,6 @@
 
 #include <cerrno>
 #include <csignal>
-#include <filesystem>
-#include <fstream>
-#include <sys/stat.h>
 #include <sys/wait.h>
 #include <thread>
 #include <unistd.h>
@@ -18,6 +15,7 @@
 #include "platform/preferences/FilePreferences.h"
 #include "platform/process/ProcProcesses.h"
 #include "tests/platform/TestFolder.h"
+#include "tests/support/Files.h"
 #include "tests/support/PeerOfProcess.h"
 
 namespace fs = std::filesystem;
@@ -26,28 +24,12 @@ using namespace platform;
 namespace {
 
 std::uint64_t counterIn(const std::string& path) {
-    std::ifstream file(path, std::ios::binary);
     std::uint64_t count = 0;
-    for (int i = 0; i < 8; ++i)
-        count |= static_cast<std::uint64_t>(file.get()) << (8 * i);
+    const std::string content = contentOf(path);
+    for (std::size_t i = 0; i < 8; ++i)
+        count |= std::uint64_t{static_cast<std::uint8_t>(content.at(i))} << (8 * i);
     return count;
 }
-
-mode_t modeOf(const std::string& path) {
-    struct ::stat status = {};
-    return ::stat(path.c_str(), &status) == 0 ? status.st_mode & 07777 : 0;
-}
-
-// The umask for as long as it lives.
-class Umask {
-public:
-    explicit Umask(mode_t mask) : before_(::umask(mask)) {}
-
-    ~Umask() { ::umask(before_); }
-
-private:
-    mode_t before_;
-};
 
 } // namespace
 
@@ -79,10 +61,10 @@ TEST(FilePreferences, IgnoresWhatCannotBeTrusted) {
     const auto file = folder.write("com.x.plist", *plist::writeXml(Dictionary{{"key", 1}}));
     FilePreferences preferences(folder.path());
     ASSERT_TRUE(preferences.value("com.x", "key"));
-    ASSERT_EQ(::chmod(file.c_str(), 0666), 0);
+    setMode(file, 0666);
     preferences.synchronize("com.x");
     EXPECT_FALSE(preferences.value("com.x", "key"));
-    ASSERT_EQ(::chmod(file.c_str(), 0644), 0);
+    setMode(file, 0644);
     preferences.synchronize("com.x");
     EXPECT_TRUE(preferences.value("com.x", "key"));
     for (const std::string& content : {std::string("broken"), *plist::writeXml(Array{1})}) {
@@ -115,7 +97,7 @@ TEST(FileNotifications, CountEachPost) {
 TEST(FileNotifications, NeverWaitAndNeverLeaveTheirFolder) {
     const TestFolder folder;
     fs::create_directories(folder / "notify");
-    ASSERT_EQ(::mkfifo((folder / "notify/pipe").c_str(), 0666), 0);
+    makeFifo(folder / "notify/pipe");
     folder.write("target", "");
     fs::create_symlink("../target", folder / "notify/link");
     FileNotifications notifications(folder / "notify");

@@ -1,6 +1,4 @@
 #include <functional>
-#include <sys/stat.h>
-#include <unistd.h>
 
 #include "platform/bundle/ExtensionPoints.h"
 #include "platform/plist/PropertyList.h"
@@ -31,45 +29,34 @@ TEST_F(RegistryTest, AgreesWithHostsOnExtensionPoints) {
     places.extensionPointFolders = {home / "z", home / "a"};
     const std::string file = std::string(identifier) + ".plist";
     const std::string first = "a/" + file;
+    const auto writeBoth = [&](const std::string& content) {
+        home.write("z/" + file, listOf("z"));
+        home.write(first, content);
+    };
+    const auto link = [&](const std::string& to) {
+        std::filesystem::create_symlink(home.write("else/" + to, listOf("e")), home / first);
+    };
+    const std::string sound = listOf("a");
 
     const std::tuple<const char*, std::function<void()>, bool> cases[] = {
         {"none", [] {}, false},
         {"in one folder", [&] { home.write("z/" + file, listOf("z")); }, true},
-        {"in both",
-         [&] {
-             home.write("z/" + file, listOf("z"));
-             home.write(first, listOf("a"));
-         },
-         true},
-        {"the first broken",
-         [&] {
-             home.write("z/" + file, listOf("z"));
-             home.write(first, "broken");
-         },
-         true},
+        {"in both", [&] { writeBoth(sound); }, true},
+        {"the first broken", [&] { writeBoth("broken"); }, true},
         {"as deep as may be", [&] { home.write(first, nestedList(32)); }, true},
         {"too deep", [&] { home.write(first, nestedList(33)); }, false},
-        {"too large", [&] { home.write(first, listOf("a") + std::string(1 << 20, ' ')); }, false},
-        {"writable by others", [&] { ::chmod(home.write(first, listOf("a")).c_str(), 0666); },
-         false},
+        {"too large", [&] { home.write(first, sound + std::string(1 << 20, ' ')); }, false},
+        {"writable by others", [&] { setMode(home.write(first, sound), 0666); }, false},
         {"in a folder of someone else",
          [&] {
-             home.write(first, listOf("a"));
-             ASSERT_EQ(::chown((home / "a").c_str(), 12345, 12345), 0);
+             home.write(first, sound);
+             giveAway(home / "a");
          },
          false},
         {"a folder", [&] { home.write(first + "/x", "x"); }, false},
-        {"a FIFO", [&] { ASSERT_EQ(::mkfifo((home / first).c_str(), 0644), 0); }, false},
-        {"a link",
-         [&] {
-             std::filesystem::create_symlink(home.write("else/" + file, listOf("e")), home / first);
-         },
-         true},
-        {"a link to another name",
-         [&] {
-             std::filesystem::create_symlink(home.write("else/x.plist", listOf("e")), home / first);
-         },
-         false},
+        {"a FIFO", [&] { makeFifo(home / first); }, false},
+        {"a link", [&] { link(file); }, true},
+        {"a link to another name", [&] { link("x.plist"); }, false},
     };
 
     for (const auto& [what, prepare, known] : cases) {

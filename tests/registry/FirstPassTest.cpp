@@ -5,7 +5,6 @@
 
 using platform::Dictionary;
 using platform::Uuid;
-using Strings = std::vector<std::string>;
 
 namespace {
 

@@ -4,7 +4,6 @@
 #include "tests/registry/RegistryFixture.h"
 
 using platform::Dictionary;
-using Strings = std::vector<std::string>;
 
 namespace {
 
@@ -36,24 +35,6 @@ protected:
 
     // How often something was verified since the last call.
     int verified() { return std::exchange(signing.verified, 0); }
-};
-
-// Keeps what it was given to verify.
-struct Examiner final : platform::CodeSigning {
-    std::vector<platform::SignedBundle> seen;
-
-    [[nodiscard]] std::unique_ptr<platform::SigningTask>
-    taskFor(std::shared_ptr<const platform::ipc::Peer>) override {
-        return nullptr;
-    }
-
-    [[nodiscard]] std::expected<platform::SignatureGrant, std::string>
-    verifyBundle(const platform::SignedBundle& bundle) override {
-        seen.push_back(bundle);
-        return std::unexpected("no");
-    }
-
-    [[nodiscard]] bool isTrusted(std::string_view) override { return false; }
 };
 
 } // namespace
@@ -88,26 +69,24 @@ TEST_F(Grants, AreVerifiedWhenABundleIsNewOrChangedAndAtNoOtherTime) {
 }
 
 TEST_F(Grants, AreJudgedByWhatTheFilesHold) {
-    Examiner examiner;
     sign(one, "this");
     sign(two, "that");
     remove(std::string(two) + "/program");
-    registry.reset();
-    registry = std::move(*ARRegistry::open(places, locale, containers, types, examiner));
+    open();
     platform::Sha256 hash;
-    ASSERT_EQ(examiner.seen.size(), 2U);
-    EXPECT_EQ(examiner.seen[0].info, *hash.ofFile(home / (std::string(one) + "/Info.plist")));
-    ASSERT_TRUE(examiner.seen[0].executable);
-    EXPECT_EQ(examiner.seen[0].executable->size, std::string("code of one").size());
-    EXPECT_EQ(examiner.seen[0].executable->digest, hash.of("code of one"));
-    EXPECT_FALSE(examiner.seen[1].executable);
+    const auto& seen = signing.seen;
+    ASSERT_EQ(seen.size(), 2U);
+    EXPECT_EQ(seen[0].info, *hash.ofFile(home / (std::string(one) + "/Info.plist")));
+    ASSERT_TRUE(seen[0].executable);
+    EXPECT_EQ(seen[0].executable->size, std::string("code of one").size());
+    EXPECT_EQ(seen[0].executable->digest, hash.of("code of one"));
+    EXPECT_FALSE(seen[1].executable);
 
     EXPECT_FALSE(at(one)->entitlements()); // judged again, from the database alone
-    ASSERT_EQ(examiner.seen.size(), 3U);
-    EXPECT_EQ(examiner.seen[2].info, examiner.seen[0].info);
-    EXPECT_EQ(examiner.seen[2].executable->size, examiner.seen[0].executable->size);
-    EXPECT_EQ(examiner.seen[2].executable->digest, examiner.seen[0].executable->digest);
-    registry.reset();
+    ASSERT_EQ(seen.size(), 3U);
+    EXPECT_EQ(seen[2].info, seen[0].info);
+    EXPECT_EQ(seen[2].executable->size, seen[0].executable->size);
+    EXPECT_EQ(seen[2].executable->digest, seen[0].executable->digest);
 }
 
 TEST_F(Grants, ComeAndGoWithTheirKey) {

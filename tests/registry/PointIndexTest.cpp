@@ -7,7 +7,6 @@
 using platform::Array;
 using platform::Dictionary;
 using platform::Value;
-using Strings = std::vector<std::string>;
 
 namespace {
 

@@ -7,8 +7,6 @@
 #include "AppRegistry/ARStore.h"
 #include "tests/registry/RegistryFixture.h"
 
-using Strings = std::vector<std::string>;
-
 namespace {
 
 constexpr const char* inside = "Applications/A.app/PlugIns/In.appex";

@@ -73,8 +73,8 @@ platform::Uuid RegistryTest::uuidOf(std::string_view path) const {
 
 namespace {
 
-std::vector<std::string> identifiersOf(const ARApplicationWorkspace::PlugIns& plugIns) {
-    std::vector<std::string> found;
+Strings identifiersOf(const ARApplicationWorkspace::PlugIns& plugIns) {
+    Strings found;
     for (const auto& plugIn : plugIns)
         found.push_back(*plugIn->plugInIdentifier());
     return found;
@@ -82,11 +82,11 @@ std::vector<std::string> identifiersOf(const ARApplicationWorkspace::PlugIns& pl
 
 } // namespace
 
-std::vector<std::string> RegistryTest::identifiers() const {
+Strings RegistryTest::identifiers() const {
     return identifiersOf(*registry->installedPlugins());
 }
 
-std::vector<std::string> RegistryTest::matching(const platform::Value& pointPattern) const {
+Strings RegistryTest::matching(const platform::Value& pointPattern) const {
     const Dictionary query{{"HXExtensionPointIdentifier", pointPattern}};
     return identifiersOf(*registry->pluginsMatchingQuery(query, {}));
 }

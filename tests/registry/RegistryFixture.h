@@ -6,14 +6,15 @@
 #include <thread>
 #include <vector>
 
-#include <gtest/gtest.h>
-
 #include "AppRegistry/ARRegistry.h"
 #include "platform/container/FolderContainers.h"
-#include "platform/log/Log.h"
 #include "platform/types/DeclaredTypes.h"
 #include "tests/platform/TestFolder.h"
 #include "tests/support/FakePlatform.h"
+#include "tests/support/Files.h"
+#include "tests/support/LogOf.h"
+
+using Strings = std::vector<std::string>;
 
 // A temporary home with bundles in it, and the registry over it: opened, closed and opened again
 // as the daemon would.
@@ -36,10 +37,6 @@ protected:
 
     // Opens the registry anew; the one before is closed first. Returns what it logged.
     std::string open();
-    // What `act` logs.
-    template <class Act>
-    static std::string logOf(Act&& act);
-
     // In how many places of a log the text stands.
     [[nodiscard]] static std::size_t linesWith(std::string_view log, std::string_view text);
     // Changes the database of the registry, which is closed first.
@@ -49,8 +46,8 @@ protected:
     // The UUID of the plug-in at a path, all zero when there is none.
     [[nodiscard]] platform::Uuid uuidOf(std::string_view path) const;
     // The identifiers of all plug-ins, in the registry's order.
-    [[nodiscard]] std::vector<std::string> identifiers() const;
-    [[nodiscard]] std::vector<std::string> matching(const platform::Value& pointPattern) const;
+    [[nodiscard]] Strings identifiers() const;
+    [[nodiscard]] Strings matching(const platform::Value& pointPattern) const;
 
     TestFolder home;
     platform::Places places;
@@ -60,12 +57,3 @@ protected:
     FakeSigning signing;
     std::unique_ptr<ARRegistry> registry;
 };
-
-template <class Act>
-std::string RegistryTest::logOf(Act&& act) {
-    platform::log::flush();
-    testing::internal::CaptureStderr();
-    act();
-    platform::log::flush();
-    return testing::internal::GetCapturedStderr();
-}

@@ -44,6 +44,7 @@ struct FakeSigning final : platform::CodeSigning {
     std::map<std::string, platform::Dictionary> granted; // by content of the signature file
     std::string key = "the key";                         // whose grants count
     int verified = 0;                                    // signatures that took calculation
+    std::vector<platform::SignedBundle> seen;            // the same, but for their signatures
 
     struct Task final : platform::SigningTask {
         explicit Task(FakeSigning& its) : signing(its), entitlements(its.clientEntitlements) {}
@@ -92,6 +93,7 @@ struct FakeSigning final : platform::CodeSigning {
     [[nodiscard]] std::expected<platform::SignatureGrant, std::string>
     verifyBundle(const platform::SignedBundle& bundle) override {
         ++verified;
+        seen.push_back(bundle);
         const auto found = granted.find(std::string(bundle.signature));
         if (found == granted.end())
             return std::unexpected("nobody granted this");
