@@ -1,63 +1,35 @@
-#include "zpctl/CommandLine.h"
-
-#include <cstdlib>
-#include <filesystem>
-#include <fstream>
 #include <regex>
-#include <sstream>
-#include <string>
-#include <sys/socket.h>
-#include <sys/un.h>
-#include <vector>
-
-#include <gmock/gmock.h>
-#include <gtest/gtest.h>
-#include <nlohmann/json.hpp>
 
 #include "platform/file/File.h"
-#include "platform/log/Log.h"
-#include "tests/server/TemporaryHome.h"
+#include "tests/zpctl/ToolFixture.h"
 
 namespace {
 
 using testing::HasSubstr;
-using zpctl::Status;
+using testing::StartsWith;
+using CommandLine = ToolFixture;
 
 constexpr const char* uuid = "2B4F0C52-5B8B-4C5B-9B0B-0F6C1B7C9E11";
 
-// Runs the tool where there is no daemon.
-class CommandLine : public testing::Test {
-protected:
-    CommandLine() { platform::log::silence(); }
-
-    Status run(const std::vector<std::string>& arguments) {
-        out_.str("");
-        err_.str("");
-        return zpctl::run(arguments, {.out = out_, .err = err_});
-    }
-
-    const TemporaryHome temporary_;
-    const std::filesystem::path home_ = temporary_.folder().path();
-    std::ostringstream out_;
-    std::ostringstream err_;
-};
-
 TEST_F(CommandLine, ExplainsItselfOnStandardOutput) {
-    EXPECT_EQ(run({"--help"}), Status::done);
+    const auto explained = [](const Words& arguments) {
+        const Run done = run(arguments);
+        EXPECT_EQ(done.status, Status::done);
+        EXPECT_EQ(done.err, "");
+        return done.out;
+    };
+    const std::string help = explained({"--help"});
     for (const zpctl::Verb& verb : zpctl::verbs())
-        EXPECT_THAT(out_.str(), HasSubstr(verb.name));
-    EXPECT_EQ(run({"match", "--help"}), Status::done);
-    EXPECT_THAT(out_.str(), HasSubstr("KEY=PATTERN"));
-    EXPECT_EQ(run({"--version"}), Status::done);
-    EXPECT_THAT(out_.str(), testing::StartsWith("zpctl "));
-    EXPECT_EQ(err_.str(), "");
+        EXPECT_THAT(help, HasSubstr(verb.name));
+    EXPECT_THAT(explained({"match", "--help"}), HasSubstr("KEY=PATTERN"));
+    EXPECT_THAT(explained({"--version"}), StartsWith("zpctl "));
 }
 
 TEST_F(CommandLine, HasAManualThatKnowsAsMuchAsHelp) {
     const std::string manual = platform::readRegularFile(ZPCTL_MANUAL, 1U << 20).value().bytes;
-    const auto compare = [&](const std::vector<std::string>& help) {
-        ASSERT_EQ(run(help), Status::done);
-        const std::string text = out_.str();
+    const auto compare = [&](const Words& help) {
+        const auto [status, text, errors] = run(help);
+        ASSERT_EQ(status, Status::done);
         const std::regex option("--([a-z]+)");
         for (std::sregex_iterator found(text.begin(), text.end(), option), end; found != end;
              ++found)
@@ -71,7 +43,7 @@ TEST_F(CommandLine, HasAManualThatKnowsAsMuchAsHelp) {
 }
 
 TEST_F(CommandLine, RefusesWrongUsage) {
-    const std::vector<std::string> cases[] = {
+    const Words cases[] = {
         {},
         {"fly"},
         {"find"},
@@ -96,14 +68,15 @@ TEST_F(CommandLine, RefusesWrongUsage) {
         {"monitor", "--count", "0"},
     };
     for (const auto& arguments : cases) {
-        EXPECT_EQ(run(arguments), Status::wrongUsage) << testing::PrintToString(arguments);
-        EXPECT_EQ(out_.str(), "") << testing::PrintToString(arguments);
-        EXPECT_NE(err_.str(), "") << testing::PrintToString(arguments);
+        SCOPED_TRACE(testing::PrintToString(arguments));
+        const Run refused = run(arguments);
+        EXPECT_EQ(refused.status, Status::wrongUsage);
+        EXPECT_EQ(refused.out, "");
+        EXPECT_NE(refused.err, "");
     }
 }
 
 TEST_F(CommandLine, SendsNoAnnotationThatWouldBeDropped) {
-    const std::string file = home_ / "annotation.plist";
     const std::pair<const char*, Status> cases[] = {
         {"", Status::wrongUsage},
         {"<key>elected</key><integer>1</integer>", Status::wrongUsage},
@@ -112,13 +85,14 @@ TEST_F(CommandLine, SendsNoAnnotationThatWouldBeDropped) {
         {"<key>extension</key><dict/>", Status::noDaemon},
     };
     for (const auto& [content, status] : cases) {
-        std::ofstream(file) << "<plist><dict>" << content << "</dict></plist>";
-        EXPECT_EQ(run({"annotate", uuid, file}), status) << content;
+        const std::string file =
+            home_.write("a", std::string("<plist><dict>") + content + "</dict></plist>");
+        EXPECT_EQ(statusOf({"annotate", uuid, file}), status) << content;
     }
 }
 
 TEST_F(CommandLine, TellsWhenThereIsNoDaemon) {
-    const std::vector<std::string> cases[] = {
+    const Words cases[] = {
         {"tree"},
         {"match", "--flags", "0x5", "a=b"},
         {"--service", "other", "find", "/x.appex"},
@@ -126,40 +100,13 @@ TEST_F(CommandLine, TellsWhenThereIsNoDaemon) {
         {"add", "/x.appex"},
     };
     for (const auto& arguments : cases) {
-        EXPECT_EQ(run(arguments), Status::noDaemon);
-        EXPECT_THAT(err_.str(),
-                    testing::StartsWith("zpctl: no daemon at " + home_.string() + "/run/"));
+        const Run lost = run(arguments);
+        EXPECT_EQ(lost.status, Status::noDaemon);
+        EXPECT_THAT(lost.err, StartsWith("zpctl: no daemon at " + (home_ / "run/")));
     }
-    EXPECT_EQ(run({"--json", "tree"}), Status::noDaemon);
-    EXPECT_TRUE(nlohmann::json::parse(err_.str())["error"]["message"].is_string());
-}
-
-// Listens at the daemon's place and never accepts.
-class SilentDaemon {
-public:
-    explicit SilentDaemon(const std::filesystem::path& home)
-        : socket_(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
-        std::filesystem::create_directories(home / "run");
-        sockaddr_un address{.sun_family = AF_UNIX, .sun_path = {}};
-        const std::string path = home / "run/com.tovana.zephrin.zpd";
-        path.copy(address.sun_path, sizeof address.sun_path - 1);
-        listening_ = ::bind(socket_.get(), reinterpret_cast<const sockaddr*>(&address),
-                            sizeof address) == 0 &&
-                     ::listen(socket_.get(), 1) == 0;
-    }
-
-    [[nodiscard]] bool listening() const { return listening_; }
-
-private:
-    platform::UniqueFd socket_;
-    bool listening_ = false;
-};
-
-TEST_F(CommandLine, GivesUpOnADaemonThatDoesNotAnswer) {
-    const SilentDaemon daemon(home_);
-    ASSERT_TRUE(daemon.listening());
-    EXPECT_EQ(run({"--timeout", "0.2", "tree"}), Status::noDaemon);
-    EXPECT_EQ(err_.str(), "zpctl: the daemon did not answer within 0.2 s\n");
+    const Run lost = run({"--json", "tree"});
+    EXPECT_EQ(lost.status, Status::noDaemon);
+    EXPECT_TRUE(nlohmann::json::parse(lost.err)["error"]["message"].is_string());
 }
 
 } // namespace

@@ -2,64 +2,35 @@
 
 #include <atomic>
 #include <csignal>
-#include <cstdlib>
 #include <fcntl.h>
-#include <filesystem>
 #include <functional>
 #include <random>
 #include <sched.h>
-#include <sstream>
-#include <string>
 #include <sys/mount.h>
 #include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <thread>
 #include <unistd.h>
-#include <vector>
-
-#include <gmock/gmock.h>
-#include <gtest/gtest.h>
-#include <nlohmann/json.hpp>
 
 #include "platform/file/File.h"
-#include "platform/log/Log.h"
-#include "tests/platform/TestFolder.h"
-#include "zpctl/CommandLine.h"
+#include "tests/zpctl/ToolFixture.h"
 
 namespace fs = std::filesystem;
 using testing::ElementsAre;
 using testing::HasSubstr;
-using zpctl::Status;
 
 namespace {
 
 constexpr const char* lock = ".zpctl.lock";
 constexpr int plugIns = 6; // of what is installed
 
-class Installing : public testing::Test {
+class Installing : public ToolFixture {
 protected:
-    struct Run {
-        Status status = Status::done;
-        std::string out;
-        std::string err;
-    };
-
-    Installing() {
-        platform::log::silence();
-        ::umask(022);
-        setenv("ZEPHRIN_HOME", (home_ / "home").c_str(), 1);
-    }
-
-    static Run run(const std::vector<std::string>& arguments) {
-        std::ostringstream out;
-        std::ostringstream err;
-        const Status status = zpctl::run(arguments, {.out = out, .err = err});
-        return {status, out.str(), err.str()};
-    }
+    Installing() { ::umask(022); }
 
     [[nodiscard]] std::string installed(const std::string& below = "") const {
-        return home_ / ("home/Applications" + below);
+        return home_ / ("Applications" + below);
     }
 
     // All names in the application folder, the hidden ones too.
@@ -103,8 +74,6 @@ protected:
         }
         return version;
     }
-
-    const TestFolder home_;
 };
 
 // What a process of its own answers with, as its exit status.
@@ -130,7 +99,7 @@ TEST_F(Installing, CopiesWhatTheDaemonCanTrust) {
     ASSERT_EQ(::chmod((app + "/Info.plist").c_str(), 0660), 0);
     ASSERT_EQ(::chmod((app + "/PlugIns").c_str(), 01777), 0);
 
-    EXPECT_EQ(run({"uninstall", "com.example.a"}).status, Status::refused);
+    EXPECT_EQ(statusOf({"uninstall", "com.example.a"}), Status::refused);
     EXPECT_FALSE(fs::exists(installed()));
     auto [status, out, err] = run({"--json", "install", app});
     ASSERT_EQ(status, Status::done) << err;
@@ -145,56 +114,54 @@ TEST_F(Installing, CopiesWhatTheDaemonCanTrust) {
     EXPECT_EQ(fs::read_symlink(installed("/A.app/link")), "/nowhere/at all");
     EXPECT_TRUE(fs::exists(installed("/A.app/a\nline\x1b[31m")));
 
-    EXPECT_EQ(run({"install", source("2")}).status, Status::done);
+    EXPECT_EQ(statusOf({"install", source("2")}), Status::done);
     EXPECT_EQ(version(), "2");
     EXPECT_FALSE(fs::exists(installed("/A.app/link"))) << "a new one, not the old with more in it";
-    EXPECT_EQ(run({"uninstall", "com.example.a"}).status, Status::done);
+    EXPECT_EQ(statusOf({"uninstall", "com.example.a"}), Status::done);
     EXPECT_THAT(names(), ElementsAre(lock));
-    EXPECT_EQ(run({"uninstall", "com.example.a"}).status, Status::refused);
+    EXPECT_EQ(statusOf({"uninstall", "com.example.a"}), Status::refused);
 }
 
 TEST_F(Installing, RefusesWhatIsNoSoundApplication) {
-    ASSERT_EQ(run({"install", source("1")}).status, Status::done);
+    ASSERT_EQ(statusOf({"install", source("1")}), Status::done);
     const std::string sound = source("2");
     int copies = 0;
-    const auto copyWith = [&](const char* name,
-                              const std::function<void(const std::string&)>& spoil) {
+    using Spoil = std::function<void(const std::string& folder)>;
+    const auto copyWith = [&](const char* name, const Spoil& spoil) {
         const std::string folder = "copy" + std::to_string(++copies) + "/" + name;
         fs::create_directories(fs::path(home_ / folder).parent_path());
         fs::copy(sound, home_ / folder, fs::copy_options::recursive);
         spoil(folder);
         return home_ / folder;
     };
-    const auto asIs = [](const std::string&) {};
-    const auto named = [&](const char* identifier) {
-        return [this, identifier](const std::string& folder) { info(folder, identifier); };
-    };
-    const std::pair<std::string, const char*> cases[] = {
-        {home_ / "nothing.app", "No such file"},
-        {copyWith("A.bundle", asIs), "does not end in .app"},
-        {copyWith(".app", asIs), "does not end in .app"},
-        {copyWith("N.app",
-                  [&](const std::string& folder) { fs::remove(home_ / (folder + "/Info.plist")); }),
-         "no Info.plist can be read"},
-        {copyWith("D.app",
-                  [&](const std::string& folder) {
-                      home_.write(folder + "/Info.plist", "<plist><array/></plist>");
-                  }),
-         "not a dictionary"},
-        {copyWith("I.app", named("")), "BQBundleIdentifier"},
-        {copyWith("J.app", named("../up")), "BQBundleIdentifier"},
-        {copyWith("B.app", asIs), "is there already as A.app"},
-        {copyWith("A.app", named("com.example.other")), "is another application there"},
-        {copyWith("A.app",
-                  [&](const std::string& folder) { home_.write(folder + "/.installing", ""); }),
-         ".installing"},
-        {installed("/A.app"), "where it belongs already"},
-    };
-    for (const auto& [path, why] : cases) {
+    const auto expectRefused = [](const std::string& path, const char* why) {
         const Run refused = run({"install", path});
         EXPECT_EQ(refused.status, Status::refused) << path;
         EXPECT_THAT(refused.err, HasSubstr(why)) << path;
-    }
+    };
+    const Spoil asIs = [](const std::string&) {};
+    const auto named = [&](const char* identifier) -> Spoil {
+        return [this, identifier](const std::string& folder) { info(folder, identifier); };
+    };
+    const auto with = [&](const char* file, const char* content) -> Spoil {
+        return [=, this](const std::string& folder) { home_.write(folder + file, content); };
+    };
+    const std::tuple<const char*, Spoil, const char*> cases[] = {
+        {"A.bundle", asIs, "does not end in .app"},
+        {".app", asIs, "does not end in .app"},
+        {"N.app", [&](auto& folder) { fs::remove(home_ / (folder + "/Info.plist")); },
+         "no Info.plist can be read"},
+        {"D.app", with("/Info.plist", "<plist><array/></plist>"), "not a dictionary"},
+        {"I.app", named(""), "BQBundleIdentifier"},
+        {"J.app", named("../up"), "BQBundleIdentifier"},
+        {"B.app", asIs, "is there already as A.app"},
+        {"A.app", named("com.example.other"), "is another application there"},
+        {"A.app", with("/.installing", ""), ".installing"},
+    };
+    for (const auto& [name, spoil, why] : cases)
+        expectRefused(copyWith(name, spoil), why);
+    expectRefused(home_ / "nothing.app", "No such file");
+    expectRefused(installed("/A.app"), "where it belongs already");
     const std::string pipe = copyWith("A.app", [&](const std::string& folder) {
         ASSERT_EQ(::mkfifo((home_ / (folder + "/PlugIns/pipe\n")).c_str(), 0600), 0);
     });
@@ -207,7 +174,7 @@ TEST_F(Installing, RefusesWhatIsNoSoundApplication) {
 }
 
 TEST_F(Installing, IsOneStepForWhoLooksAllTheTime) {
-    ASSERT_EQ(run({"install", source("1")}).status, Status::done);
+    ASSERT_EQ(statusOf({"install", source("1")}), Status::done);
     source("2");
     std::atomic<bool> done = false;
     int looks = 0;
@@ -243,9 +210,9 @@ TEST_F(Installing, IsOneStepForWhoLooksAllTheTime) {
 TEST_F(Installing, LeavesTheOldOrTheNewWhenKilled) {
     std::mt19937 random(4); // NOLINT: the same points each time
     const std::string sources[] = {source("1"), source("2")};
-    ASSERT_EQ(run({"install", sources[0]}).status, Status::done);
+    ASSERT_EQ(statusOf({"install", sources[0]}), Status::done);
     const auto begin = std::chrono::steady_clock::now();
-    ASSERT_EQ(run({"install", sources[0]}).status, Status::done);
+    ASSERT_EQ(statusOf({"install", sources[0]}), Status::done);
     const auto usual = std::chrono::steady_clock::now() - begin;
     int killed = 0;
     for (int i = 0; i < 30; ++i) {
@@ -260,7 +227,7 @@ TEST_F(Installing, LeavesTheOldOrTheNewWhenKilled) {
         ::waitpid(child, &status, 0);
         killed += WIFSIGNALED(status) ? 1 : 0;
         EXPECT_THAT(version(), testing::AnyOf("1", "2")) << "was " << before;
-        ASSERT_EQ(run({"install", next}).status, Status::done);
+        ASSERT_EQ(statusOf({"install", next}), Status::done);
         EXPECT_EQ(version(), next == sources[0] ? "1" : "2");
         EXPECT_THAT(names(), ElementsAre(lock, "A.app"));
     }
@@ -274,14 +241,14 @@ TEST_F(Installing, ClearsWhatEarlierRunsHaveLeftAndNothingElse) {
         fs::create_directory_symlink(home_ / "kept", installed(left) + "/link");
         ASSERT_EQ(::chmod(installed(left).c_str(), 0), 0);
     }
-    home_.write("home/Applications/.other/file", "");
-    ASSERT_EQ(run({"install", source("1")}).status, Status::done);
+    home_.write("Applications/.other/file", "");
+    ASSERT_EQ(statusOf({"install", source("1")}), Status::done);
     EXPECT_THAT(names(), ElementsAre(".other", lock, "A.app"));
     EXPECT_TRUE(fs::exists(kept));
 }
 
 TEST_F(Installing, LeavesNothingBehindWhenTheDiskIsFull) {
-    ASSERT_EQ(run({"install", source("1")}).status, Status::done);
+    ASSERT_EQ(statusOf({"install", source("1")}), Status::done);
     home_.write("v2/A.app/last", std::string(5000, 'x'));
     info("v2/A.app", "com.example.a");
     const int refused = inChild([&] {
@@ -299,7 +266,7 @@ TEST_F(Installing, LeavesNothingBehindWhenTheDiskIsFull) {
 TEST_F(Installing, RefusesWhereFoldersCannotBeExchanged) {
     constexpr int cannotMount = 77;
     info("lower/A.app", "com.example.a", "0");
-    for (const char* folder : {"upper", "work", "home/Applications"})
+    for (const char* folder : {"upper", "work", "Applications"})
         fs::create_directories(home_ / folder);
     source("1");
     const int result = inChild([&] {

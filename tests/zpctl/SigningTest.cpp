@@ -1,49 +1,34 @@
-#include <cstdlib>
-#include <filesystem>
-#include <sstream>
-#include <string>
-#include <vector>
-
-#include <gmock/gmock.h>
-#include <gtest/gtest.h>
-#include <nlohmann/json.hpp>
-
 #include "platform/file/File.h"
-#include "platform/log/Log.h"
-#include "tests/platform/TestFolder.h"
-#include "zpctl/CommandLine.h"
+#include "tests/zpctl/ToolFixture.h"
 
 namespace fs = std::filesystem;
+using testing::AllOf;
 using testing::HasSubstr;
-using zpctl::Status;
 
 namespace {
 
 // Runs the verbs that sign on a home that trusts the key in keys/.
-class Signing : public testing::Test {
+class Signing : public ToolFixture {
 protected:
     Signing() {
-        platform::log::silence();
-        setenv("ZEPHRIN_HOME", home_.path().c_str(), 1);
-        EXPECT_EQ(run({"keygen", home_ / "keys"}), Status::done);
+        EXPECT_EQ(statusOf({"keygen", home_ / "keys"}), Status::done);
         fs::create_directories(home_ / "etc/trust.d");
         fs::copy(home_ / "keys/zephrin.pub.pem", home_ / "etc/trust.d");
         home_.write("may.plist", "<plist><dict><key>com.example.may</key><true/></dict></plist>");
     }
 
-    Status run(const std::vector<std::string>& arguments) {
-        out_.str("");
-        err_.str("");
-        return zpctl::run(arguments, {.out = out_, .err = err_});
+    // What it says beside.
+    std::string sign(const std::string& target) const {
+        const Run done =
+            run({"sign", "--key", key_, "--entitlements", home_ / "may.plist", target});
+        EXPECT_EQ(done.status, Status::done) << done.err;
+        return done.err;
     }
 
-    Status sign(const std::string& target) {
-        return run({"sign", "--key", key_, "--entitlements", home_ / "may.plist", target});
-    }
-
-    nlohmann::json verified(const std::string& target, Status expected) {
-        EXPECT_EQ(run({"--json", "verify", target}), expected) << err_.str();
-        return nlohmann::json::parse(out_.str());
+    static nlohmann::json verified(const std::string& target, Status expected) {
+        const Run verify = run({"--json", "verify", target});
+        EXPECT_EQ(verify.status, expected) << verify.err;
+        return nlohmann::json::parse(verify.out);
     }
 
     std::string bundle(const std::string& name, const std::string& executable) const {
@@ -56,10 +41,7 @@ protected:
         return static_cast<unsigned>(fs::status(path).permissions());
     }
 
-    const TestFolder home_;
     const std::string key_ = home_ / "keys/zephrin.key.pem";
-    std::ostringstream out_;
-    std::ostringstream err_;
 };
 
 TEST_F(Signing, MakesAKeyOnceAndForItsOwnerAlone) {
@@ -67,10 +49,11 @@ TEST_F(Signing, MakesAKeyOnceAndForItsOwnerAlone) {
     EXPECT_EQ(modeOf(home_ / "keys/zephrin.pub.pem"), 0644U);
     const auto secret = [&] { return platform::readRegularFile(key_, 1000).value().bytes; };
     const std::string before = secret();
-    EXPECT_EQ(run({"keygen", home_ / "keys"}), Status::refused);
-    EXPECT_THAT(err_.str(), HasSubstr("File exists"));
+    const Run again = run({"keygen", home_ / "keys"});
+    EXPECT_EQ(again.status, Status::refused);
+    EXPECT_THAT(again.err, HasSubstr("File exists"));
     fs::remove(home_ / "keys/zephrin.pub.pem");
-    EXPECT_EQ(run({"keygen", home_ / "keys"}), Status::refused);
+    EXPECT_EQ(statusOf({"keygen", home_ / "keys"}), Status::refused);
     EXPECT_FALSE(fs::exists(home_ / "keys/zephrin.pub.pem"));
     EXPECT_EQ(secret(), before);
 }
@@ -86,7 +69,7 @@ TEST_F(Signing, SignsWhatVerifiesAfterwards) {
           {main, whole, whole + "/Signature"},
           {empty, empty, empty + "/Signature"}}) {
         EXPECT_EQ(verified(verifiedPath, Status::refused)["counts"], false);
-        ASSERT_EQ(sign(signedPath), Status::done) << err_.str();
+        sign(signedPath);
         const auto answer = verified(verifiedPath, Status::done);
         EXPECT_EQ(answer["counts"], true);
         EXPECT_EQ(answer["reason"], nullptr);
@@ -95,18 +78,19 @@ TEST_F(Signing, SignsWhatVerifiesAfterwards) {
         EXPECT_EQ(answer["entitlements"], (nlohmann::json{{"com.example.may", true}}));
         fs::remove(signature);
     }
-    ASSERT_EQ(run({"sign", "--key", key_, tool}), Status::done);
+    ASSERT_EQ(statusOf({"sign", "--key", key_, tool}), Status::done);
     EXPECT_EQ(verified(tool, Status::done)["entitlements"], nlohmann::json::object());
 }
 
 TEST_F(Signing, TellsWhereAVerificationEnded) {
     const std::string tool = home_.write("tool", "a tool");
-    ASSERT_EQ(sign(tool), Status::done);
+    sign(tool);
     home_.write("tool", "a TOOL");
-    EXPECT_EQ(run({"verify", tool}), Status::refused);
-    EXPECT_THAT(out_.str(), testing::AllOf(HasSubstr("yes  The executable has the signed size"),
-                                           HasSubstr("NO   The executable has the signed content"),
-                                           HasSubstr("Does not count: the executable is not")));
+    const Run verify = run({"verify", tool});
+    EXPECT_EQ(verify.status, Status::refused);
+    EXPECT_THAT(verify.out, AllOf(HasSubstr("yes  The executable has the signed size"),
+                                  HasSubstr("NO   The executable has the signed content"),
+                                  HasSubstr("Does not count: the executable is not")));
     fs::remove(home_ / "etc/trust.d/zephrin.pub.pem");
     const auto answer = verified(tool, Status::refused);
     EXPECT_EQ(answer["steps"].back()["claim"], "The key is trusted");
@@ -116,13 +100,11 @@ TEST_F(Signing, TellsWhereAVerificationEnded) {
 TEST_F(Signing, WarnsOfWhatOthersMayDo) {
     const std::string tool = home_.write("tool", "a tool");
     fs::permissions(tool, fs::perms(0750));
-    ASSERT_EQ(sign(tool), Status::done);
-    EXPECT_EQ(err_.str(), "");
+    EXPECT_EQ(sign(tool), "");
     fs::permissions(tool, fs::perms(0755));
     fs::permissions(key_, fs::perms(0640));
-    ASSERT_EQ(sign(tool), Status::done);
-    EXPECT_THAT(err_.str(), HasSubstr(key_ + " can be read by others"));
-    EXPECT_THAT(err_.str(), HasSubstr(tool + " may be run by everybody"));
+    EXPECT_THAT(sign(tool), AllOf(HasSubstr(key_ + " can be read by others"),
+                                  HasSubstr(tool + " may be run by everybody")));
     EXPECT_THAT(verified(tool, Status::done)["notes"].dump(), HasSubstr("run by everybody"));
 
     const std::string whole = bundle("Whole.app", "Main");
@@ -135,7 +117,7 @@ TEST_F(Signing, RefusesWhatItCannotSignOrRead) {
     const std::string tool = home_.write("tool", "a tool");
     const std::string list = home_.write("list.plist", "<plist><array/></plist>");
     const std::string key = "--key=" + key_;
-    const std::pair<std::vector<std::string>, Status> cases[] = {
+    const std::pair<Words, Status> cases[] = {
         {{"sign", "--key", tool, tool}, Status::wrongUsage},
         {{"sign", "--key", home_ / "keys/zephrin.pub.pem", tool}, Status::wrongUsage},
         {{"sign", key, "--entitlements", list, tool}, Status::wrongUsage},
@@ -148,9 +130,11 @@ TEST_F(Signing, RefusesWhatItCannotSignOrRead) {
         {{"keygen", tool}, Status::refused},
     };
     for (const auto& [arguments, status] : cases) {
-        EXPECT_EQ(run(arguments), status) << testing::PrintToString(arguments);
-        EXPECT_NE(err_.str(), "") << testing::PrintToString(arguments);
-        EXPECT_EQ(out_.str(), "") << testing::PrintToString(arguments);
+        SCOPED_TRACE(testing::PrintToString(arguments));
+        const Run refused = run(arguments);
+        EXPECT_EQ(refused.status, status);
+        EXPECT_NE(refused.err, "");
+        EXPECT_EQ(refused.out, "");
     }
     EXPECT_FALSE(fs::exists(tool + ".signature"));
 }
