@@ -27,11 +27,13 @@ using Reply = ZPDaemonClient::Reply;
 
 class ClientLibrary : public testing::Test {
 protected:
+    using Block = ZPDaemonClient::ReplyBlock;
+
     // The reply to what `call` sends.
-    template <class Call>
-    Reply replyTo(Call&& call) {
+    static Reply replyTo(ZPDaemonClient& client,
+                         const std::function<void(ZPDaemonClient&, Block)>& call) {
         const Awaited<Reply> arrived;
-        call(client_, [arrived](const Reply& reply) { arrived.bring(reply); });
+        call(client, [arrived](const Reply& reply) { arrived.bring(reply); });
         return arrived.get();
     }
 
@@ -58,12 +60,7 @@ TEST_F(ClientLibrary, SendsTheKeysOfEachRequest) {
         keys.set(key, value);
         return keys;
     };
-    using Block = ZPDaemonClient::ReplyBlock;
-
-    const struct {
-        std::function<void(ZPDaemonClient&, Block)> call;
-        Dictionary sent;
-    } cases[] = {
+    const std::pair<std::function<void(ZPDaemonClient&, Block)>, Dictionary> cases[] = {
         {[](auto& c, Block b) { c.addPlugIns({"/a", "/b"}, std::move(b)); },
          envelope("add", {{"paths", Array{"/a", "/b"}}})},
         {[](auto& c, Block b) { c.removePlugIns({}, std::move(b)); },
@@ -94,15 +91,14 @@ TEST_F(ClientLibrary, SendsTheKeysOfEachRequest) {
          envelope("lock", {{"uuids", Array{one_}}})},
     };
 
-    for (const auto& test : cases)
-        EXPECT_EQ(describe(replyTo(test.call).value()), describe(test.sent));
+    for (const auto& [call, sent] : cases)
+        EXPECT_EQ(describe(replyTo(client_, call).value()), describe(sent));
 }
 
 TEST_F(ClientLibrary, AnAbsentDaemonIsAnErrorInTheReply) {
     ZPDaemonClient nobody("com.tovana.test.nobody");
-    const Awaited<Reply> arrived;
-    nobody.bulkPlugins(0, [arrived](const Reply& reply) { arrived.bring(reply); });
-    const auto error = ZPDaemonClient::errorInReply(arrived.get());
+    const Reply reply = replyTo(nobody, [](auto& c, Block b) { c.bulkPlugins(0, std::move(b)); });
+    const auto error = ZPDaemonClient::errorInReply(reply);
     ASSERT_TRUE(error);
     EXPECT_EQ(error->domain, &ZPDErrorDomain);
     EXPECT_EQ(error->code, 4);
@@ -110,11 +106,7 @@ TEST_F(ClientLibrary, AnAbsentDaemonIsAnErrorInTheReply) {
 }
 
 TEST(ErrorInReply, IsReadFromCodeAndText) {
-    const struct {
-        Dictionary reply;
-        std::int64_t code;
-        const char* text;
-    } cases[] = {
+    const std::tuple<Dictionary, std::int64_t, const char*> cases[] = {
         {{}, 0, ""},
         {{{"errorcode", 0}}, 0, ""},
         {{{"matches", Array()}}, 0, ""},
@@ -124,10 +116,10 @@ TEST(ErrorInReply, IsReadFromCodeAndText) {
         {{{"errorcode", "7"}}, 0, ""},
     };
 
-    for (const auto& test : cases) {
-        const auto error = ZPDaemonClient::errorInReply(test.reply);
-        EXPECT_EQ(error ? error->code : 0, test.code) << describe(test.reply);
-        EXPECT_EQ(error ? error->description : "", test.text) << describe(test.reply);
+    for (const auto& [reply, code, text] : cases) {
+        const auto error = ZPDaemonClient::errorInReply(reply);
+        EXPECT_EQ(error ? error->code : 0, code) << describe(reply);
+        EXPECT_EQ(error ? error->description : "", text) << describe(reply);
     }
 }
 

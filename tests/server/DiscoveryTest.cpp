@@ -19,8 +19,39 @@ protected:
         platform_.signing.clientEntitlements.set("com.tovana.private.zephrin.manager", true);
     }
 
-    std::string uuidText(const std::shared_ptr<FakePlugIn>& plugIn) const {
-        return plugIn->uuid.text();
+    void addReplacing(const char* identifier, platform::Value replaced) {
+        addPlugIn(identifier)->granted =
+            Dictionary{{"com.tovana.developer.replace-plugin", std::move(replaced)}};
+    }
+
+    // "identifier version", "for" what it replaces, "by" the number of the plug-in that replaces
+    // it.
+    Names replacements() {
+        const Forms forms = match();
+        Names result = names(forms);
+        for (std::size_t i = 0; i < forms.size(); ++i) {
+            if (forms[i].contains("overriding"))
+                result[i] += " for " + textIn(forms[i], "overriding");
+            const auto& all = platform_.workspace.installed;
+            for (std::size_t by = 0; by < all.size(); ++by) {
+                if (all[by]->plugInUUID().text() == textIn(forms[i], "overrider"))
+                    result[i] += " by " + std::to_string(by);
+            }
+            EXPECT_EQ(result[i].contains(" by "), forms[i].contains("overrider"));
+        }
+        return result;
+    }
+
+    ZPDPlugInHold::Ptr hold(const FakePlugIn& plugIn) {
+        auto hold = std::make_shared<ZPDPlugInHold>(std::vector{server().findPlugIn(plugIn.uuid)},
+                                                    std::weak_ptr<ZPDIpcClient>());
+        server().addHold(hold);
+        return hold;
+    }
+
+    void exclude(platform::Value identifiers) {
+        platform_.preferences.values["com.tovana.zephrin.userprefs exclusions"] =
+            Array{Dictionary{{"HXExtensionIdentifier", std::move(identifiers)}}};
     }
 };
 
@@ -32,13 +63,12 @@ TEST_F(Discovery, OfNothingIsAnEmptyList) {
 
 TEST_F(Discovery, FiltersByPlaceUnlessPrivileged) {
     addPlugIn("in-application");
-    const auto alone = addPlugIn("system");
-    alone->path = "/System/Library/PlugIns/system.appex";
-    alone->application = nullptr;
-    alone->onSystem = true;
-    const auto home = addPlugIn("home-system");
-    home->path = "/System/Library/PlugIns/home.appex";
-    home->application = nullptr;
+    for (const bool system : {true, false}) {
+        const auto alone = addPlugIn(system ? "system" : "home-system");
+        alone->path = "/System/Library/PlugIns/" + *alone->identifier + ".appex";
+        alone->application = nullptr;
+        alone->onSystem = system;
+    }
     makeClientManager();
     EXPECT_EQ(names(match()), (Names{"in-application 1", "system 1"}));
     EXPECT_EQ(names(match(systemOnly)), Names{"system 1"});
@@ -49,10 +79,10 @@ TEST_F(Discovery, FiltersByPlaceUnlessPrivileged) {
 TEST_F(Discovery, OfEverythingIsRefusedToAConfinedManager) {
     makeClientManager();
     platform_.sandbox.confined = true;
-    EXPECT_EQ(failureOf({{"version", 3}, {"request", "match"}, {"flags", everything}}),
-              "11 unauthorized discovery flag (ZPDiscoverAll)");
+    const Dictionary request{{"version", 3}, {"request", "match"}, {"flags", everything}};
+    EXPECT_EQ(failureOf(request), "11 unauthorized discovery flag (ZPDiscoverAll)");
     platform_.sandbox.confined = false;
-    EXPECT_EQ(failureOf({{"version", 3}, {"request", "match"}, {"flags", everything}}), "");
+    EXPECT_EQ(failureOf(request), "");
 }
 
 TEST_F(Discovery, ShowsDedicatedPlugInsToTheirOwnApplicationOnly) {
@@ -73,37 +103,36 @@ TEST_F(Discovery, ShowsDedicatedPlugInsToTheirOwnApplicationOnly) {
     EXPECT_EQ(match(everything).size(), 3U);
 }
 
-TEST_F(Discovery, LeavesOutWhatIsOnHold) {
+TEST_F(Discovery, LeavesOutWhatIsOnHoldOrNotForThisClient) {
     addPlugIn("a");
-    const auto held = addPlugIn("b");
+    const auto onHold = hold(*addPlugIn("b"));
+    setKey(*addPlugIn("c"), "HXExtensionHostEntitlement", "com.example.held");
+    setKey(*addPlugIn("d"), "HXExtensionHostEntitlement", "com.example.not-held");
+    platform_.signing.clientEntitlements.set("com.example.held", "no");
+    platform_.signing.clientEntitlements.set("com.example.not-held", 0);
     makeClientManager();
-    const auto hold = std::make_shared<ZPDPlugInHold>(std::vector{server().findPlugIn(held->uuid)},
-                                                      std::weak_ptr<ZPDIpcClient>());
-    server().addHold(hold);
-    EXPECT_EQ(names(match()), Names{"a 1"});
-    EXPECT_EQ(match(everything).size(), 2U);
-    server().unholdToken(hold->uuid());
-    EXPECT_EQ(match().size(), 2U);
+    EXPECT_EQ(names(match()), (Names{"a 1", "c 1"}));
+    EXPECT_EQ(match(everything).size(), 4U);
+    server().unholdToken(onHold->uuid());
+    EXPECT_EQ(names(match()), (Names{"a 1", "b 1", "c 1"}));
 }
 
 TEST_F(Discovery, LeavesOutTheUsersExclusionsEvenForManagers) {
     addPlugIn("a");
     addPlugIn("b");
     makeClientManager();
-    platform_.preferences.values["com.tovana.zephrin.userprefs exclusions"] =
-        Array{Dictionary{{"HXExtensionIdentifier", Array{"x", "a"}}}};
+    exclude(Array{"x", "a"});
     EXPECT_EQ(names(match(everything)), Names{"b 1"});
 }
 
-TEST_F(Discovery, AsksEachPlugInWhetherTheClientMayUseIt) {
-    addPlugIn("a");
-    setKey(*addPlugIn("b"), "HXExtensionHostEntitlement", "com.example.held");
-    setKey(*addPlugIn("c"), "HXExtensionHostEntitlement", "com.example.not-held");
-    platform_.signing.clientEntitlements.set("com.example.held", "no");
-    platform_.signing.clientEntitlements.set("com.example.not-held", 0);
-    makeClientManager();
-    EXPECT_EQ(names(match()), (Names{"a 1", "b 1"}));
-    EXPECT_EQ(match(everything).size(), 3U);
+TEST_F(Discovery, IsNotInTheWayOfALookUp) {
+    const auto plugIn = addPlugIn("a");
+    setKey(*plugIn, "Dedicated", true);
+    setKey(*plugIn, "HXExtensionHostEntitlement", "com.example.none");
+    exclude("a");
+    hold(*plugIn);
+    EXPECT_TRUE(ask("find", {{"uuids", plugIn->uuid}})->contains("matches"));
+    EXPECT_TRUE(match().empty());
 }
 
 TEST_F(Discovery, TakesTheContainingPathAsALiteralPrefixAndTheLastOfSeveral) {
@@ -118,14 +147,8 @@ TEST_F(Discovery, TakesTheContainingPathAsALiteralPrefixAndTheLastOfSeveral) {
 
 TEST_F(Discovery, MarksReplacements) {
     addPlugIn("x");
-    const auto replacing = addPlugIn("z");
-    replacing->granted = Dictionary{{"com.tovana.developer.replace-plugin", "x"}};
-    const Forms forms = match();
-    ASSERT_EQ(names(forms), (Names{"x 1", "z 1"}));
-    EXPECT_EQ(textIn(forms[0], "overrider"), uuidText(replacing));
-    EXPECT_FALSE(forms[0].contains("overriding"));
-    EXPECT_EQ(textIn(forms[1], "overriding"), "x");
-    EXPECT_FALSE(forms[1].contains("overrider"));
+    addReplacing("z", "x");
+    EXPECT_EQ(replacements(), (Names{"x 1 by 1", "z 1 for x"}));
     EXPECT_EQ(names(match(0, {{"rules", Dictionary{{"HXExtensionIdentifier", "x"}}}})),
               Names{"x 1"});
 }
@@ -133,37 +156,20 @@ TEST_F(Discovery, MarksReplacements) {
 TEST_F(Discovery, TakesAnArrayOfReplacementsAndTheLastWordOfSeveral) {
     addPlugIn("x");
     addPlugIn("y");
-    const char* const key = "com.tovana.developer.replace-plugin";
-    const auto first = addPlugIn("r");
-    first->granted = Dictionary{{key, Array{"x", 5, "y", "absent"}}};
-    const auto last = addPlugIn("s");
-    last->granted = Dictionary{{key, "y"}};
-    addPlugIn("t")->granted = Dictionary{{key, true}};
-    const auto own = addPlugIn("self");
-    own->granted = Dictionary{{key, "self"}};
-    const Forms forms = match();
-    ASSERT_EQ(forms.size(), 6U);
-    EXPECT_EQ(textIn(forms[0], "overrider"), uuidText(first));
-    EXPECT_EQ(textIn(forms[1], "overrider"), uuidText(last));
-    EXPECT_EQ(textIn(forms[2], "overriding"), "x");
-    EXPECT_EQ(textIn(forms[3], "overriding"), "y");
-    EXPECT_FALSE(forms[4].contains("overriding"));
-    EXPECT_EQ(textIn(forms[5], "overriding"), "self");
-    EXPECT_EQ(textIn(forms[5], "overrider"), uuidText(own));
+    addReplacing("r", Array{"x", 5, "y", "absent"});
+    addReplacing("s", "y");
+    addReplacing("t", true);
+    addReplacing("self", "self");
+    EXPECT_EQ(replacements(), (Names{"x 1 by 2", "y 1 by 3", "r 1 for x", "s 1 for y", "t 1",
+                                     "self 1 for self by 5"}));
 }
 
 TEST_F(Discovery, RemembersReplacementsOfDisplacedRegistrations) {
     addPlugIn("x");
-    const auto displaced = addPlugIn("r", "1");
-    displaced->granted = Dictionary{{"com.tovana.developer.replace-plugin", "x"}};
+    addReplacing("r", "x");
     addPlugIn("r", "2");
-    const auto discarded = addPlugIn("r", "1");
-    discarded->granted = Dictionary{{"com.tovana.developer.replace-plugin", "r"}};
-    const Forms forms = match();
-    ASSERT_EQ(names(forms), (Names{"x 1", "r 2"}));
-    EXPECT_EQ(textIn(forms[0], "overrider"), uuidText(displaced));
-    EXPECT_FALSE(forms[1].contains("overriding"));
-    EXPECT_FALSE(forms[1].contains("overrider")) << "a discarded one declares nothing";
+    addReplacing("r", "r"); // discarded, and so declares nothing
+    EXPECT_EQ(replacements(), (Names{"x 1 by 1", "r 2"}));
 }
 
 TEST_F(Discovery, SkipsAPlugInWhoseBundleVanished) {
@@ -174,6 +180,16 @@ TEST_F(Discovery, SkipsAPlugInWhoseBundleVanished) {
     platform_.workspace.installed.back() = vanishing;
     platform_.workspace.move();
     EXPECT_EQ(names(match()), Names{"a 1"});
+}
+
+TEST_F(Discovery, LooksUpAVanishedBundleWithoutMatches) {
+    const Dictionary request{{"uuids", addPlugIn("a")->uuid}};
+    EXPECT_TRUE(ask("find", request)->contains("matches"));
+    platform_.workspace.installed.clear();
+    platform_.workspace.move();
+    const Reply reply = ask("find", request);
+    ASSERT_TRUE(reply);
+    EXPECT_TRUE(reply->empty()) << describe(*reply);
 }
 
 } // namespace

@@ -19,19 +19,17 @@ std::optional<ZPDOptions> parse(std::vector<std::string> arguments) {
 }
 
 TEST(Options, ReadTheLeadingDigitsOfTheCacheLimit) {
-    const struct {
-        const char* text;
-        std::uint32_t limit;
-    } cases[] = {{"abc", 0},
-                 {"", 0},
-                 {"12abc", 12},
-                 {" 12", 0},
-                 {"-5", 0},
-                 {"+5", 0},
-                 {"0017", 17},
-                 {"4294967295", 4294967295U},
-                 {"4294967296", 4294967295U},
-                 {"99999999999999999999999999", 4294967295U}};
+    const std::pair<const char*, std::uint32_t> cases[] = {
+        {"abc", 0},
+        {"", 0},
+        {"12abc", 12},
+        {" 12", 0},
+        {"-5", 0},
+        {"+5", 0},
+        {"0017", 17},
+        {"4294967295", 4294967295U},
+        {"4294967296", 4294967295U},
+        {"99999999999999999999999999", 4294967295U}};
 
     for (const auto& [text, limit] : cases) {
         const auto options = parse({"-c", text});

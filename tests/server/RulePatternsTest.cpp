@@ -23,11 +23,7 @@ Dictionary keys(std::size_t count) {
 }
 
 TEST(RulePatterns, CountsEachOneAndEachAlternative) {
-    const struct {
-        const char* what;
-        Dictionary rules;
-        bool tooMany;
-    } cases[] = {
+    const std::tuple<const char*, Dictionary, bool> cases[] = {
         {"none", {}, false},
         {"keys", keys(mostRulePatterns), false},
         {"one key more", keys(mostRulePatterns + 1), true},
@@ -41,8 +37,8 @@ TEST(RulePatterns, CountsEachOneAndEachAlternative) {
         {"empty ones count too", {{"k", alternatives(mostRulePatterns)}, {"l", Array()}}, true},
     };
 
-    for (const auto& test : cases)
-        EXPECT_EQ(hasTooManyPatterns(test.rules), test.tooMany) << test.what;
+    for (const auto& [what, rules, tooMany] : cases)
+        EXPECT_EQ(hasTooManyPatterns(rules), tooMany) << what;
 }
 
 } // namespace

@@ -41,11 +41,7 @@ TEST_F(Transactions, WalkTheirPaths) {
     const std::string withNul = b + std::string("\0x", 2);
     const std::string format = "4 invalid request format";
 
-    const struct {
-        Value paths;
-        Seen seen;
-        std::string failure;
-    } cases[] = {
+    const std::tuple<Value, Seen, std::string> cases[] = {
         {Array(), {}, ""},
         {Array{folder_ / "a/../b", folder_ / "link/."}, {{b, true}, {b, true}}, ""},
         {Array{absent}, {{absent, false}}, ""},
@@ -57,16 +53,16 @@ TEST_F(Transactions, WalkTheirPaths) {
         {Value(nullptr), {}, format},
     };
 
-    for (const auto& test : cases) {
-        const auto t = transaction({{"paths", test.paths}});
+    for (const auto& [paths, expected, failure] : cases) {
+        const auto t = transaction({{"paths", paths}});
         Seen seen;
         const bool complete = t->marshalPaths([&](const std::string& path, bool resolved) {
             seen.emplace_back(path, resolved);
             return true;
         });
-        EXPECT_EQ(seen, test.seen) << describe(test.paths);
-        EXPECT_EQ(failureIn(*t), test.failure) << describe(test.paths);
-        EXPECT_EQ(complete, test.failure.empty());
+        EXPECT_EQ(seen, expected) << describe(paths);
+        EXPECT_EQ(failureIn(*t), failure) << describe(paths);
+        EXPECT_EQ(complete, failure.empty());
     }
     EXPECT_FALSE(transaction({})->marshalPaths([](const auto&, bool) { return true; }));
 }
@@ -107,19 +103,16 @@ TEST_F(Transactions, ProcessTheirPathsInTurns) {
 TEST_F(Transactions, ForwardTheirOwnErrorsAndMapOthers) {
     const platform::ErrorDomain sameName{"Zephrin"};
 
-    const struct {
-        Error error;
-        std::string failure;
-    } cases[] = {
+    const std::pair<Error, std::string> cases[] = {
         {ZPDErrorMake(12, "not acceptable"), "12 not acceptable"},
         {{&sameName, 12, "foreign"}, "2 foreign"},
         {{&platform::posixErrorDomain, 5, "disk"}, "2 disk"},
     };
 
-    for (const auto& test : cases) {
+    for (const auto& [error, failure] : cases) {
         const auto t = transaction({});
-        t->fail(2, test.error);
-        EXPECT_EQ(failureIn(*t), test.failure);
+        t->fail(2, error);
+        EXPECT_EQ(failureIn(*t), failure);
     }
 }
 
@@ -139,10 +132,7 @@ TEST_F(Transactions, AreBriefWhenTheyFailAtOnceOrFindARecordThatIsThere) {
     const auto unknown = addPlugIn("b")->uuid;
     ASSERT_TRUE(server().findPlugIn(known));
 
-    const struct {
-        Dictionary request;
-        bool brief;
-    } cases[] = {
+    const std::pair<Dictionary, bool> cases[] = {
         {{{"version", 9}, {"request", "match"}}, true},
         {{{"version", 3}}, true},
         {{{"version", 3}, {"request", "nonsense"}}, true},
@@ -153,8 +143,8 @@ TEST_F(Transactions, AreBriefWhenTheyFailAtOnceOrFindARecordThatIsThere) {
         {{{"version", 3}, {"request", "match"}}, false},
     };
 
-    for (const auto& test : cases)
-        EXPECT_EQ(transaction(test.request)->isBrief(), test.brief) << describe(test.request);
+    for (const auto& [request, brief] : cases)
+        EXPECT_EQ(transaction(request)->isBrief(), brief) << describe(request);
 }
 
 } // namespace
