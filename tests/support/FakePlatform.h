@@ -24,8 +24,8 @@
 struct FakeProcesses final : platform::Processes {
     std::map<pid_t, std::string> paths;
 
-    [[nodiscard]] std::expected<std::string, int> executablePath(const platform::ipc::Peer& peer,
-                                                                 std::size_t room) override {
+    std::expected<std::string, int> executablePath(const platform::ipc::Peer& peer,
+                                                   std::size_t room) override {
         const auto found = paths.find(peer.pid);
         if (found == paths.end())
             return std::unexpected(ESRCH);
@@ -58,7 +58,7 @@ struct FakeSigning final : platform::CodeSigning {
 
         void recheck() override { ++signing.rechecked; }
 
-        [[nodiscard]] std::expected<std::optional<platform::Value>, platform::Error>
+        std::expected<std::optional<platform::Value>, platform::Error>
         entitlement(std::string_view key) override {
             const platform::Value* const found = entitlements.find(key);
             return found ? std::optional(*found) : std::nullopt;
@@ -85,12 +85,12 @@ struct FakeSigning final : platform::CodeSigning {
             done();
     }
 
-    [[nodiscard]] std::unique_ptr<platform::SigningTask>
+    std::unique_ptr<platform::SigningTask>
     taskFor(std::shared_ptr<const platform::ipc::Peer>) override {
         return std::make_unique<Task>(*this);
     }
 
-    [[nodiscard]] std::expected<platform::SignatureGrant, std::string>
+    std::expected<platform::SignatureGrant, std::string>
     verifyBundle(const platform::SignedBundle& bundle) override {
         ++verified;
         seen.push_back(bundle);
@@ -100,7 +100,7 @@ struct FakeSigning final : platform::CodeSigning {
         return platform::SignatureGrant{key, found->second};
     }
 
-    [[nodiscard]] bool isTrusted(std::string_view asked) override { return asked == key; }
+    bool isTrusted(std::string_view asked) override { return asked == key; }
 
 private:
     std::mutex mutex_;
@@ -112,17 +112,17 @@ struct FakeSandbox final : platform::Sandbox {
     bool confined = false;
     std::vector<std::string> issued;
 
-    [[nodiscard]] bool isSandboxed(const platform::ipc::Peer&) override { return confined; }
+    bool isSandboxed(const platform::ipc::Peer&) override { return confined; }
 
-    [[nodiscard]] std::expected<std::string, int>
-    issueFileExtension(std::string_view extensionClass, std::string_view path,
-                       std::uint32_t flags) override {
+    std::expected<std::string, int> issueFileExtension(std::string_view extensionClass,
+                                                       std::string_view path,
+                                                       std::uint32_t flags) override {
         return issue(extensionClass, path, flags);
     }
 
-    [[nodiscard]] std::expected<std::string, int>
-    issueServiceExtension(std::string_view extensionClass, std::string_view service,
-                          std::uint32_t flags) override {
+    std::expected<std::string, int> issueServiceExtension(std::string_view extensionClass,
+                                                          std::string_view service,
+                                                          std::uint32_t flags) override {
         return issue(extensionClass, service, flags);
     }
 
@@ -139,7 +139,7 @@ private:
 struct FakeTypes final : platform::Types {
     std::vector<std::pair<std::string, std::string>> conformances; // type, target
 
-    [[nodiscard]] bool conforms(std::string_view type, std::string_view target) override {
+    bool conforms(std::string_view type, std::string_view target) override {
         for (const auto& [from, to] : conformances) {
             if (from == type && to == target)
                 return true;
@@ -147,8 +147,7 @@ struct FakeTypes final : platform::Types {
         return type == target;
     }
 
-    [[nodiscard]] bool evaluateActivationRule(const platform::Value&,
-                                              const platform::Dictionary&) override {
+    bool evaluateActivationRule(const platform::Value&, const platform::Dictionary&) override {
         return false;
     }
 };
@@ -158,8 +157,7 @@ struct FakePreferences final : platform::Preferences {
 
     void synchronize(std::string_view) override {}
 
-    [[nodiscard]] std::optional<platform::Value> value(std::string_view domain,
-                                                       std::string_view key) override {
+    std::optional<platform::Value> value(std::string_view domain, std::string_view key) override {
         const auto found = values.find(std::string(domain) + " " + std::string(key));
         return found == values.end() ? std::nullopt : std::optional(found->second);
     }
@@ -182,7 +180,7 @@ struct FakeContainers final : platform::Containers {
     std::optional<platform::Error> failure;
     std::vector<std::string> asked;
 
-    [[nodiscard]] std::expected<std::string, platform::Error>
+    std::expected<std::string, platform::Error>
     dataContainer(std::string_view identifier) override {
         asked.emplace_back(identifier);
         if (failure)
@@ -195,7 +193,7 @@ struct FakeLocale final : platform::Locale {
     std::string language;
     ChangeHandler changed;
 
-    [[nodiscard]] std::string current() override { return language; }
+    std::string current() override { return language; }
 
     void observeChanges(ChangeHandler handler) override { changed = std::move(handler); }
 };

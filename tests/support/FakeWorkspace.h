@@ -15,19 +15,15 @@ struct FakeApplication final : ARApplicationProxy {
     bool placeholder = false;
     std::vector<ARZephrinProxy::Ptr> plugIns;
 
-    [[nodiscard]] const std::string& bundlePath() const override { return path; }
+    const std::string& bundlePath() const override { return path; }
 
-    [[nodiscard]] std::optional<std::string> bundleIdentifier() const override {
-        return identifier;
-    }
+    std::optional<std::string> bundleIdentifier() const override { return identifier; }
 
-    [[nodiscard]] std::optional<std::string> localizedName() const override { return name; }
+    std::optional<std::string> localizedName() const override { return name; }
 
-    [[nodiscard]] bool isPlaceholder() const override { return placeholder; }
+    bool isPlaceholder() const override { return placeholder; }
 
-    [[nodiscard]] std::vector<ARZephrinProxy::Ptr> zephrinPlugins() const override {
-        return plugIns;
-    }
+    std::vector<ARZephrinProxy::Ptr> zephrinPlugins() const override { return plugIns; }
 };
 
 // A plug-in that says what a test wants; without changes a sound one inside an application.
@@ -46,54 +42,40 @@ struct FakePlugIn final : ARZephrinProxy {
     std::optional<std::string> container = "/containers/com.example.sample";
     std::optional<std::string> version = "7";
 
-    [[nodiscard]] const platform::Uuid& plugInUUID() const override { return uuid; }
+    const platform::Uuid& plugInUUID() const override { return uuid; }
 
-    [[nodiscard]] std::optional<std::string> bundlePath() const override { return path; }
+    std::optional<std::string> bundlePath() const override { return path; }
 
-    [[nodiscard]] std::optional<std::string> plugInIdentifier() const override {
-        return identifier;
-    }
+    std::optional<std::string> plugInIdentifier() const override { return identifier; }
 
-    [[nodiscard]] std::optional<std::string> originalIdentifier() const override {
-        return original;
-    }
+    std::optional<std::string> originalIdentifier() const override { return original; }
 
-    [[nodiscard]] std::optional<platform::Dictionary> infoDictionary() const override {
-        return info;
-    }
+    std::optional<platform::Dictionary> infoDictionary() const override { return info; }
 
-    [[nodiscard]] std::optional<platform::Dictionary> plugInDictionary() const override {
+    std::optional<platform::Dictionary> plugInDictionary() const override {
         const platform::Value* const found = info ? info->find("HXExtension") : nullptr;
         if (!found || !found->dictionary())
             return std::nullopt;
         return *found->dictionary();
     }
 
-    [[nodiscard]] std::optional<platform::Dictionary> entitlements() const override {
-        return granted;
-    }
+    std::optional<platform::Dictionary> entitlements() const override { return granted; }
 
-    [[nodiscard]] platform::Date registrationDate() const override { return {registered}; }
+    platform::Date registrationDate() const override { return {registered}; }
 
-    [[nodiscard]] bool isOnSystemPartition() const override { return onSystem; }
+    bool isOnSystemPartition() const override { return onSystem; }
 
-    [[nodiscard]] std::optional<std::string> localizedName() const override { return name; }
+    std::optional<std::string> localizedName() const override { return name; }
 
-    [[nodiscard]] std::optional<std::string> localizedShortName() const override {
-        return shortName;
-    }
+    std::optional<std::string> localizedShortName() const override { return shortName; }
 
-    [[nodiscard]] ARApplicationProxy::Ptr containingBundle() const override { return application; }
+    ARApplicationProxy::Ptr containingBundle() const override { return application; }
 
-    [[nodiscard]] std::optional<std::string> dataContainerPath() const override {
-        return container;
-    }
+    std::optional<std::string> dataContainerPath() const override { return container; }
 
-    [[nodiscard]] std::optional<std::string> bundleIdentifier() const override {
-        return identifier;
-    }
+    std::optional<std::string> bundleIdentifier() const override { return identifier; }
 
-    [[nodiscard]] std::optional<std::string> bundleVersion() const override { return version; }
+    std::optional<std::string> bundleVersion() const override { return version; }
 };
 
 // A registry of what a test puts in. Remembers what it was asked; fails on demand.
@@ -111,12 +93,12 @@ public:
     // Something changed somewhere: a new knowledge UUID.
     void move() { known = {platform::Uuid::random(), known.sequence + 1}; }
 
-    [[nodiscard]] std::optional<PlugIns> installedPlugins() override {
+    std::optional<PlugIns> installedPlugins() override {
         return failQueries ? std::nullopt : std::optional(installed);
     }
 
-    [[nodiscard]] std::optional<PlugIns> pluginsMatchingQuery(const platform::Dictionary&,
-                                                              const Filter& filter) override {
+    std::optional<PlugIns> pluginsMatchingQuery(const platform::Dictionary&,
+                                                const Filter& filter) override {
         if (failQueries)
             return std::nullopt;
         PlugIns kept;
@@ -127,33 +109,31 @@ public:
         return kept;
     }
 
-    [[nodiscard]] ARZephrinProxy::Ptr zephrinProxyForUUID(const platform::Uuid& uuid) override {
+    ARZephrinProxy::Ptr zephrinProxyForUUID(const platform::Uuid& uuid) override {
         ++proxiesAsked;
         return first([&](const ARZephrinProxy& p) { return p.plugInUUID() == uuid; });
     }
 
-    [[nodiscard]] ARZephrinProxy::Ptr zephrinProxyForPath(std::string_view path) override {
+    ARZephrinProxy::Ptr zephrinProxyForPath(std::string_view path) override {
         return first([&](const ARZephrinProxy& p) { return p.bundlePath() == path; });
     }
 
-    [[nodiscard]] ARApplicationProxy::Ptr
-    applicationProxyForBundlePath(std::string_view path) override {
+    ARApplicationProxy::Ptr applicationProxyForBundlePath(std::string_view path) override {
         const auto found = applications.find(std::string(path));
         return found == applications.end() ? nullptr : found->second;
     }
 
-    [[nodiscard]] std::optional<ARExtensionPoint>
-    extensionPointForIdentifier(std::string_view) override {
+    std::optional<ARExtensionPoint> extensionPointForIdentifier(std::string_view) override {
         return std::nullopt;
     }
 
-    [[nodiscard]] ARKnowledge knowledge() override { return known; }
+    ARKnowledge knowledge() override { return known; }
 
-    [[nodiscard]] std::optional<platform::Error> registerPlugin(std::string_view) override {
+    std::optional<platform::Error> registerPlugin(std::string_view) override {
         return std::nullopt;
     }
 
-    [[nodiscard]] std::optional<platform::Error> unregisterPlugin(std::string_view) override {
+    std::optional<platform::Error> unregisterPlugin(std::string_view) override {
         return std::nullopt;
     }
 
