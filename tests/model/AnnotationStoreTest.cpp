@@ -7,9 +7,7 @@
 #include "tests/support/Files.h"
 #include "zpd/ZPDAnnotationStore.h"
 
-using platform::Array;
-using platform::Dictionary;
-using platform::Value;
+using namespace platform;
 using testing::ElementsAre;
 using testing::IsEmpty;
 

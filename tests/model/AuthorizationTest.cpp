@@ -3,9 +3,7 @@
 #include "tests/model/Samples.h"
 #include "zpd/ZPDEntitlementHolder.h"
 
-using platform::Array;
-using platform::Dictionary;
-using platform::Value;
+using namespace platform;
 
 namespace {
 

@@ -4,8 +4,7 @@
 #include "platform/plist/PropertyList.h"
 #include "tests/platform/TestFolder.h"
 
-using platform::Array;
-using platform::Dictionary;
+using namespace platform;
 
 namespace {
 

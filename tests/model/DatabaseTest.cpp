@@ -7,10 +7,7 @@
 #include "zpd/ZPDElectionFilter.h"
 #include "zpd/ZPDatabase.h"
 
-using platform::Array;
-using platform::Dictionary;
-using platform::Uuid;
-using platform::Value;
+using namespace platform;
 using testing::ElementsAre;
 using testing::IsEmpty;
 

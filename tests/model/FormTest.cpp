@@ -3,8 +3,7 @@
 #include "Zephrin/ZPPlugInCore.h"
 #include "tests/model/Samples.h"
 
-using platform::Dictionary;
-using platform::Value;
+using namespace platform;
 
 namespace {
 

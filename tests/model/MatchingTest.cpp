@@ -1,10 +1,11 @@
+#include <algorithm>
+
 #include <gtest/gtest.h>
 
+#include "AppRegistry/ARPointKeys.h"
 #include "tests/model/Samples.h"
 
-using platform::Array;
-using platform::Dictionary;
-using platform::Value;
+using namespace platform;
 
 namespace {
 
@@ -19,6 +20,15 @@ struct AttributeWorld : RecordWorld {
 
     ZPDPlugIn::Ptr plugIn;
 };
+
+// Whether the registry's index of extension points keeps a plug-in for this pattern.
+bool isKept(const Value& value, const Value& pattern) {
+    const auto wanted = ARPointKeysOfPattern(pattern);
+    const auto keys = ARPointKeysOf(Dictionary{{"HXExtensionPointIdentifier", value}});
+    return !wanted || std::ranges::any_of(keys, [&](const auto& key) {
+        return std::ranges::find(*wanted, key) != wanted->end();
+    });
+}
 
 } // namespace
 
@@ -169,4 +179,27 @@ TEST(Rules, CompareElectionsWithoutTheirSecondByte) {
     world.annotations.stored.reset();
     EXPECT_TRUE(record->match(Dictionary{{"HXUserElection", "0"}}));
     EXPECT_TRUE(record->match(Dictionary{{"HXUserElection", true}})); // the text "0" is there
+}
+
+TEST(Rules, AcceptNothingThatTheIndexDrops) {
+    const std::string texts[] = {
+        "",        "a",   "A",   "a1", "a01", "a10",       "a1.10",
+        "a01.010", "=a",  "<a",  ">",  "<>a", "<=a",       "?KM",
+        "1",       "001", "=<x", "<x", "*",   "a\xc3\xa4", "com.tovana.point2"};
+    for (const std::string& value : texts) {
+        const AttributeWorld world(value);
+        for (const std::string op :
+             {"", "=", "<", ">", "<>", "<=", ">=", "==", "=<", "?", "?KM-IS:"}) {
+            for (const std::string& operand : texts) {
+                const std::string pattern = op + operand;
+                SCOPED_TRACE(value + " against " + pattern);
+                if (!world.holds(pattern))
+                    continue;
+                EXPECT_TRUE(isKept(value, pattern));
+                EXPECT_TRUE(isKept(Array{1, value, "other"}, pattern));
+                EXPECT_TRUE(isKept(value, Array{"other", 7, pattern}));
+                EXPECT_TRUE(isKept(Array{"x", value}, Array{pattern, Array{}}));
+            }
+        }
+    }
 }

@@ -3,9 +3,7 @@
 #include "platform/ipc/Cbor.h"
 #include "tests/model/Samples.h"
 
-using platform::Array;
-using platform::Dictionary;
-using platform::Value;
+using namespace platform;
 using testing::ElementsAre;
 
 namespace {
@@ -19,6 +17,16 @@ Dictionary extensionAnd(std::string_view key, Value value) {
 Dictionary decoded(const std::expected<platform::SharedBytes, platform::Error>& encoded) {
     const auto value = platform::ipc::decode(encoded.value().view());
     return *value.value().dictionary();
+}
+
+// The registry has read the plug-in anew, as one of this version.
+std::shared_ptr<FakePlugIn> replace(RecordWorld& world, const std::shared_ptr<FakePlugIn>& plugIn,
+                                    const char* version) {
+    auto other = std::make_shared<FakePlugIn>(*plugIn);
+    other->info = infoWith(extensionWith({{"HXExtensionVersion", version}}));
+    world.platform.workspace.installed = {other};
+    world.platform.workspace.move();
+    return other;
 }
 
 } // namespace
@@ -139,11 +147,8 @@ TEST(Refresh, SeesWhatTheRegistrySaysNow) {
     auto plugIn = samplePlugIn();
     const auto record = world.record(plugIn);
 
-    auto moved = std::make_shared<FakePlugIn>(*plugIn);
-    moved->uuid = platform::Uuid::random(); // found by its path then
-    moved->info = infoWith(extensionWith({{"HXExtensionVersion", "2"}}));
-    world.platform.workspace.installed = {moved};
-    world.platform.workspace.move();
+    const auto moved = replace(world, plugIn, "2");
+    moved->uuid = Uuid::random(); // found by its path then
     EXPECT_EQ(record->version(), "2");
 
     world.platform.workspace.installed.clear();
@@ -230,10 +235,7 @@ TEST(KeptForm, StaysUntilSomethingInItChanges) {
     world.platform.workspace.move(); // concerns others
     EXPECT_TRUE(isKept());
 
-    auto equal = std::make_shared<FakePlugIn>(*plugIn); // read anew, and the same
-    equal->info = infoWith(extensionWith());
-    world.platform.workspace.installed = {equal};
-    world.platform.workspace.move();
+    replace(world, plugIn, "1.10"); // read anew, and the same
     EXPECT_TRUE(isKept());
 
     EXPECT_TRUE(record->current(0).replyForm.sameAllocation(first));
@@ -261,9 +263,6 @@ TEST(KeptForm, IsMadeAnewForEachChange) {
     record->setLocalizedContainingName("Wirt");
     EXPECT_EQ(*now({}).find("localizedContainingDisplayName"), Value("Wirt"));
 
-    auto moved = std::make_shared<FakePlugIn>(*plugIn);
-    moved->info = infoWith(extensionWith({{"HXExtensionVersion", "2"}}));
-    world.platform.workspace.installed = {moved};
-    world.platform.workspace.move();
+    replace(world, plugIn, "2");
     EXPECT_EQ(*now({}).find("version"), Value("2"));
 }

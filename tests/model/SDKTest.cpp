@@ -8,9 +8,7 @@
 #include "tests/platform/TestFolder.h"
 #include "tests/support/LogOf.h"
 
-using platform::Array;
-using platform::Dictionary;
-using platform::Value;
+using namespace platform;
 using testing::HasSubstr;
 
 namespace {

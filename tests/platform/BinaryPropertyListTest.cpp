@@ -69,10 +69,7 @@ TEST(PropertyListBinary, ReadsEachKindOfObject) {
         {"double", "\x23" + bigEndian(0xc004000000000000), -2.5},
         {"date", "\x33" + bigEndian(0), Date{978307200}},
         {"data", bytes({0x42, 0x00, 0xff}), Data{SharedBytes(std::string_view("\0\xff", 2))}},
-        {"text",
-         "\x53"
-         "abc",
-         "abc"},
+        {"text", bytes({0x53, 'a', 'b', 'c'}), "abc"},
         {"long text", bytes({0x5f, 0x10, 16}) + std::string(16, 'x'), std::string(16, 'x')},
         {"wide text", bytes({0x63, 0x20, 0xac, 0xd8, 0x3d, 0xde, 0x00}),
          "\xe2\x82\xac\xf0\x9f\x98\x80"},
@@ -89,12 +86,8 @@ TEST(PropertyListBinary, ReadsEachKindOfObject) {
 }
 
 TEST(PropertyListBinary, ReadsNestedAndSharedObjects) {
-    const std::string whole = list({bytes({0xd2, 1, 2, 3, 1}),
-                                    "\x51"
-                                    "k",
-                                    "\x51"
-                                    "m",
-                                    bytes({0xa2, 1, 1})});
+    const std::string whole = list(
+        {bytes({0xd2, 1, 2, 3, 1}), bytes({0x51, 'k'}), bytes({0x51, 'm'}), bytes({0xa2, 1, 1})});
     EXPECT_EQ(plist::parse(whole), (Dictionary{{"k", Array{"k", "k"}}, {"m", "k"}}));
 }
 

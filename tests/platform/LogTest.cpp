@@ -61,12 +61,9 @@ public:
     std::string drain() {
         std::string text;
         std::array<char, 65536> room;
-        for (;;) {
-            const ssize_t got = ::read(ends_[0], room.data(), room.size());
-            if (got <= 0)
-                return text;
+        for (ssize_t got; (got = ::read(ends_[0], room.data(), room.size())) > 0;)
             text.append(room.data(), static_cast<std::size_t>(got));
-        }
+        return text;
     }
 
     // What comes until everything logged so far is out.

@@ -11,8 +11,7 @@
 #include "tests/support/PeerOfProcess.h"
 
 using namespace platform;
-using testing::MatchesRegex;
-using testing::StartsWith;
+using namespace testing;
 
 TEST(HmacSandbox, IssuesTheSameTextForTheSameThing) {
     const TestFolder folder;

@@ -33,44 +33,39 @@ std::uint64_t counterIn(const std::string& path) {
 
 } // namespace
 
-TEST(FilePreferences, ReadsADomainAgainWhenItChanged) {
+TEST(FilePreferences, ReadWhatCanBeTrustedAgainWhenItChanged) {
     const TestFolder folder;
     FilePreferences preferences(folder.path());
+    const auto write = [&](const Value& list) {
+        return folder.write("com.x.plist", *plist::writeXml(list));
+    };
+    const auto synchronized = [&] {
+        preferences.synchronize("com.x");
+        return preferences.value("com.x", "key");
+    };
     EXPECT_FALSE(preferences.value("com.x", "key"));
-    folder.write("com.x.plist", *plist::writeXml(Dictionary{{"key", 1}}));
+    const std::string file = write(Dictionary{{"key", 1}});
     EXPECT_FALSE(preferences.value("com.x", "key")) << "not before synchronize";
-    preferences.synchronize("com.x");
-    EXPECT_EQ(preferences.value("com.x", "key"), Value(1));
+    EXPECT_EQ(synchronized(), Value(1));
     EXPECT_FALSE(preferences.value("com.x", "other"));
     EXPECT_FALSE(preferences.value("com.y", "key"));
-
-    folder.write("com.x.plist", *plist::writeXml(Dictionary{{"key", 2}}));
-    preferences.synchronize("com.x");
-    EXPECT_EQ(preferences.value("com.x", "key"), Value(2)) << "of the same size, a moment later";
-    fs::remove(folder / "com.x.plist");
-    preferences.synchronize("com.x");
-    EXPECT_FALSE(preferences.value("com.x", "key"));
+    write(Dictionary{{"key", 2}});
+    EXPECT_EQ(synchronized(), Value(2)) << "of the same size, a moment later";
+    setMode(file, 0666);
+    EXPECT_FALSE(synchronized()) << "others could have written it";
+    setMode(file, 0644);
+    EXPECT_EQ(synchronized(), Value(2));
+    for (const std::string& content : {std::string("broken"), *plist::writeXml(Array{1})}) {
+        folder.write("com.x.plist", content);
+        EXPECT_FALSE(synchronized()) << content;
+    }
+    write(Dictionary{{"key", 3}});
+    EXPECT_EQ(synchronized(), Value(3));
+    fs::remove(file);
+    EXPECT_FALSE(synchronized());
     for (const char* domain : {"", "../x", "a/b"}) {
         preferences.synchronize(domain);
         EXPECT_FALSE(preferences.value(domain, "key"));
-    }
-}
-
-TEST(FilePreferences, IgnoresWhatCannotBeTrusted) {
-    const TestFolder folder;
-    const auto file = folder.write("com.x.plist", *plist::writeXml(Dictionary{{"key", 1}}));
-    FilePreferences preferences(folder.path());
-    ASSERT_TRUE(preferences.value("com.x", "key"));
-    setMode(file, 0666);
-    preferences.synchronize("com.x");
-    EXPECT_FALSE(preferences.value("com.x", "key"));
-    setMode(file, 0644);
-    preferences.synchronize("com.x");
-    EXPECT_TRUE(preferences.value("com.x", "key"));
-    for (const std::string& content : {std::string("broken"), *plist::writeXml(Array{1})}) {
-        folder.write("com.x.plist", content);
-        preferences.synchronize("com.x");
-        EXPECT_FALSE(preferences.value("com.x", "key")) << content;
     }
 }
 

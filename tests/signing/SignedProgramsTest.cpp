@@ -36,17 +36,6 @@ protected:
     SignedPrograms service_{home_ / "trust.d"};
 };
 
-TEST_F(SignedProgramsTest, GivesAProgramItsEntitlementsOncePrepared) {
-    const auto files = signedBundle("Main.app");
-    letFilesSettle();
-    const auto task = taskOf(*files.executable);
-    EXPECT_FALSE(may(*task));
-    EXPECT_TRUE(mayOncePrepared(*task));
-    EXPECT_EQ(task->entitlement("else").value(), std::nullopt);
-    task->recheck();
-    EXPECT_TRUE(may(*task));
-}
-
 TEST_F(SignedProgramsTest, GivesNothingToOthersAsLongAsTheyAreConnected) {
     const auto nowhere = service_.taskFor(std::make_shared<ipc::Peer>());
     EXPECT_FALSE(mayOncePrepared(*nowhere));
@@ -75,6 +64,7 @@ TEST_F(SignedProgramsTest, TakesEntitlementsBackWhenWhatTheyRestOnChanges) {
     const std::string elsewhere = home_ / "key.off";
     letFilesSettle();
     const auto task = taskOf(*files.executable);
+    EXPECT_FALSE(may(*task)) << "not prepared";
     for (const std::string& file : {*files.executable, *files.info(), files.signature(), key}) {
         ASSERT_TRUE(mayOncePrepared(*task));
         task->recheck();
@@ -86,6 +76,7 @@ TEST_F(SignedProgramsTest, TakesEntitlementsBackWhenWhatTheyRestOnChanges) {
         letFilesSettle(); // renaming changes a file
     }
     EXPECT_TRUE(mayOncePrepared(*task));
+    EXPECT_EQ(task->entitlement("else").value(), std::nullopt);
     home_.write("trust.d/another.pem", PrivateKey::generate()->publicKey()->pem());
     task->recheck();
     EXPECT_TRUE(may(*task));
