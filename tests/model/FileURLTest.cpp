@@ -3,7 +3,7 @@
 #include <gtest/gtest.h>
 
 TEST(FileURL, GivesAPathOnlyForLocalFiles) {
-    const std::pair<const char*, std::optional<std::string>> cases[] = {
+    const std::pair<const char*, const char*> cases[] = {
         {"file:///System/X.appex", "/System/X.appex"},
         {"file:///System/X.appex/", "/System/X.appex"},
         {"file://localhost/a", "/a"},
@@ -12,20 +12,22 @@ TEST(FileURL, GivesAPathOnlyForLocalFiles) {
         {"file:///", "/"},
         {"file:///a%20b%C3%bc", "/a bü"},
         {"file:///a?query#fragment", "/a"},
-        {"file://other/a", std::nullopt},
-        {"file://", std::nullopt},
-        {"file:a", std::nullopt},
-        {"http:///a", std::nullopt},
-        {"/a", std::nullopt},
-        {"", std::nullopt},
-        {"file:///a%00b", std::nullopt},
-        {"file:///a%2", std::nullopt},
-        {"file:///a%zz", std::nullopt},
     };
 
     for (const auto& [url, path] : cases)
         EXPECT_EQ(pathFromFileURL(url), path) << url;
-    EXPECT_EQ(pathFromFileURL(std::string_view("file:///a\0b", 11)), std::nullopt);
+    const std::string_view others[] = {"file://other/a",
+                                       "file://",
+                                       "file:a",
+                                       "http:///a",
+                                       "/a",
+                                       "",
+                                       "file:///a%00b",
+                                       "file:///a%2",
+                                       "file:///a%zz",
+                                       std::string_view("file:///a\0b", 11)};
+    for (const auto url : others)
+        EXPECT_EQ(pathFromFileURL(url), std::nullopt) << url;
 }
 
 TEST(FileURL, ReadsBackWhatItWrites) {

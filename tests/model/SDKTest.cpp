@@ -1,5 +1,3 @@
-#include <cstdlib>
-
 #include <gmock/gmock.h>
 
 #include "Zephrin/ZPPlugInCore.h"
@@ -18,20 +16,14 @@ constexpr const char* pointKey = "HXExtensionPointIdentifier";
 // A home that this process takes for its own from the first question on, with extension points.
 class SDK : public testing::Test {
 protected:
-    static void SetUpTestSuite() {
-        home_ = std::make_unique<TestFolder>();
-        ::setenv("ZEPHRIN_HOME", home_->path().c_str(), 1);
-    }
+    static void SetUpTestSuite() { ::setenv("ZEPHRIN_HOME", home_.path().c_str(), 1); }
 
-    static void TearDownTestSuite() {
-        ::unsetenv("ZEPHRIN_HOME");
-        home_.reset();
-    }
+    static void TearDownTestSuite() { ::unsetenv("ZEPHRIN_HOME"); }
 
     // Writes the extension point's file.
     static void registerPoint(const std::string& identifier, const Dictionary& sdk) {
-        home_->write("System/Library/ExtensionPoints/" + identifier + ".plist",
-                     *platform::plist::writeXml(sdk));
+        home_.write("System/Library/ExtensionPoints/" + identifier + ".plist",
+                    *platform::plist::writeXml(sdk));
     }
 
     // A record as a host gets it, with these entries besides the plug-in dictionary.
@@ -43,10 +35,8 @@ protected:
                                     std::nullopt);
     }
 
-    static std::unique_ptr<TestFolder> home_;
+    static inline const TestFolder home_;
 };
-
-std::unique_ptr<TestFolder> SDK::home_;
 
 } // namespace
 

@@ -11,7 +11,9 @@ namespace {
 constexpr const char* identifier = "com.example.point";
 
 std::string listOf(const char* text) {
-    return *platform::plist::writeXml(Dictionary{{"From", text}});
+    const Dictionary type{{"TypeIdentifier", text}, {"ConformsTo", "thing"}};
+    return *platform::plist::writeXml(
+        Dictionary{{"From", text}, {"TypeDeclarations", platform::Array{type}}});
 }
 
 // As deep as an array of arrays can be in a dictionary of so many levels in all.
@@ -71,5 +73,8 @@ TEST_F(RegistryTest, AgreesWithHostsOnExtensionPoints) {
         const auto read = platform::readExtensionPoint(places.extensionPointFolders, identifier);
         EXPECT_EQ(point.has_value(), known);
         EXPECT_EQ(read, point ? point->sdkEntry : std::nullopt);
+        // What a link leads to is an extension point by its own name.
+        EXPECT_EQ(types.conforms("e", "thing"), std::string_view(what).starts_with("a link"));
+        EXPECT_FALSE(types.conforms("thing", "e"));
     }
 }

@@ -1,6 +1,5 @@
 #include <functional>
 
-#include "platform/plist/PropertyList.h"
 #include "tests/registry/RegistryFixture.h"
 
 using platform::Dictionary;
@@ -164,22 +163,4 @@ TEST_F(FirstPass, RegistersOnceWhatIsReachedTwice) {
     open();
     EXPECT_EQ(identifiers().size(), 3U);
     EXPECT_EQ(uuidOf(one), uuid);
-}
-
-TEST_F(FirstPass, KnowsExtensionPointsAndTypeDeclarations) {
-    const platform::Value declared(platform::Array{Dictionary{
-        {"TypeIdentifier", "com.example.picture"}, {"ConformsTo", "com.example.thing"}}});
-    const std::string folder = "System/Library/ExtensionPoints/";
-    const Dictionary entry{{"Default", 7}, {"TypeDeclarations", declared}};
-    home.write(folder + "com.example.point.plist", *platform::plist::writeXml(entry));
-    home.write(folder + "com.example.bad.plist", "nothing");
-    const std::string log = open();
-    EXPECT_NE(log.find("com.example.bad.plist"), std::string::npos);
-    const auto point = registry->extensionPointForIdentifier("com.example.point");
-    ASSERT_TRUE(point && point->sdkEntry);
-    EXPECT_EQ(*point->sdkEntry, entry);
-    EXPECT_TRUE(types.conforms("com.example.picture", "com.example.thing"));
-    EXPECT_FALSE(types.conforms("com.example.thing", "com.example.picture"));
-    EXPECT_FALSE(registry->extensionPointForIdentifier("com.example.bad"));
-    EXPECT_FALSE(registry->extensionPointForIdentifier("com.example"));
 }

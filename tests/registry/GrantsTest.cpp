@@ -120,19 +120,6 @@ TEST_F(Grants, ComeAndGoWithTheirKey) {
     EXPECT_EQ(verified(), 0);
 }
 
-TEST_F(Grants, FiltersSeeThem) {
-    sign(one, "good");
-    open();
-    Strings asked;
-    const auto kept = registry->pluginsMatchingQuery(
-        {}, [&](std::string_view identifier, const auto& entitlements) {
-            asked.emplace_back(identifier);
-            return entitlements == some;
-        });
-    EXPECT_EQ(asked, (Strings{"one", "two"}));
-    EXPECT_EQ(kept, (ARApplicationWorkspace::PlugIns{at(one)}));
-}
-
 TEST_F(Grants, WhyASignatureDoesNotCountIsSaidOncePerState) {
     const struct {
         const char* what;
