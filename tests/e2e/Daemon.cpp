@@ -12,6 +12,8 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include "tests/e2e/Home.h"
+
 namespace e2e {
 
 namespace {
@@ -115,10 +117,7 @@ int Program::exitStatus(std::chrono::milliseconds patience) {
 }
 
 std::string Program::errors() const {
-    std::ifstream file(errorFile_, std::ios::binary);
-    std::ostringstream text;
-    text << file.rdbuf();
-    return text.str();
+    return readFile(errorFile_);
 }
 
 std::string builtProgram(const char* name) {

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <csignal>
 #include <optional>
 #include <string>
 #include <utility>
@@ -24,6 +25,16 @@ protected:
 
     // Ends the daemon, which must go well. Its log is complete then.
     void stop() { EXPECT_EQ(daemon->terminate(), 0); }
+
+    void restart() {
+        stop();
+        start();
+    }
+
+    void kill() {
+        daemon->program().signal(SIGKILL);
+        EXPECT_EQ(daemon->program().exitStatus(), 128 + SIGKILL);
+    }
 
     // How many lines of the log so far hold each text.
     void expectLog(const std::vector<std::pair<std::string, std::size_t>>& counts) const {

@@ -70,8 +70,7 @@ TEST_F(Entitlements, CountAgainAfterTheDaemonsRestart) {
     independent.tell("hello");
     EXPECT_EQ(independent.ask(), granted);
     EXPECT_EQ(withLibrary.ask(), granted);
-    stop();
-    start();
+    restart();
     independent.tell("hello");
     EXPECT_EQ(independent.ask(), granted);
     EXPECT_EQ(withLibrary.ask(), granted);
@@ -134,8 +133,7 @@ TEST_F(Entitlements, DecideWhatAHostIsOffered) {
     addAppWith(home, "Asking",
                {.identifier = "asking",
                 .extension = Item::map({{"HXExtensionHostEntitlement", "com.example.host"}})});
-    stop();
-    start();
+    restart();
     const auto offered = [&](const Item& entitlements) {
         key.sign(lone, entitlements);
         return answerTo(lone, {"hello", "names"});

@@ -109,7 +109,7 @@ TEST_F(Form, SpeaksTheLanguageOfTheBox) {
         act();
         EXPECT_TRUE(eventually([&, now = Item(name)] {
             return findAt(*client, path)["localizedDisplayName"] == now &&
-                   match(*client).front()["localizedDisplayName"] == now;
+                   match(*client).at(0)["localizedDisplayName"] == now;
         })) << what;
     }
     for (const char* line : {"ops default: locale change detected; purging cache",

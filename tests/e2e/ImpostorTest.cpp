@@ -26,15 +26,15 @@ protected:
     }
 
     // All at once. They run before the daemon looks at any of them when it is `stopped` meanwhile.
-    void burst(const Words& probes, const Words& expected, bool stopped) const {
+    void burst(const Words& probes, const Words& expected, bool stopped) {
         std::vector<std::unique_ptr<Talk>> all;
         if (stopped)
-            kill(daemon->pid(), SIGSTOP);
+            daemon->program().signal(SIGSTOP);
         for (int i = 0; i < tries; ++i)
             all.push_back(std::make_unique<Talk>(home, probes));
         if (stopped) {
             std::this_thread::sleep_for(500ms);
-            kill(daemon->pid(), SIGCONT);
+            daemon->program().signal(SIGCONT);
         }
         for (const auto& each : all)
             EXPECT_EQ(each->rest(), expected);
@@ -92,9 +92,9 @@ TEST_F(Impostors, ForgeThePidOfASignedProgramFromNamespacesOfTheirOwn) {
     const Words attack = command(unsignedProbe, {"forge " + sleeper});
     const auto user = geteuid() == 0 ? std::optional<uid_t>(4711) : std::nullopt;
     Talk talk(home, attack, user);
-    kill(daemon->pid(), SIGSTOP);
+    daemon->program().signal(SIGSTOP);
     std::this_thread::sleep_for(200ms);
-    kill(daemon->pid(), SIGCONT);
+    daemon->program().signal(SIGCONT);
     const std::string answer = talk.hear();
     if (answer.starts_with("namespaces"))
         GTEST_SKIP() << answer;

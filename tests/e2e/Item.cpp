@@ -226,18 +226,13 @@ private:
     }
 
     Item simple(unsigned low) {
-        switch (low) {
-        case 20:
-            return Item(false);
-        case 21:
-            return Item(true);
-        case 22:
+        if (low == 20 || low == 21)
+            return Item(low == 21);
+        if (low == 22)
             return Item();
-        case 27:
+        if (low == 27)
             return Item(std::bit_cast<double>(unsignedOf(8)));
-        default:
-            throw std::runtime_error("a simple value that the wire does not have");
-        }
+        throw std::runtime_error("a simple value that the wire does not have");
     }
 
     Item arrayOf(std::uint64_t count) {

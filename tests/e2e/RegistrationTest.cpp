@@ -20,11 +20,6 @@ protected:
         return answer(pathsRequest("add", paths));
     }
 
-    void restart() {
-        stop();
-        start();
-    }
-
     // The daemon ends; the next one finds no database.
     void removeDatabase() {
         stop();

@@ -33,11 +33,6 @@ protected:
         return answer;
     }
 
-    void kill() {
-        daemon->program().signal(SIGKILL);
-        EXPECT_EQ(daemon->program().exitStatus(), 128 + SIGKILL);
-    }
-
     [[nodiscard]] Names names() {
         Names result;
         for (const Item& form : match(*client))

@@ -1,5 +1,4 @@
 #include <algorithm>
-#include <csignal>
 
 #include "tests/e2e/DaemonTest.h"
 
@@ -87,8 +86,7 @@ TEST_F(Start, ASecondDaemonOnALiveNameFails) {
 TEST_F(Start, AStaleSocketIsReplaced) {
     for (int i = 0; i < 2; ++i) {
         start();
-        daemon->program().signal(SIGKILL);
-        daemon->program().exitStatus();
+        kill();
         EXPECT_TRUE(fs::is_socket(daemon->socketPath()));
     }
     start();

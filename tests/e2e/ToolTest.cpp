@@ -74,7 +74,7 @@ TEST_F(Tool, ChangesWhatTheDaemonKeeps) {
     (void)addProgram(home / "lib/libZephrin.so.0", "../lib/libZephrin.so.0");
     EXPECT_EQ(run({"remove", away}, manager), "0 1 plug-in unregistered\n");
     EXPECT_THAT(run({"match", "--flags", "1"}), testing::Not(HasSubstr("away")));
-    kill(daemon->pid(), SIGSTOP);
+    daemon->program().signal(SIGSTOP);
     EXPECT_EQ(run({"--timeout", "0.2", "tree"}),
               "3 zpctl: the daemon did not answer within 0.2 s\n");
 }
@@ -133,8 +133,7 @@ TEST_F(Tool, MonitorTellsOfChangesAndEndsWell) {
     }
     EXPECT_THAT(output(),
                 HasSubstr("Z\",\"notification\":\"com.tovana.zephrin.annotation-change\"}\n"));
-    daemon->program().signal(SIGKILL);
-    daemon->program().exitStatus();
+    kill();
     fs::remove_all(home / "run");
     start(); // counts from the beginning
     elect();

@@ -16,10 +16,7 @@ namespace {
 using Arguments = std::vector<std::string>;
 
 TEST(Rules, ReadPatternsAsStringsBooleansAndAlternatives) {
-    const struct {
-        Arguments arguments;
-        Dictionary rules;
-    } cases[] = {
+    const std::pair<Arguments, Dictionary> cases[] = {
         {{}, {}},
         {{"a=b"}, {{"a", "b"}}},
         {{"a="}, {{"a", ""}}},
@@ -36,10 +33,8 @@ TEST(Rules, ReadPatternsAsStringsBooleansAndAlternatives) {
 }
 
 TEST(Rules, RefuseWhatIsNoRule) {
-    for (const Arguments& arguments : {Arguments{"a"}, {"=b"}, {""}, {"a=b", "a=true"}}) {
-        const auto rules = zpctl::rulesFromArguments(arguments);
-        EXPECT_FALSE(rules) << testing::PrintToString(arguments);
-    }
+    for (const Arguments& arguments : {Arguments{"a"}, {"=b"}, {""}, {"a=b", "a=true"}})
+        EXPECT_FALSE(zpctl::rulesFromArguments(arguments)) << testing::PrintToString(arguments);
 }
 
 class RulesFile : public testing::Test {

@@ -23,10 +23,7 @@ std::string written(const Table& table, bool inColour) {
 TEST(Printable, KeepsTextAndEscapesWhatCouldDisturbATerminal) {
     using namespace std::string_literals;
 
-    const struct {
-        std::string text;
-        std::string shown;
-    } cases[] = {
+    const std::pair<std::string, std::string> cases[] = {
         {"", ""},
         {"Décalage 字幕 😀", "Décalage 字幕 😀"},
         {"a\nb\x1b[31m\t\x7f", R"(a\u{a}b\u{1b}[31m\u{9}\u{7f})"},
