@@ -4,15 +4,14 @@
 #include <cstdlib>
 #include <fcntl.h>
 #include <string>
-#include <thread>
 #include <unistd.h>
-#include <vector>
 
 #include <gmock/gmock.h>
 
 #include "platform/log/Render.h"
 #include "platform/log/Sink.h"
 #include "platform/log/Writer.h"
+#include "tests/support/Gate.h"
 
 using namespace platform;
 using namespace platform::log;
@@ -181,15 +180,10 @@ TEST(Log, ObeysItsSettings) {
 TEST(Log, KeepsTheOrderOfEachThread) {
     const Settings settings("debug", "1");
     CapturedError captured;
-    std::vector<std::thread> threads;
-    for (int t = 0; t < 4; ++t) {
-        threads.emplace_back([t] {
-            for (int i = 0; i < 100; ++i)
-                ops.debug("t%d line %d.", t, i);
-        });
-    }
-    for (auto& thread : threads)
-        thread.join();
+    inThreads(4, [](int t) {
+        for (int i = 0; i < 100; ++i)
+            ops.debug("t%d line %d.", t, i);
+    });
     const std::string text = captured.all();
     for (int t = 0; t < 4; ++t) {
         std::size_t at = 0;

@@ -25,19 +25,14 @@ TEST(SerialQueue, RunsBlocksInTheOrderOfTheirSubmission) {
 TEST(SerialQueue, RunsOneBlockAtATime) {
     SerialQueue queue("test");
     int counter = 0; // unguarded: the thread sanitizer sees a queue that does not serialise
-    std::vector<std::thread> threads;
-    for (int t = 0; t < 4; ++t) {
-        threads.emplace_back([&] {
-            for (int i = 0; i < 500; ++i) {
-                queue.async([&] { ++counter; });
+    inThreads(4, [&](int) {
+        for (int i = 0; i < 500; ++i) {
+            queue.async([&] { ++counter; });
+            queue.sync([&] { ++counter; });
+            if (!queue.tryRun([&] { ++counter; }))
                 queue.sync([&] { ++counter; });
-                if (!queue.tryRun([&] { ++counter; }))
-                    queue.sync([&] { ++counter; });
-            }
-        });
-    }
-    for (auto& thread : threads)
-        thread.join();
+        }
+    });
     EXPECT_EQ(queue.sync([&] { return counter; }), 4 * 500 * 3);
 }
 

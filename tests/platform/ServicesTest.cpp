@@ -3,9 +3,7 @@
 #include <cerrno>
 #include <csignal>
 #include <sys/wait.h>
-#include <thread>
 #include <unistd.h>
-#include <vector>
 
 #include <gtest/gtest.h>
 
@@ -16,6 +14,7 @@
 #include "platform/process/ProcProcesses.h"
 #include "tests/platform/TestFolder.h"
 #include "tests/support/Files.h"
+#include "tests/support/Gate.h"
 #include "tests/support/PeerOfProcess.h"
 
 namespace fs = std::filesystem;
@@ -77,15 +76,10 @@ TEST(FileNotifications, CountEachPost) {
     EXPECT_EQ(counterIn(folder / "run/notify/com.x.changed"), 1U);
     EXPECT_EQ(modeOf(folder / "run/notify"), 0755U) << "everybody may watch";
     EXPECT_EQ(modeOf(folder / "run/notify/com.x.changed"), 0644U);
-    std::vector<std::thread> threads;
-    for (int t = 0; t < 4; ++t) {
-        threads.emplace_back([&] {
-            for (int i = 0; i < 100; ++i)
-                notifications.post("com.x.changed");
-        });
-    }
-    for (auto& thread : threads)
-        thread.join();
+    inThreads(4, [&](int) {
+        for (int i = 0; i < 100; ++i)
+            notifications.post("com.x.changed");
+    });
     EXPECT_EQ(counterIn(folder / "run/notify/com.x.changed"), 401U);
 }
 

@@ -12,7 +12,7 @@ constexpr const char* two = "Applications/A.app/PlugIns/Two.appex";
 
 class FirstPass : public RegistryTest {
 protected:
-    void makeUsual() const {
+    FirstPass() {
         makeApplication("Applications/A.app", "com.example.a");
         makePlugIn(one, "com.example.a.one");
         makePlugIn(two, "com.example.a.two");
@@ -23,7 +23,6 @@ protected:
 } // namespace
 
 TEST_F(FirstPass, FindsPlugInsInApplicationsAndBesidesThem) {
-    makeUsual();
     makePlugIn("Elsewhere/Alone.appex", "com.example.alone");
     makeApplication("System/Applications/S.app", "com.example.s");
     makePlugIn("System/Applications/S.app/PlugIns/In.appex", "com.example.s.in");
@@ -54,7 +53,6 @@ TEST_F(FirstPass, TakesTheIdentifierFromTheExtensionThenTheTopThenTheBundle) {
         open();
         return *at(path)->plugInIdentifier();
     };
-    makeApplication("Applications/A.app", "com.example.a");
     EXPECT_EQ(identifier("Applications/A.app/PlugIns/1.appex"), "com.example.bundle");
     info.set("HXExtensionIdentifier", "com.example.top");
     EXPECT_EQ(identifier("Applications/A.app/PlugIns/2.appex"), "com.example.top");
@@ -63,15 +61,9 @@ TEST_F(FirstPass, TakesTheIdentifierFromTheExtensionThenTheTopThenTheBundle) {
 }
 
 TEST_F(FirstPass, TellsATouchedBundleFromAChangedOne) {
-    struct Case {
-        const char* what;
-        std::function<void()> act;
-        bool changed;
-    };
-
     const std::string program = std::string(one) + "/program";
     const std::string signature = std::string(one) + "/Signature";
-    const Case cases[] = {
+    const std::tuple<const char*, std::function<void()>, bool> cases[] = {
         {"the same bytes written again", [&] { home.write(program, "code of com.example.a.one"); },
          false},
         {"a copy in place of the file",
@@ -87,25 +79,23 @@ TEST_F(FirstPass, TellsATouchedBundleFromAChangedOne) {
         {"no signature", [&] { std::filesystem::remove(home / signature); }, true},
         {"a file that does not count", [&] { home.write(std::string(one) + "/data", "x"); }, false},
     };
-    makeUsual();
     open();
-    for (const Case& c : cases) {
-        SCOPED_TRACE(c.what);
+    for (const auto& [what, act, changed] : cases) {
+        SCOPED_TRACE(what);
         const Uuid before = uuidOf(one);
         const Uuid other = uuidOf(two);
         const ARKnowledge known = registry->knowledge();
         letClockTick();
-        c.act();
+        act();
         open();
-        EXPECT_EQ(uuidOf(one) != before, c.changed);
+        EXPECT_EQ(uuidOf(one) != before, changed);
         EXPECT_EQ(uuidOf(two), other);
-        EXPECT_EQ(registry->knowledge().sequence > known.sequence, c.changed);
-        EXPECT_EQ(registry->knowledge().uuid != known.uuid, c.changed);
+        EXPECT_EQ(registry->knowledge().sequence > known.sequence, changed);
+        EXPECT_EQ(registry->knowledge().uuid != known.uuid, changed);
     }
 }
 
 TEST_F(FirstPass, SeesAChangeOfTheSameSizeRightAfterItRead) {
-    makeUsual();
     for (int round = 0; round < 20; ++round) {
         home.write(std::string(one) + "/program", "A" + std::to_string(100 + round));
         open();
@@ -117,7 +107,6 @@ TEST_F(FirstPass, SeesAChangeOfTheSameSizeRightAfterItRead) {
 }
 
 TEST_F(FirstPass, KeepsTheFirstIdentifierOfAPath) {
-    makeUsual();
     open();
     makePlugIn(one, "com.example.renamed");
     open();
@@ -128,7 +117,6 @@ TEST_F(FirstPass, KeepsTheFirstIdentifierOfAPath) {
 }
 
 TEST_F(FirstPass, ForgetsWhatVanished) {
-    makeUsual();
     open();
     const ARKnowledge known = registry->knowledge();
     remove(one);
@@ -142,7 +130,6 @@ TEST_F(FirstPass, ForgetsWhatVanished) {
 }
 
 TEST_F(FirstPass, RegistersOnceWhatIsReachedTwice) {
-    makeUsual();
     std::filesystem::create_directory_symlink(home / "Applications/A.app",
                                               home / "Applications/Z.app");
     std::filesystem::create_directory_symlink(home / one,

@@ -4,6 +4,7 @@
 #include <functional>
 #include <map>
 #include <mutex>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -137,14 +138,10 @@ private:
 };
 
 struct FakeTypes final : platform::Types {
-    std::vector<std::pair<std::string, std::string>> conformances; // type, target
+    std::set<std::pair<std::string, std::string>> conformances; // type, target
 
     bool conforms(std::string_view type, std::string_view target) override {
-        for (const auto& [from, to] : conformances) {
-            if (from == type && to == target)
-                return true;
-        }
-        return type == target;
+        return type == target || conformances.contains({std::string(type), std::string(target)});
     }
 
     bool evaluateActivationRule(const platform::Value&, const platform::Dictionary&) override {

@@ -53,10 +53,8 @@ struct FakePlugIn final : ARZephrinProxy {
     std::optional<platform::Dictionary> infoDictionary() const override { return info; }
 
     std::optional<platform::Dictionary> plugInDictionary() const override {
-        const platform::Value* const found = info ? info->find("HXExtension") : nullptr;
-        if (!found || !found->dictionary())
-            return std::nullopt;
-        return *found->dictionary();
+        const auto* const found = info ? info->findDictionary("HXExtension") : nullptr;
+        return found ? std::optional(*found) : std::nullopt;
     }
 
     std::optional<platform::Dictionary> entitlements() const override { return granted; }

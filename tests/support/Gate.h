@@ -3,6 +3,8 @@
 #include <chrono>
 #include <future>
 #include <memory>
+#include <thread>
+#include <vector>
 
 #include <gtest/gtest.h>
 
@@ -25,6 +27,14 @@ private:
     std::shared_ptr<std::promise<T>> promise_ = std::make_shared<std::promise<T>>();
     std::shared_future<T> future_ = promise_->get_future().share();
 };
+
+// Runs `act` in so many threads at once, in each with its number, until all are done.
+template <class Act>
+void inThreads(int count, Act&& act) {
+    std::vector<std::jthread> threads;
+    for (int number = 0; number < count; ++number)
+        threads.emplace_back([&act, number] { act(number); });
+}
 
 // Keeps a queue busy from here on, until it is opened.
 class Gate {
