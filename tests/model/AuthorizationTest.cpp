@@ -21,6 +21,8 @@ struct FakeClient final : ZPDEntitlementHolder {
     }
 };
 
+constexpr auto none = std::nullopt;
+constexpr const char* host = "com.example.host";
 constexpr const char* restriction = "com.tovana.developer.zephrin.allowedplugins";
 constexpr const char* invalid = "invalid host restriction entitlement";
 constexpr const char* notAllowed = "the host's plug-in entitlement does not allow this plug-in";
@@ -45,21 +47,18 @@ TEST(Authorization, CombinesWhatHostAndPlugInAsk) {
         Dictionary held;
         std::optional<std::string> refusal;
     } cases[] = {
-        {"nothing asked", std::nullopt, {}, std::nullopt},
-        {"restriction is an array", std::nullopt, {{restriction, Array{"x"}}}, invalid},
-        {"restriction is a text", std::nullopt, {{restriction, "x"}}, invalid},
-        {"restriction is false", std::nullopt, {{restriction, false}}, invalid},
-        {"restriction is empty", std::nullopt, {{restriction, Dictionary()}}, std::nullopt},
-        {"restriction fits", std::nullopt, {{restriction, matching}}, std::nullopt},
-        {"restriction excludes", std::nullopt, {{restriction, other}}, notAllowed},
-        {"both fail", "com.example.host", {{restriction, other}}, notAllowed},
-        {"host lacks", "com.example.host", {}, lacking},
-        {"host holds false", "com.example.host", {{"com.example.host", false}}, lacking},
-        {"host holds a text", "com.example.host", {{"com.example.host", "no"}}, std::nullopt},
-        {"host holds true",
-         "com.example.host",
-         {{"com.example.host", true}, {restriction, matching}},
-         std::nullopt},
+        {"nothing asked", none, {}, none},
+        {"restriction is an array", none, {{restriction, Array{"x"}}}, invalid},
+        {"restriction is a text", none, {{restriction, "x"}}, invalid},
+        {"restriction is false", none, {{restriction, false}}, invalid},
+        {"restriction is empty", none, {{restriction, Dictionary()}}, none},
+        {"restriction fits", none, {{restriction, matching}}, none},
+        {"restriction excludes", none, {{restriction, other}}, notAllowed},
+        {"both fail", host, {{restriction, other}}, notAllowed},
+        {"host lacks", host, {}, lacking},
+        {"host holds false", host, {{host, false}}, lacking},
+        {"host holds a text", host, {{host, "no"}}, none},
+        {"host holds true", host, {{host, true}, {restriction, matching}}, none},
         {"asked is no text",
          Array{"a"},
          {{"a", true}},

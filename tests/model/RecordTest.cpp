@@ -52,9 +52,7 @@ TEST(Record, SpeaksTheHubVersionThatItSays) {
 }
 
 TEST(Record, IsOnlyMadeOfAcceptablePlugIns) {
-    using Spoil = void (*)(FakePlugIn&);
-
-    const std::tuple<const char*, bool, Spoil> cases[] = {
+    const std::tuple<const char*, bool, void (*)(FakePlugIn&)> cases[] = {
         {"sound", true, [](FakePlugIn&) {}},
         {"no path", false, [](FakePlugIn& p) { p.path.reset(); }},
         {"no identifier", false, [](FakePlugIn& p) { p.identifier.reset(); }},

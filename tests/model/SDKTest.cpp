@@ -41,11 +41,7 @@ protected:
 } // namespace
 
 TEST_F(SDK, GivesWhatThePlugInDoesNotSay) {
-    struct {
-        Dictionary sdk;
-        Dictionary plugIn;
-        Dictionary merged;
-    } const cases[] = {
+    const std::tuple<Dictionary, Dictionary, Dictionary> cases[] = {
         {{{"A", 1}, {"CleanTimeout", 5}, {"D", Dictionary{{"x", 1}, {"y", 2}}}},
          {{"A", 2}, {"CleanTimeout", 9}, {"D", Dictionary{{"x", 3}}}},
          {{"A", 2}, {"CleanTimeout", 5}, {"D", Dictionary{{"x", 3}, {"y", 2}}}}},
@@ -60,15 +56,15 @@ TEST_F(SDK, GivesWhatThePlugInDoesNotSay) {
          {{"A", "text"}, {"B", Dictionary{{"y", 2}}}}},
     };
 
-    for (std::size_t at = 0; at < std::size(cases); ++at) {
-        SCOPED_TRACE(at);
-        const std::string point = "com.example.point" + std::to_string(at);
-        registerPoint(point, cases[at].sdk);
-        const auto resolved = record(cases[at].plugIn, {{pointKey, point}});
+    int number = 0;
+    for (const auto& [sdk, plugIn, merged] : cases) {
+        SCOPED_TRACE(describe(sdk));
+        const std::string point = "com.example.point" + std::to_string(++number);
+        registerPoint(point, sdk);
+        const auto resolved = record(plugIn, {{pointKey, point}});
         resolved->resolveSDK();
-        for (const auto& expected : cases[at].merged)
-            EXPECT_EQ(resolved->infoKey(expected.key.view()), expected.value)
-                << expected.key.view();
+        for (const auto& [key, value] : merged)
+            EXPECT_EQ(resolved->infoKey(key.view()), value) << key.view();
         EXPECT_EQ(resolved->version(), "1"); // canonical
     }
 }

@@ -51,11 +51,7 @@ std::string reason(const std::expected<Value, Error>& result) {
 } // namespace
 
 TEST(PropertyListBinary, ReadsEachKindOfObject) {
-    const struct {
-        const char* what;
-        std::string object;
-        Value value;
-    } cases[] = {
+    const std::tuple<const char*, std::string, Value> cases[] = {
         {"false", "\x08", false},
         {"true", "\x09", true},
         {"1 byte", bytes({0x10, 0xff}), 255},
@@ -77,11 +73,11 @@ TEST(PropertyListBinary, ReadsEachKindOfObject) {
         {"empty dictionary", "\xd0", Dictionary{}},
     };
 
-    for (const auto& c : cases) {
-        const auto value = plist::parse(list({c.object}));
-        ASSERT_TRUE(value) << c.what << ": " << reason(value);
-        EXPECT_EQ(*value, c.value) << c.what;
-        EXPECT_EQ(value->kind(), c.value.kind()) << c.what;
+    for (const auto& [what, object, expected] : cases) {
+        const auto value = plist::parse(list({object}));
+        ASSERT_TRUE(value) << what << ": " << reason(value);
+        EXPECT_EQ(*value, expected) << what;
+        EXPECT_EQ(value->kind(), expected.kind()) << what;
     }
 }
 

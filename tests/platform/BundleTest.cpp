@@ -66,24 +66,18 @@ TEST(BundleReader, FindsTheBundleThatNamesAnExecutable) {
     folder.write("A.app/PlugIns/C.appex/bin/real", "");
     fs::create_symlink("bin/real", folder / "A.app/PlugIns/C.appex/Linked");
 
-    const struct {
-        const char* executable;
-        const char* bundle; // or nothing
-    } cases[] = {
-        {"A.app/Main", "A.app"},
-        {"A.app/helper", nullptr},
-        {"A.app/PlugIns/B.appex/B", "A.app/PlugIns/B.appex"},
-        {"A.app/PlugIns/C.appex/bin/real", "A.app/PlugIns/C.appex"},
-        {"A.app/missing", nullptr},
-        {"A.app", nullptr},
+    const std::pair<const char*, std::optional<std::string>> cases[] = {
+        {"A.app/Main", folder / "A.app"},
+        {"A.app/helper", std::nullopt},
+        {"A.app/PlugIns/B.appex/B", folder / "A.app/PlugIns/B.appex"},
+        {"A.app/PlugIns/C.appex/bin/real", folder / "A.app/PlugIns/C.appex"},
+        {"A.app/missing", std::nullopt},
+        {"A.app", std::nullopt},
     };
 
-    for (const auto& c : cases) {
-        const auto expected = c.bundle ? std::optional(folder / c.bundle) : std::nullopt;
-        EXPECT_EQ(
-            BundleReader::forExecutable(folder / c.executable).stringProperty(Property::bundlePath),
-            expected)
-            << c.executable;
+    for (const auto& [executable, bundle] : cases) {
+        const auto found = BundleReader::forExecutable(folder / executable);
+        EXPECT_EQ(found.stringProperty(Property::bundlePath), bundle) << executable;
     }
 }
 

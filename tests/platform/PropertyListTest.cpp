@@ -30,10 +30,7 @@ std::string nested(std::size_t levels) {
 } // namespace
 
 TEST(PropertyListXml, ReadsEachKindOfValue) {
-    const struct {
-        const char* text;
-        Value value;
-    } cases[] = {
+    const std::pair<const char*, Value> cases[] = {
         {"<string>a &lt;b&gt; &amp; &#233; <![CDATA[<c>]]>\n </string>", "a <b> & \xc3\xa9 <c>\n "},
         {"<string/>", ""},
         {"<true/>", true},
@@ -57,11 +54,11 @@ TEST(PropertyListXml, ReadsEachKindOfValue) {
          Dictionary{{"a", 2}}},
     };
 
-    for (const auto& c : cases) {
-        const auto value = plist::parse(document(c.text));
-        ASSERT_TRUE(value) << c.text << ": " << reason(value);
-        EXPECT_EQ(*value, c.value) << c.text;
-        EXPECT_EQ(value->kind(), c.value.kind()) << c.text;
+    for (const auto& [text, expected] : cases) {
+        const auto value = plist::parse(document(text));
+        ASSERT_TRUE(value) << text << ": " << reason(value);
+        EXPECT_EQ(*value, expected) << text;
+        EXPECT_EQ(value->kind(), expected.kind()) << text;
     }
 }
 

@@ -121,11 +121,8 @@ TEST_F(Grants, ComeAndGoWithTheirKey) {
 }
 
 TEST_F(Grants, WhyASignatureDoesNotCountIsSaidOncePerState) {
-    const struct {
-        const char* what;
-        std::function<void()> change;
-        const char* said; // nothing for no line
-    } steps[] = {
+    // The third is what is said; nothing for no line.
+    const std::tuple<const char*, std::function<void()>, const char*> steps[] = {
         {"unsigned", [] {}, nullptr},
         {"wrong", [&] { sign(one, "bad"); }, "nobody granted this"},
         {"touched", [&] { sign(one, "bad"); }, nullptr},
@@ -147,19 +144,19 @@ TEST_F(Grants, WhyASignatureDoesNotCountIsSaidOncePerState) {
     };
 
     open();
-    for (const auto& step : steps) {
-        SCOPED_TRACE(step.what);
-        step.change();
+    for (const auto& [what, change, said] : steps) {
+        SCOPED_TRACE(what);
+        change();
         const std::string log = logOf([&] {
             for (int i = 0; i < 2; ++i) {
                 registry->rescan();
                 registry->trustChanged();
-                EXPECT_EQ(at(one) && at(one)->entitlements(), step.what == std::string("good"));
+                EXPECT_EQ(at(one) && at(one)->entitlements(), what == std::string("good"));
             }
         });
-        EXPECT_EQ(linesWith(log, complaint), step.said ? 1U : 0U) << log;
-        const std::string line = home / one + " does not count: " + (step.said ? step.said : "");
-        EXPECT_EQ(linesWith(log, line), step.said ? 1U : 0U) << log;
+        EXPECT_EQ(linesWith(log, complaint), said ? 1U : 0U) << log;
+        const std::string line = home / one + " does not count: " + (said ? said : "");
+        EXPECT_EQ(linesWith(log, line), said ? 1U : 0U) << log;
     }
 }
 

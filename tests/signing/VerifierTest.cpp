@@ -54,11 +54,7 @@ TEST_F(VerifierTest, GrantsWhatWasSigned) {
 TEST_F(VerifierTest, RefusesWhateverIsNotAsItWasSigned) {
     static constexpr std::uintmax_t terabyte = std::uintmax_t{1} << 40;
 
-    const struct {
-        const char* what;
-        std::function<void(const SignedFiles&)> tamper;
-        const char* reason;
-    } cases[] = {
+    const std::tuple<const char*, std::function<void(const SignedFiles&)>, const char*> cases[] = {
         {"unsigned", [](const auto& f) { fs::remove(f.signature()); }, "not signed"},
         {"one byte of the executable", [&](const auto& f) { alter(*f.executable); },
          "the executable is not what it was"},
