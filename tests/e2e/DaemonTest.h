@@ -42,6 +42,12 @@ protected:
             EXPECT_EQ(daemon->linesWith(text), count) << text;
     }
 
+    // The registry's, while no daemon runs.
+    void removeDatabase() const {
+        for (const char* part : {"", "-wal", "-shm"})
+            fs::remove(database + part);
+    }
+
     [[nodiscard]] std::string answer(const Item& request) {
         return errorOf(client->request(request));
     }
@@ -51,6 +57,7 @@ protected:
     }
 
     const Home home;
+    const std::string database = home / "lib/AppRegistry.db";
     std::optional<Daemon> daemon;
     std::optional<WireClient> client;
 };

@@ -28,7 +28,6 @@ std::string overwritten(std::string content, std::size_t from) {
 TEST_F(Damage, ARegistryDatabaseIsSetAsideAndRebuilt) {
     addAppWith(home, "A", {.identifier = "a"});
     addAppWith(home, "B", {.identifier = "b"});
-    const std::string database = home / "lib/AppRegistry.db";
     const std::pair<const char*, std::string (*)(const std::string& good)> cases[] = {
         {"no database at all", [](const std::string&) { return std::string(10000, 'x'); }},
         {"body overwritten", [](const std::string& good) { return overwritten(good, 100); }},
@@ -41,9 +40,9 @@ TEST_F(Damage, ARegistryDatabaseIsSetAsideAndRebuilt) {
         // What the first pass wrote is brought from the log into the database after it.
         ASSERT_TRUE(eventually([&] { return fs::file_size(database) >= 4 * 8192u; }));
         stop();
-        fs::remove(database + "-wal");
-        fs::remove(database + "-shm");
-        writeFile(database, damage(readFile(database)), 0600);
+        const std::string good = readFile(database);
+        removeDatabase();
+        writeFile(database, damage(good), 0600);
         writeFile(home / "zpd.log", "");
         start({.logLevel = "default"});
         EXPECT_EQ(seen(), "a b");

@@ -20,16 +20,8 @@ protected:
         return answer(pathsRequest("add", paths));
     }
 
-    // The daemon ends; the next one finds no database.
-    void removeDatabase() {
-        stop();
-        for (const char* part : {"", "-wal", "-shm"})
-            fs::remove(database + part);
-    }
-
     [[nodiscard]] Item uuidOf(const std::string& path) { return findAt(*client, path)["uuid"]; }
 
-    const std::string database = home / "lib/AppRegistry.db";
     const std::string in = addAppWith(home, "In", {.identifier = "in"});
     const std::string out = addAppWith(home, "Out", {.identifier = "out"}, "Elsewhere");
     const std::string elsewhere = home / "Elsewhere/Out.app";
@@ -129,6 +121,7 @@ TEST_F(Registration, OutlivesTheDatabase) {
         SCOPED_TRACE(damaged);
         EXPECT_EQ(add({out, in}), "");
         EXPECT_EQ(remove({in}), granted);
+        stop();
         removeDatabase();
         if (damaged)
             writeFile(database, "no database, however long it may be" + std::string(9999, 'x'));
@@ -139,6 +132,7 @@ TEST_F(Registration, OutlivesTheDatabase) {
     }
     // What others could have written is not believed.
     const std::string list = home / "lib/AppRegistry.plist";
+    stop();
     removeDatabase();
     fs::permissions(list, fs::perms(0666));
     start();

@@ -39,8 +39,6 @@ protected:
             result.insert(form["identifier"].text());
         return result;
     }
-
-    const std::string database = home / "lib/AppRegistry.db";
 };
 
 // Each round rebuilds a lost database, with what the folders do not tell.
@@ -64,8 +62,7 @@ TEST_F(RegistryCrash, InTheFirstPassLosesNothing) {
     kill();
     for (int round = 0; round < rounds; ++round) {
         SCOPED_TRACE(round);
-        for (const char* part : {"", "-wal", "-shm"})
-            fs::remove(database + part);
+        removeDatabase();
         daemon.emplace(home.path(),
                        Daemon::Options{.logLevel = "default", .waitUntilReady = false});
         std::this_thread::sleep_for(whole * (round + 1) / (rounds + 1));
@@ -87,28 +84,26 @@ TEST_F(RegistryCrash, AmongChangesLosesNothingAcknowledged) {
         const std::string name = "out" + std::to_string(i);
         paths.push_back(addPlugIn(app, name, {.identifier = name}));
     }
-    // Sends a request for each and ends the daemon after some answers; tells how many came.
-    const auto add = [&](std::size_t enough) {
-        for (const std::string& path : paths)
-            client->post(pathsRequest("add", {path}));
+    // Ends the daemon after some answers; tells how many came.
+    const auto hear = [&](std::size_t enough, const std::function<bool()>& next) {
         std::size_t done = 0;
-        for (; client->receive(); ++done) {
+        for (; next(); ++done) {
             if (done + 1 == enough)
                 daemon->program().signal(SIGKILL);
         }
         return done;
+    };
+    const auto addEach = [&](std::size_t enough) {
+        for (const std::string& path : paths)
+            client->post(pathsRequest("add", {path}));
+        return hear(enough, [&] { return client->receive().has_value(); });
     };
     const auto removeEach = [&](std::size_t enough) {
         Talk talk(home, {manager, daemon->socketPath()});
         talk.tell("hello");
         for (const std::string& path : paths)
             talk.tell("remove " + path);
-        std::size_t done = 0;
-        for (; talk.hear() == granted; ++done) {
-            if (done + 1 == enough)
-                daemon->program().signal(SIGKILL);
-        }
-        return done;
+        return hear(enough, [&] { return talk.hear() == granted; });
     };
     Names installed;
     for (std::size_t round = 0; round < rounds; ++round) {
@@ -123,7 +118,7 @@ TEST_F(RegistryCrash, AmongChangesLosesNothingAcknowledged) {
         const std::string name = "in" + std::to_string(round);
         (void)addAppWith(home, name, {.identifier = name}); // while it works
         installed.insert(name);
-        const std::size_t done = adding ? add(enough) : removeEach(enough);
+        const std::size_t done = adding ? addEach(enough) : removeEach(enough);
         daemon->program().exitStatus();
         EXPECT_EQ(check(), "ok");
         start();

@@ -6,6 +6,7 @@
 #include <string>
 #include <utility>
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include "Zephrin/ZPDError.h"
@@ -125,12 +126,9 @@ TEST(ErrorInReply, IsReadFromCodeAndText) {
 
 TEST(ErrorInReply, ThrowsForAMessageWithoutACode) {
     const Reply broken = Dictionary{{"errorcode", 0}, {"error", "what"}};
-    try {
-        (void)ZPDaemonClient::errorInReply(broken);
-        FAIL();
-    } catch (const std::logic_error& error) {
-        EXPECT_STREQ(error.what(), "zpd reported error without a code: what");
-    }
+    EXPECT_THAT(
+        [&] { (void)ZPDaemonClient::errorInReply(broken); },
+        testing::ThrowsMessage<std::logic_error>("zpd reported error without a code: what"));
 }
 
 TEST(RecordConversion, IsForTheCurrentVersionOnly) {
