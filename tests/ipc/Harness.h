@@ -88,8 +88,6 @@ public:
     void answerGreeting();
     void endWriting();
 
-    void close() { socket_.reset(); }
-
     platform::Dictionary greeting; // read when the connection was made
 
 private:

@@ -26,9 +26,7 @@ protected:
         return contentOf(database());
     }
 
-    void write(std::string_view bytes) const {
-        std::ofstream(database(), std::ios::binary | std::ios::trunc) << bytes;
-    }
+    void write(std::string_view bytes) const { std::ofstream(database()) << bytes; }
 
     void expectWhole() {
         const auto plugIns = registry->installedPlugins();

@@ -15,18 +15,16 @@ constexpr const char* outside = "Elsewhere/B.app/PlugIns/Out.appex";
 // Writes down what it is told, and asks the registry what readers see by then.
 class Witness final : public ARWorkspaceObserver {
 public:
-    void pluginsDidInstall(const std::vector<ARZephrinProxy::Ptr>& plugIns) override {
-        tell('+', plugIns);
-    }
+    using PlugIns = ARApplicationWorkspace::PlugIns;
 
-    void pluginsWillUninstall(const std::vector<ARZephrinProxy::Ptr>& plugIns) override {
-        tell('-', plugIns);
-    }
+    void pluginsDidInstall(const PlugIns& plugIns) override { tell('+', plugIns); }
+
+    void pluginsWillUninstall(const PlugIns& plugIns) override { tell('-', plugIns); }
 
     Strings told;
 
 private:
-    void tell(char sign, const std::vector<ARZephrinProxy::Ptr>& plugIns) {
+    void tell(char sign, const PlugIns& plugIns) {
         for (const auto& plugIn : plugIns)
             told.push_back(sign + *plugIn->plugInIdentifier());
     }

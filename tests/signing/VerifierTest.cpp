@@ -16,8 +16,7 @@ namespace {
 class VerifierTest : public SigningFixture {
 protected:
     void alter(const std::string& path, std::size_t at = 20) {
-        std::fstream file(path, std::ios::in | std::ios::out | std::ios::binary);
-        file.seekp(static_cast<std::streamoff>(at)).put('!');
+        std::fstream(path).seekp(at).put('!');
     }
 
     // Signs `files` anew as `change` wants the statement to be.
