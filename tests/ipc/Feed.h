@@ -38,20 +38,17 @@ public:
 
 private:
     void take() {
-        for (;;) {
-            const auto frame = reader_.next();
-            if (!frame) {
-                complaint = frame.error();
-                return;
-            }
-            if (!*frame)
-                break;
+        auto frame = reader_.next();
+        for (; frame && *frame; frame = reader_.next()) {
             headers.push_back((*frame)->header);
             bodies.emplace_back((*frame)->body);
             fromPeer.push_back((*frame)->fromPeer);
             isMixed.push_back((*frame)->isMixed);
         }
-        reader_.keep();
+        if (frame)
+            reader_.keep();
+        else
+            complaint = frame.error();
     }
 
     platform::ipc::FrameReader reader_;

@@ -67,11 +67,7 @@ TEST(SerialQueue, MayBeLetGoFromItsOwnBlock) {
             queue.reset();
             done.give();
         };
-        if (onCallingThread) {
-            borrowed->sync(std::move(let));
-        } else {
-            borrowed->async(std::move(let));
-        }
+        onCallingThread ? borrowed->sync(std::move(let)) : borrowed->async(std::move(let));
         EXPECT_TRUE(done.comes());
     }
 }
