@@ -46,14 +46,17 @@ bool ARIsExecutableName(std::string_view name) {
            name.find('\0') == name.npos;
 }
 
-std::expected<std::uint64_t, std::string>
+std::expected<std::optional<std::uint64_t>, std::string>
 ARBundleFiles::folderOf(const ARCandidate& candidate) const {
     if (candidate.kind == ARKind::extensionPoint)
         return 0; // the file itself is tested with its stamp
     struct ::stat status = {};
     const std::string name(candidate.name);
-    if (::fstatat(candidate.folder.descriptor(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0)
+    if (::fstatat(candidate.folder.descriptor(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
+        if (errno == ENOENT)
+            return std::nullopt;
         return std::unexpected(std::generic_category().message(errno));
+    }
     if (!S_ISDIR(status.st_mode))
         return std::unexpected("it is not a folder");
     if (auto refusal = platform::OwnershipTest::refusalOf(status, candidate.path))

@@ -37,8 +37,9 @@ public:
     ARBundleFiles(platform::OwnershipTest& ownership, ARWatches& watches)
         : ownership_(ownership), watches_(watches) {}
 
-    // What the candidate's own folder goes by in its file system, or why it cannot be trusted.
-    [[nodiscard]] std::expected<std::uint64_t, std::string>
+    // What the candidate's own folder goes by in its file system, nothing when it is gone since it
+    // was listed, or why it cannot be trusted.
+    [[nodiscard]] std::expected<std::optional<std::uint64_t>, std::string>
     folderOf(const ARCandidate& candidate) const;
 
     // The stamp of one file, all zero when it is missing. Else the reason why the bundle cannot

@@ -81,9 +81,11 @@ bool ARPass::found(const ARCandidate& candidate) {
         refused(std::string(candidate.path), folder.error());
         return false;
     }
+    if (!*folder)
+        return false; // moved away just now; the event of that may still be to come
     if (candidate.kind != ARKind::extensionPoint) {
         if (candidate.path == item_)
-            folder_ = *folder;
+            folder_ = **folder;
         watches_.watchBundle(candidate.item, candidate.path);
     }
     bool there = true;

@@ -313,7 +313,8 @@ TEST_F(Follow, AStormLeavesEverythingAsTheFoldersAre) {
     EXPECT_TRUE(eventually(
         [&] { return lines("plug-in INSTALLED:") == lines("plug-in UNINSTALLED:") + 10 + 2; }));
     EXPECT_GE(lines("plug-in UNINSTALLED:"), 50u);
-    EXPECT_EQ(lines("ar error: skipping"), 0u);
+    for (const std::string& line : daemon->log())
+        EXPECT_EQ(line.find("ar error: skipping"), line.npos) << line;
 }
 
 TEST_F(Follow, LostEventsAreMadeUpFor) {
