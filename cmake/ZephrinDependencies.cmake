@@ -1,6 +1,7 @@
 # The libraries that the project stands on. Targets that this file defines:
 #   asio              standalone Asio, without its deprecated parts; platform/ipc compiles it
 #   sdt               sys/sdt.h, static probes
+#   seccomp           libseccomp
 #   systemd_optional  libsystemd, with HAVE_LIBSYSTEMD=1 where it is there; else empty
 # Imported ones: Threads::Threads EXPAT::EXPAT SQLite::SQLite3 OpenSSL::Crypto CLI11::CLI11
 # nlohmann_json::nlohmann_json GTest::gmock_main
@@ -25,6 +26,10 @@ target_link_libraries(asio INTERFACE Threads::Threads)
 find_path(SDT_INCLUDE_DIR sys/sdt.h REQUIRED)
 add_library(sdt INTERFACE)
 target_include_directories(sdt SYSTEM INTERFACE ${SDT_INCLUDE_DIR})
+
+pkg_check_modules(LIBSECCOMP REQUIRED IMPORTED_TARGET libseccomp)
+add_library(seccomp INTERFACE)
+target_link_libraries(seccomp INTERFACE PkgConfig::LIBSECCOMP)
 
 add_library(systemd_optional INTERFACE)
 pkg_check_modules(LIBSYSTEMD QUIET IMPORTED_TARGET libsystemd)

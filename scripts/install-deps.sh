@@ -7,7 +7,7 @@ packages_of() {
     case $1 in
     build)
         echo g++ cmake ninja-build ccache pkg-config libasio-dev libexpat1-dev libsqlite3-dev \
-            libssl-dev systemtap-sdt-dev libcli11-dev nlohmann-json3-dev libsystemd-dev
+            libssl-dev systemtap-sdt-dev libcli11-dev nlohmann-json3-dev libsystemd-dev libseccomp-dev
         ;;
     test) echo libgtest-dev libgmock-dev binutils ;;
     demo | bench) ;;
