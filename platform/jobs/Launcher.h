@@ -37,8 +37,9 @@ public:
 
     virtual ~Launcher() = default;
 
-    // `started` once the program runs (or why it does not); then, once, `ended` when it and every
-    // process that came from it are gone, whoever ended them.
+    // `started`, once: when the program runs, or why it does not. Only in the first case then
+    // `ended`, once: when it and every process that came from it are gone, whoever ended them.
+    // Of one that does not run nothing is left by the time that `started` tells so.
     virtual Id launch(Launch launch, StartedBlock started, EndedBlock ended) = 0;
 
     // Asks it to end, and after a grace time makes it. One that has ended is no error.
