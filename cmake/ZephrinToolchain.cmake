@@ -24,7 +24,8 @@ endif()
 # Line tables in releases, so that a crash on a box can be read.
 set(CMAKE_CXX_FLAGS_RELEASE
   "-O2 -g1 -DNDEBUG -D_FORTIFY_SOURCE=2 -fstack-protector-strong")
-set(CMAKE_CXX_FLAGS_DEBUG "-g -D_GLIBCXX_ASSERTIONS")
+set(ZEPHRIN_DEBUG_INFO "-g" CACHE STRING "Debug information of debug builds")
+set(CMAKE_CXX_FLAGS_DEBUG "${ZEPHRIN_DEBUG_INFO} -D_GLIBCXX_ASSERTIONS")
 add_link_options(-Wl,-z,relro,-z,now)
 
 # Calls inside the shared library stay inside it, and can be inlined.
