@@ -1,7 +1,6 @@
 #include "platform/sandbox/HmacSandbox.h"
 
 #include <cerrno>
-#include <charconv>
 #include <cstdlib>
 #include <unistd.h>
 
@@ -18,28 +17,8 @@ namespace platform {
 
 namespace {
 
-constexpr std::string_view tokenVersion = "zsx1";
-
-bool standsForItself(char c) {
-    return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') ||
-           std::string_view("-._~/").find(c) != std::string_view::npos;
-}
-
-void appendEncoded(std::string& out, std::string_view text) {
-    for (const char c : text) {
-        if (standsForItself(c)) {
-            out += c;
-        } else {
-            out += '%';
-            appendHex(out, static_cast<unsigned char>(c));
-        }
-    }
-}
-
-void appendFlags(std::string& out, std::uint32_t flags) {
-    std::array<char, 8> room;
-    out.append(room.data(), std::to_chars(room.data(), room.data() + room.size(), flags, 16).ptr);
-}
+// The longest path, every byte of it encoded, and room for the rest.
+constexpr std::size_t longestToken = 16UL << 10;
 
 bool hasNul(std::string_view text) {
     return text.find('\0') != std::string_view::npos;
@@ -79,20 +58,27 @@ std::string HmacSandbox::macOf(std::string_view text) const {
     return hex;
 }
 
-std::expected<std::string, int> HmacSandbox::issue(std::string_view extensionClass,
-                                                   std::uint32_t flags, std::string_view kind,
-                                                   std::string_view target) const {
-    std::string token(tokenVersion);
-    token += ';';
-    appendEncoded(token, extensionClass);
-    token += ';';
-    appendFlags(token, flags);
-    token.append(";").append(kind).append(";");
-    appendEncoded(token, target);
+std::expected<std::string, int> HmacSandbox::issue(const SandboxGrant& grant) const {
+    std::string token = grant.text();
     const std::string mac = macOf(token);
     if (mac.empty())
         return std::unexpected(ENOMEM);
-    return token + ";" + mac;
+    token.append(";").append(mac);
+    return token;
+}
+
+std::optional<SandboxGrant> HmacSandbox::verify(std::string_view token) const {
+    const auto end = token.rfind(';');
+    if (end == std::string_view::npos || token.size() > longestToken)
+        return std::nullopt;
+    const std::string_view text = token.substr(0, end);
+    const std::string_view given = token.substr(end + 1);
+    const std::string mac = macOf(text);
+    if (mac.empty() || given.size() != mac.size())
+        return std::nullopt;
+    if (CRYPTO_memcmp(given.data(), mac.data(), mac.size()) != 0)
+        return std::nullopt;
+    return SandboxGrant::parse(text);
 }
 
 std::expected<std::string, int> HmacSandbox::issueFileExtension(std::string_view extensionClass,
@@ -101,11 +87,12 @@ std::expected<std::string, int> HmacSandbox::issueFileExtension(std::string_view
     if (path.empty() || hasNul(path))
         return std::unexpected(ENOENT);
     if ((flags & canonicalPathFlag) == 0)
-        return issue(extensionClass, flags, "file", path);
+        return issue(
+            {std::string(extensionClass), flags, SandboxGrant::Kind::file, std::string(path)});
     const auto canonical = canonicalPath(path);
     if (!canonical)
         return std::unexpected(canonical.error());
-    return issue(extensionClass, flags, "file", *canonical);
+    return issue({std::string(extensionClass), flags, SandboxGrant::Kind::file, *canonical});
 }
 
 std::expected<std::string, int> HmacSandbox::issueServiceExtension(std::string_view extensionClass,
@@ -113,7 +100,8 @@ std::expected<std::string, int> HmacSandbox::issueServiceExtension(std::string_v
                                                                    std::uint32_t flags) {
     if (serviceName.empty() || hasNul(serviceName))
         return std::unexpected(EINVAL);
-    return issue(extensionClass, flags, "service", serviceName);
+    return issue({std::string(extensionClass), flags, SandboxGrant::Kind::service,
+                  std::string(serviceName)});
 }
 
 } // namespace platform

@@ -1,9 +1,11 @@
 #pragma once
 
 #include <array>
+#include <optional>
 #include <string>
 
 #include "platform/sandbox/Sandbox.h"
+#include "platform/sandbox/SandboxGrant.h"
 
 namespace platform {
 
@@ -27,10 +29,12 @@ public:
     issueServiceExtension(std::string_view extensionClass, std::string_view serviceName,
                           std::uint32_t flags) override;
 
+    // What a token permits. Nothing for a text that this very object did not issue, whole and
+    // unchanged; how long that takes does not tell how much of it was right.
+    [[nodiscard]] std::optional<SandboxGrant> verify(std::string_view token) const;
+
 private:
-    [[nodiscard]] std::expected<std::string, int> issue(std::string_view extensionClass,
-                                                        std::uint32_t flags, std::string_view kind,
-                                                        std::string_view target) const;
+    [[nodiscard]] std::expected<std::string, int> issue(const SandboxGrant& grant) const;
     [[nodiscard]] std::string macOf(std::string_view text) const;
 
     std::array<unsigned char, 32> secret_;

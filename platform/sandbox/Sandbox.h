@@ -9,7 +9,8 @@
 
 namespace platform {
 
-// The sandbox service: tells how confined a process is and issues capabilities as text tokens.
+// The daemon's half of the sandbox service: tells how confined a process is and issues capabilities
+// as text tokens; SandboxExtensions.h is the half that uses them.
 // A token names class, flags, and a canonical path or a service name, and is authenticated with
 // a secret made at each start. Issuing the same thing twice gives the same text. Any thread.
 class Sandbox {

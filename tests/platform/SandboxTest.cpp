@@ -50,6 +50,43 @@ TEST(HmacSandbox, NeverIssuesOneTextForTwoThings) {
     add(sandbox.issueServiceExtension("a", "/x;0", 0));
 }
 
+TEST(HmacSandbox, VerifiesOnlyWhatItIssuedItself) {
+    HmacSandbox sandbox;
+    const std::string path("/A b;c/%41\n\x80");
+    const std::string token = sandbox.issueFileExtension("a;b", path, 0xA2).value_or("none");
+    EXPECT_EQ(sandbox.verify(token), (SandboxGrant{"a;b", 0xA2, SandboxGrant::Kind::file, path}));
+    const auto service = sandbox.issueServiceExtension("c", "com.example", 0);
+    EXPECT_EQ(sandbox.verify(service.value_or("none")),
+              (SandboxGrant{"c", 0, SandboxGrant::Kind::service, "com.example"}));
+    const HmacSandbox later;
+    EXPECT_FALSE(later.verify(token)) << "another start, another secret";
+
+    for (std::size_t at = 0; at < token.size(); ++at) {
+        std::string altered = token;
+        altered[at] = static_cast<char>(altered[at] ^ 1);
+        EXPECT_FALSE(sandbox.verify(altered)) << altered;
+        EXPECT_FALSE(sandbox.verify(token.substr(0, at))) << at;
+    }
+    const std::string mac = token.substr(token.rfind(';'));
+    const std::string otherMac = service->substr(service->rfind(';'));
+    for (const std::string& forged :
+         {token + "0", token + ";", token + std::string(1, '\0'), " " + token, otherMac, mac,
+          token.substr(0, token.rfind(';')) + otherMac, std::string(1UL << 20, ';')})
+        EXPECT_FALSE(sandbox.verify(forged)) << forged.substr(0, 200);
+}
+
+TEST(SandboxGrant, HasOneTextOnly) {
+    const std::string good = "zsx1;a;1;file;/x%3by";
+    ASSERT_TRUE(SandboxGrant::parse(good));
+    EXPECT_EQ(SandboxGrant::parse(good)->text(), good);
+    for (const char* bad :
+         {"", ";;;;", "zsx2;a;1;file;/x", "zsx1;a;1;file", "zsx1;a;1;file;/x;y",
+          "zsx1;a;01;file;/x", "zsx1;a;;file;/x", "zsx1;a;100000000;file;/x", "zsx1;a;-1;file;/x",
+          "zsx1;a;1;mach;/x", "zsx1;a;1;file;/x%3By", "zsx1;a;1;file;/x%", "zsx1;a;1;file;/x%3",
+          "zsx1;a;1;file;/%78", "zsx1;a;1;file;/x%zz", "zsx1;a;1;file;/x y"})
+        EXPECT_FALSE(SandboxGrant::parse(bad)) << bad;
+}
+
 TEST(HmacSandbox, RefusesWhatIsNotThere) {
     const TestFolder folder;
     HmacSandbox sandbox;
