@@ -33,13 +33,14 @@ constexpr int mostAttempts = 2;
 struct ClientConnection::Impl {
     struct Unsent {
         Dictionary message;
-        ReplyHandler handler;
+        PendingReply handler;
     };
 
     // The session in use, or a new one. REQUIRES: mutex held.
     [[nodiscard]] std::shared_ptr<ClientSession> currentSession();
-    void send(const Dictionary& message, ReplyHandler handler);
-    void refuse(ReplyHandler handler, ConnectionError error);
+    void sendOnceResumed(const Dictionary& message, PendingReply handler);
+    void send(const Dictionary& message, PendingReply handler);
+    void refuse(PendingReply handler, ConnectionError error);
 
     std::string path;
     std::shared_ptr<SerialQueue> target;
@@ -63,7 +64,7 @@ std::shared_ptr<ClientSession> ClientConnection::Impl::currentSession() {
     return session;
 }
 
-void ClientConnection::Impl::send(const Dictionary& message, ReplyHandler handler) {
+void ClientConnection::Impl::send(const Dictionary& message, PendingReply handler) {
     for (int attempt = 0; attempt < mostAttempts; ++attempt) {
         std::shared_ptr<ClientSession> used;
         {
@@ -81,8 +82,8 @@ void ClientConnection::Impl::send(const Dictionary& message, ReplyHandler handle
     refuse(std::move(handler), ConnectionError::interrupted);
 }
 
-void ClientConnection::Impl::refuse(ReplyHandler handler, ConnectionError error) {
-    if (handler)
+void ClientConnection::Impl::refuse(PendingReply handler, ConnectionError error) {
+    if (isWanted(handler))
         answer(*target, std::move(handler), std::unexpected(error));
 }
 
@@ -113,18 +114,26 @@ void ClientConnection::resume() {
 }
 
 void ClientConnection::send(const Dictionary& message) {
-    sendWithReply(message, nullptr);
+    impl_->sendOnceResumed(message, ReplyHandler());
 }
 
 void ClientConnection::sendWithReply(const Dictionary& message, ReplyHandler reply) {
+    impl_->sendOnceResumed(message, std::move(reply));
+}
+
+void ClientConnection::sendForDescriptor(const Dictionary& message, DescriptorHandler reply) {
+    impl_->sendOnceResumed(message, std::move(reply));
+}
+
+void ClientConnection::Impl::sendOnceResumed(const Dictionary& message, PendingReply handler) {
     {
-        const std::lock_guard lock(impl_->mutex);
-        if (!impl_->resumed && !impl_->cancelled) {
-            impl_->unsent.push_back({message, std::move(reply)});
+        const std::lock_guard lock(mutex);
+        if (!resumed && !cancelled) {
+            unsent.push_back({message, std::move(handler)});
             return;
         }
     }
-    impl_->send(message, std::move(reply));
+    send(message, std::move(handler));
 }
 
 void ClientConnection::cancel() {

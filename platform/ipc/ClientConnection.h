@@ -6,6 +6,7 @@
 #include <string>
 #include <variant>
 
+#include "platform/file/File.h"
 #include "platform/ipc/Message.h"
 #include "platform/value/Value.h"
 
@@ -26,6 +27,16 @@ class ClientConnection {
 public:
     // The reply's body, or why there is none. Called exactly once.
     using ReplyHandler = std::move_only_function<void(std::expected<Dictionary, ConnectionError>)>;
+
+    struct ReplyWithDescriptor {
+        Dictionary body;
+        UniqueFd descriptor; // that came with it (close-on-exec); may be empty
+    };
+
+    // The same for a reply that a descriptor may come with. One that comes with any other is
+    // closed.
+    using DescriptorHandler =
+        std::move_only_function<void(std::expected<ReplyWithDescriptor, ConnectionError>)>;
     // An error, or a message of the daemon's own accord.
     using Event = std::variant<ConnectionError, Value>;
     using EventHandler = std::move_only_function<void(Event)>;
@@ -44,6 +55,7 @@ public:
     // Of several replies the first goes to `reply`. Without one: interrupted when the daemon went
     // away, invalid when it cannot be reached.
     void sendWithReply(const Dictionary& message, ReplyHandler reply);
+    void sendForDescriptor(const Dictionary& message, DescriptorHandler reply);
 
     // Closes for good: what is pending, and every later send, is answered with invalid.
     void cancel();

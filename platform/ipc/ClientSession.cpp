@@ -1,6 +1,8 @@
 #include "platform/ipc/ClientSession.h"
 
+#include <array>
 #include <cerrno>
+#include <cstring>
 #include <sys/socket.h>
 #include <utility>
 
@@ -21,13 +23,62 @@ char* scratch() {
     return memory.get();
 }
 
+using Received = std::expected<ClientConnection::ReplyWithDescriptor, ConnectionError>;
+
+void call(ClientConnection::ReplyHandler& handler, Received reply) {
+    if (reply)
+        handler(std::move(reply->body));
+    else
+        handler(std::unexpected(reply.error()));
+}
+
+void call(ClientConnection::DescriptorHandler& handler, Received reply) {
+    handler(std::move(reply));
+}
+
+// There is room for one at a time, as many as a reply has; the kernel closes what is more.
+using Control = std::array<char, CMSG_SPACE(sizeof(int))>;
+
+UniqueFd descriptorIn(msghdr& message) {
+    UniqueFd descriptor;
+    for (cmsghdr* c = CMSG_FIRSTHDR(&message); c; c = CMSG_NXTHDR(&message, c)) {
+        if (c->cmsg_level != SOL_SOCKET || c->cmsg_type != SCM_RIGHTS)
+            continue;
+        int number = -1;
+        std::memcpy(&number, CMSG_DATA(c), sizeof(number));
+        descriptor.reset(number);
+    }
+    return descriptor;
+}
+
 } // namespace
 
-void answer(SerialQueue& queue, ClientConnection::ReplyHandler handler,
-            std::expected<Dictionary, ConnectionError> reply) {
+bool isWanted(const PendingReply& handler) {
+    return std::visit([](const auto& one) { return static_cast<bool>(one); }, handler);
+}
+
+void answer(SerialQueue& queue, PendingReply handler, Received reply) {
     queue.async([handler = std::move(handler), reply = std::move(reply)]() mutable {
-        handler(std::move(reply));
+        std::visit([&](auto& one) { call(one, std::move(reply)); }, handler);
     });
+}
+
+void DescriptorsOnTheWay::add(std::uint64_t position, UniqueFd descriptor) {
+    arrived_.push_back({position, std::move(descriptor)});
+}
+
+UniqueFd DescriptorsOnTheWay::take(std::uint64_t frameEnd) {
+    UniqueFd first;
+    for (; !arrived_.empty() && arrived_.front().position <= frameEnd; arrived_.pop_front()) {
+        if (!first)
+            first = std::move(arrived_.front().descriptor);
+    }
+    return first;
+}
+
+void DescriptorsOnTheWay::keepFirst() {
+    while (arrived_.size() > 1)
+        arrived_.pop_back();
 }
 
 ClientSession::ClientSession(Loop& loop, std::shared_ptr<SerialQueue> target,
@@ -41,22 +92,22 @@ void ClientSession::start(UniqueFd socket) {
     });
 }
 
-bool ClientSession::send(const Dictionary& message, ReplyHandler& handler) {
-    const FrameKind kind = handler ? FrameKind::request : FrameKind::oneWay;
+bool ClientSession::send(const Dictionary& message, PendingReply& handler) {
+    const FrameKind kind = isWanted(handler) ? FrameKind::request : FrameKind::oneWay;
     std::uint64_t id = 0;
     {
         const std::lock_guard lock(mutex_);
         if (over_)
             return false;
         id = ++lastId_;
-        if (handler)
-            pending_.emplace(id, std::exchange(handler, nullptr));
+        if (kind == FrameKind::request)
+            pending_.emplace(id, std::exchange(handler, {}));
     }
     const FrameText frame(kind, id, message);
     if (!frame.fits(largestRequestBody)) {
         ipcLog().error("a request is past the limits of the wire: %{public}lu bytes",
                        frame.bodySize());
-        ReplyHandler refused;
+        PendingReply refused;
         if (kind == FrameKind::request && takeBack(id, refused))
             answer(*target_, std::move(refused), std::unexpected(ConnectionError::invalid));
         return true;
@@ -72,7 +123,7 @@ bool ClientSession::send(const Dictionary& message, ReplyHandler& handler) {
 }
 
 // False when someone answered already.
-bool ClientSession::takeBack(std::uint64_t id, ReplyHandler& handler) {
+bool ClientSession::takeBack(std::uint64_t id, PendingReply& handler) {
     const std::lock_guard lock(mutex_);
     const auto place = pending_.find(id);
     if (place == pending_.end())
@@ -90,12 +141,19 @@ void ClientSession::readable() {
     const bool held = room[0].iov_len != 0;
     message.msg_iov = room.data() + (held ? 0 : 1);
     message.msg_iovlen = held ? 2 : 1;
-    const ssize_t count = ::recvmsg(socket_->descriptor(), &message, MSG_DONTWAIT);
+    alignas(cmsghdr) Control control{};
+    message.msg_control = control.data();
+    message.msg_controllen = CMSG_LEN(sizeof(int));
+    const ssize_t count =
+        ::recvmsg(socket_->descriptor(), &message, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
     if (count < 0 && (errno == EAGAIN || errno == EINTR))
         return socket_->waitReadable(shared_from_this());
     if (count <= 0)
         return lost();
     reader_.filled(static_cast<std::size_t>(count));
+    received_ += static_cast<std::size_t>(count);
+    if (UniqueFd descriptor = descriptorIn(message))
+        descriptors_.add(received_, std::move(descriptor));
     takeFrames();
 }
 
@@ -110,11 +168,14 @@ void ClientSession::takeFrames() {
             break;
     }
     reader_.keep();
+    descriptors_.keepFirst();
     if (socket_)
         socket_->waitReadable(shared_from_this());
 }
 
 bool ClientSession::take(const Frame& frame) {
+    taken_ += frameHeaderSize + frame.body.size();
+    UniqueFd descriptor = descriptors_.take(taken_);
     const auto value = decode(frame.body, {.allowEncoded = true});
     const Dictionary* body = value ? value->dictionary() : nullptr;
     if (!body)
@@ -122,7 +183,7 @@ bool ClientSession::take(const Frame& frame) {
     if (frame.header.kind == FrameKind::greeting)
         return answerGreeting(*body);
     if (frame.header.kind == FrameKind::reply)
-        takeReply(frame.header.messageId, *body);
+        takeReply(frame.header.messageId, *body, std::move(descriptor));
     else
         tell(*value);
     return true;
@@ -142,10 +203,11 @@ bool ClientSession::answerGreeting(const Dictionary& greeting) {
     return true;
 }
 
-void ClientSession::takeReply(std::uint64_t id, const Dictionary& body) {
-    ReplyHandler handler;
+void ClientSession::takeReply(std::uint64_t id, const Dictionary& body, UniqueFd descriptor) {
+    PendingReply handler;
     if (takeBack(id, handler))
-        answer(*target_, std::move(handler), body);
+        answer(*target_, std::move(handler),
+               ClientConnection::ReplyWithDescriptor{body, std::move(descriptor)});
 }
 
 void ClientSession::writeRest() {
@@ -170,7 +232,7 @@ void ClientSession::lost() {
 }
 
 void ClientSession::close(ConnectionError error) {
-    std::map<std::uint64_t, ReplyHandler> unanswered;
+    std::map<std::uint64_t, PendingReply> unanswered;
     {
         const std::lock_guard lock(mutex_);
         if (std::exchange(over_, true))

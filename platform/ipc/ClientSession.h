@@ -1,12 +1,15 @@
 #pragma once
 
 #include <cstdint>
+#include <deque>
 #include <expected>
 #include <map>
 #include <memory>
 #include <mutex>
 #include <string>
+#include <variant>
 
+#include "platform/file/File.h"
 #include "platform/ipc/ClientConnection.h"
 #include "platform/ipc/Frame.h"
 #include "platform/ipc/Outbox.h"
@@ -17,6 +20,34 @@ namespace platform::ipc {
 
 class Loop;
 
+// Who waits for a reply; an empty handler when nobody does.
+using PendingReply =
+    std::variant<ClientConnection::ReplyHandler, ClientConnection::DescriptorHandler>;
+
+[[nodiscard]] bool isWanted(const PendingReply& handler);
+
+// Descriptors that came with the bytes of a stream, until their frame is complete. Each belongs to
+// the last frame that had begun when it came, which the sender sees to. Keeps at most one for a
+// frame. Owned by a session; used on its loop.
+class DescriptorsOnTheWay {
+public:
+    // REQUIRES: in the order of `position`, which counts the stream's bytes up to the end of what
+    // it came with.
+    void add(std::uint64_t position, UniqueFd descriptor);
+    // What belongs to the next frame, that ends there; may be empty.
+    [[nodiscard]] UniqueFd take(std::uint64_t frameEnd);
+    // To be called when all complete frames were taken.
+    void keepFirst();
+
+private:
+    struct Arrived {
+        std::uint64_t position;
+        UniqueFd descriptor;
+    };
+
+    std::deque<Arrived> arrived_;
+};
+
 // One connection of a client to its daemon, from connect to the end. What is sent before the
 // greeting came waits until it was answered, so that the daemon knows the client from its first
 // request on.
@@ -26,7 +57,6 @@ class Loop;
 class ClientSession final : public SocketWatch::Target,
                             public std::enable_shared_from_this<ClientSession> {
 public:
-    using ReplyHandler = ClientConnection::ReplyHandler;
     using EventHandler = ClientConnection::EventHandler;
 
     ClientSession(Loop& loop, std::shared_ptr<SerialQueue> target,
@@ -37,7 +67,7 @@ public:
 
     // Sends a message; an empty handler makes it one-way. False when the session is over and
     // nothing was sent: the handler is then untouched.
-    [[nodiscard]] bool send(const Dictionary& message, ReplyHandler& handler);
+    [[nodiscard]] bool send(const Dictionary& message, PendingReply& handler);
     // Ends the session; what is pending is answered with `error`.
     void close(ConnectionError error);
 
@@ -47,9 +77,9 @@ private:
     void takeFrames();
     [[nodiscard]] bool take(const Frame& frame);
     [[nodiscard]] bool answerGreeting(const Dictionary& greeting);
-    void takeReply(std::uint64_t id, const Dictionary& body);
+    void takeReply(std::uint64_t id, const Dictionary& body, UniqueFd descriptor);
     void writeRest();
-    [[nodiscard]] bool takeBack(std::uint64_t id, ReplyHandler& handler);
+    [[nodiscard]] bool takeBack(std::uint64_t id, PendingReply& handler);
     void lost();
     void tell(ClientConnection::Event event);
 
@@ -62,15 +92,18 @@ private:
     std::unique_ptr<SocketWatch> socket_;
     FrameReader reader_{FrameReader::Side::client};
     bool greeted_ = false;
+    std::uint64_t received_ = 0; // bytes
+    std::uint64_t taken_ = 0;    // of them, in complete frames
+    DescriptorsOnTheWay descriptors_;
 
     std::mutex mutex_;
-    std::map<std::uint64_t, ReplyHandler> pending_; // guarded
+    std::map<std::uint64_t, PendingReply> pending_; // guarded
     std::uint64_t lastId_ = 0;                      // guarded
     bool over_ = false;                             // guarded
 };
 
 // Calls a reply's handler on a queue.
-void answer(SerialQueue& queue, ClientConnection::ReplyHandler handler,
-            std::expected<Dictionary, ConnectionError> reply);
+void answer(SerialQueue& queue, PendingReply handler,
+            std::expected<ClientConnection::ReplyWithDescriptor, ConnectionError> reply);
 
 } // namespace platform::ipc

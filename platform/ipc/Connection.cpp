@@ -97,7 +97,7 @@ void Connection::resume() {
 
 void Connection::send(const Reply& reply) {
     if (reply.expected)
-        impl_->write(FrameKind::reply, reply.messageId, reply.body);
+        impl_->write(FrameKind::reply, reply.messageId, reply.body, reply.descriptor);
 }
 
 void Connection::cancel() {

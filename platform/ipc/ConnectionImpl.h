@@ -68,7 +68,8 @@ struct Connection::Impl final : SocketWatch::Target {
 
     // Writing. `write` on any thread, the rest on the loop.
     void greet();
-    void write(FrameKind kind, std::uint64_t id, const Dictionary& body);
+    void write(FrameKind kind, std::uint64_t id, const Dictionary& body,
+               const std::shared_ptr<const UniqueFd>& descriptor = {});
     void widenFor(std::size_t frameSize);
     void writeRest();
     void writable() override;

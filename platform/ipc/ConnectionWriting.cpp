@@ -29,7 +29,8 @@ void Connection::Impl::greet() {
     write(FrameKind::greeting, 0, Dictionary{{"challenge", Data{challenge}}});
 }
 
-void Connection::Impl::write(FrameKind kind, std::uint64_t id, const Dictionary& body) {
+void Connection::Impl::write(FrameKind kind, std::uint64_t id, const Dictionary& body,
+                             const std::shared_ptr<const UniqueFd>& descriptor) {
     FrameText text(kind, id, body);
     if (!text.fits(largestReplyBody)) {
         ipcLog().error(
@@ -38,7 +39,7 @@ void Connection::Impl::write(FrameKind kind, std::uint64_t id, const Dictionary&
         return write(kind, id, oversizedReply());
     }
     widenFor(text.bodySize());
-    if (outbox.send(text.text(), text.encoder()) == Outbox::Outcome::waiting)
+    if (outbox.send(text.text(), text.encoder(), descriptor) == Outbox::Outcome::waiting)
         post(&Impl::writeRest);
 }
 

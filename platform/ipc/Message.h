@@ -7,6 +7,7 @@
 #include <utility>
 #include <variant>
 
+#include "platform/file/File.h"
 #include "platform/value/Value.h"
 
 namespace platform::ipc {
@@ -67,10 +68,12 @@ struct Reply {
     Dictionary body;
     std::uint64_t messageId = 0;
     bool expected = true;
+    // Goes to the client along with the body; the sender keeps its own, if it wants.
+    std::shared_ptr<const UniqueFd> descriptor = {};
 };
 
 [[nodiscard]] inline Reply createReply(const Message& request) {
-    return {{}, request.id, request.expectsReply};
+    return {.messageId = request.id, .expected = request.expectsReply};
 }
 
 // What a connection's handler gets; the last one is a message that is not a request.

@@ -1,11 +1,14 @@
 #include "platform/ipc/Outbox.h"
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <climits>
+#include <cstring>
 #include <sys/socket.h>
 
 #include "platform/ipc/CborEncoder.h"
+#include "platform/ipc/IpcLog.h"
 #include "platform/ipc/SocketCalls.h"
 
 namespace platform::ipc {
@@ -35,6 +38,26 @@ std::vector<iovec>& partsOf(std::string_view text, const CborEncoder& encoder) {
     return parts;
 }
 
+using Control = std::array<char, CMSG_SPACE(sizeof(int))>;
+
+void attach(msghdr& message, Control& control, int descriptor) {
+    message.msg_control = control.data();
+    message.msg_controllen = control.size();
+    cmsghdr* const head = CMSG_FIRSTHDR(&message);
+    head->cmsg_level = SOL_SOCKET;
+    head->cmsg_type = SCM_RIGHTS;
+    head->cmsg_len = CMSG_LEN(sizeof(int));
+    std::memcpy(CMSG_DATA(head), &descriptor, sizeof(int));
+}
+
+std::string joined(std::string_view text, const CborEncoder& encoder) {
+    std::string whole;
+    encoder.forEachPiece(
+        [&](std::size_t from, std::size_t size) { whole.append(text, from, size); },
+        [&](const SharedBytes& piece) { whole.append(piece.data(), piece.size()); });
+    return whole;
+}
+
 } // namespace
 
 void Outbox::open(int descriptor) {
@@ -58,16 +81,24 @@ void Outbox::close() {
     waiting_.store(false, std::memory_order_release);
 }
 
-// False when the socket is broken; `count` is what was written.
-bool Outbox::write(std::span<iovec> parts, std::size_t& count) {
+// False when the socket is broken; `count` is what was written. Where too many descriptors are
+// under way for the kernel's taste, the bytes go without theirs.
+bool Outbox::write(std::span<iovec> parts, std::size_t& count, int descriptor) {
     count = 0;
+    alignas(cmsghdr) Control control{};
     msghdr message{};
     message.msg_iov = parts.data();
     message.msg_iovlen = parts.size();
+    if (descriptor >= 0)
+        attach(message, control, descriptor);
     ssize_t sent = 0;
     do {
         sent = sendMessage(descriptor_, message, MSG_NOSIGNAL | MSG_DONTWAIT);
     } while (sent < 0 && errno == EINTR);
+    if (sent < 0 && errno == ETOOMANYREFS && descriptor >= 0) {
+        ipcLog().error("a descriptor could not be sent: %{errno}d", ETOOMANYREFS);
+        return write(parts, count);
+    }
     if (sent < 0)
         return errno == EAGAIN || errno == ENOBUFS || errno == ENOMEM;
     count = static_cast<std::size_t>(sent);
@@ -75,10 +106,13 @@ bool Outbox::write(std::span<iovec> parts, std::size_t& count) {
     return true;
 }
 
-Outbox::Outcome Outbox::send(std::string_view text, const CborEncoder& encoder) {
+Outbox::Outcome Outbox::send(std::string_view text, const CborEncoder& encoder,
+                             const Descriptor& descriptor) {
     const std::lock_guard lock(mutex_);
     if (closed_)
         return Outcome::broken;
+    if (descriptor)
+        return sendWith(descriptor, text, encoder);
     if (mayGather(encoder)) {
         encoder.forEachPiece(
             [&](std::size_t from, std::size_t size) { gathered_.append(text, from, size); },
@@ -93,6 +127,23 @@ Outbox::Outcome Outbox::send(std::string_view text, const CborEncoder& encoder) 
     if (count == encoder.size())
         return Outcome::done;
     queue(text, encoder, count);
+    return settle();
+}
+
+// REQUIRES: mutex held.
+Outbox::Outcome Outbox::sendWith(const Descriptor& descriptor, std::string_view text,
+                                 const CborEncoder& encoder) {
+    if (!gathered_.empty() && writeGathered() == Outcome::broken)
+        return Outcome::broken;
+    Piece piece{SharedBytes(joined(text, encoder)), 0, descriptor};
+    std::size_t count = 0;
+    if (descriptor_ >= 0 && pieces_.empty()) {
+        iovec whole = part(piece.bytes.data(), piece.bytes.size());
+        if (!write({&whole, 1}, count, descriptor->get()))
+            return Outcome::broken;
+    }
+    pieces_.push_back(std::move(piece));
+    drop(count);
     return settle();
 }
 
@@ -152,18 +203,27 @@ Outbox::Outcome Outbox::flush() {
         return Outcome::broken;
     if (pieces_.empty() || descriptor_ < 0)
         return settle();
-    std::vector<iovec> parts;
-    parts.reserve(std::min<std::size_t>(pieces_.size(), IOV_MAX));
-    for (const Piece& piece : pieces_) {
-        if (parts.size() == IOV_MAX)
-            break;
-        parts.push_back(part(piece.bytes.data() + piece.offset, piece.bytes.size() - piece.offset));
-    }
+    const Descriptor descriptor = pieces_.front().descriptor;
+    std::vector<iovec> parts = partsThatWait();
     std::size_t count = 0;
-    if (!write(parts, count))
+    if (!write(parts, count, descriptor ? descriptor->get() : -1))
         return Outcome::broken;
     drop(count);
     return settle();
+}
+
+// As many as one call takes; what comes with a descriptor, alone.
+std::vector<iovec> Outbox::partsThatWait() const {
+    std::vector<iovec> parts;
+    parts.reserve(std::min<std::size_t>(pieces_.size(), IOV_MAX));
+    for (const Piece& piece : pieces_) {
+        if (parts.size() == IOV_MAX || (piece.descriptor && !parts.empty()))
+            break;
+        parts.push_back(part(piece.bytes.data() + piece.offset, piece.bytes.size() - piece.offset));
+        if (piece.descriptor)
+            break;
+    }
+    return parts;
 }
 
 void Outbox::drop(std::size_t count) {
@@ -172,6 +232,7 @@ void Outbox::drop(std::size_t count) {
         const std::size_t left = first.bytes.size() - first.offset;
         if (count < left) {
             first.offset += count;
+            first.descriptor = nullptr;
             return;
         }
         count -= left;

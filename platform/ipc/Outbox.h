@@ -4,6 +4,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <deque>
+#include <memory>
 #include <mutex>
 #include <span>
 #include <string>
@@ -11,6 +12,7 @@
 #include <sys/uio.h>
 #include <vector>
 
+#include "platform/file/File.h"
 #include "platform/value/SharedBytes.h"
 
 namespace platform::ipc {
@@ -37,8 +39,12 @@ public:
     // After it returns the descriptor is not used any more. What waits is dropped.
     void close();
 
-    // Sends one frame: `text` with the cuts of `encoder` in it.
-    [[nodiscard]] Outcome send(std::string_view text, const CborEncoder& encoder);
+    using Descriptor = std::shared_ptr<const UniqueFd>;
+
+    // Sends one frame: `text` with the cuts of `encoder` in it. A descriptor goes with its first
+    // byte, and with no byte of another frame: so the reader knows to which it belongs.
+    [[nodiscard]] Outcome send(std::string_view text, const CborEncoder& encoder,
+                               const Descriptor& descriptor = {});
     // Writes on, once.
     [[nodiscard]] Outcome flush();
 
@@ -58,12 +64,16 @@ private:
     struct Piece {
         SharedBytes bytes;
         std::size_t offset = 0;
+        Descriptor descriptor = {}; // until its first byte is written; the frame is one piece
     };
 
     [[nodiscard]] bool mayGather(const CborEncoder& encoder) const;
     [[nodiscard]] Outcome writeGathered();
+    [[nodiscard]] Outcome sendWith(const Descriptor& descriptor, std::string_view text,
+                                   const CborEncoder& encoder);
     void queue(std::string_view text, const CborEncoder& encoder, std::size_t skip);
-    [[nodiscard]] bool write(std::span<iovec> parts, std::size_t& count);
+    [[nodiscard]] std::vector<iovec> partsThatWait() const;
+    [[nodiscard]] bool write(std::span<iovec> parts, std::size_t& count, int descriptor = -1);
     void drop(std::size_t count);
     Outcome settle();
 

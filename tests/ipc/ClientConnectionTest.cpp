@@ -1,5 +1,11 @@
 #include "platform/ipc/ClientConnection.h"
 
+#include <fcntl.h>
+#include <filesystem>
+#include <iterator>
+#include <sys/mman.h>
+#include <unistd.h>
+
 #include <gtest/gtest.h>
 
 #include "tests/ipc/Harness.h"
@@ -91,6 +97,64 @@ TEST_F(ClientConnectionTest, CancelAnswersPendingWithInvalid) {
     EXPECT_EQ(seen_->results[0], Result(std::unexpected(ConnectionError::invalid)));
     EXPECT_EQ(askAndWait({}), Result(std::unexpected(ConnectionError::invalid)));
     EXPECT_TRUE(server.gone.reaches(1));
+}
+
+// A file that holds a number.
+std::shared_ptr<const UniqueFd> numbered(std::uint64_t number) {
+    UniqueFd file(::memfd_create("numbered", MFD_CLOEXEC));
+    EXPECT_EQ(::pwrite(file.get(), &number, sizeof number, 0), ssize_t{sizeof number});
+    return std::make_shared<const UniqueFd>(std::move(file));
+}
+
+std::uint64_t numberIn(const UniqueFd& file) {
+    std::uint64_t number = 0;
+    return ::pread(file.get(), &number, sizeof number, 0) == sizeof number ? number : 0;
+}
+
+std::ptrdiff_t openDescriptors() {
+    return std::distance(std::filesystem::directory_iterator("/proc/self/fd"), {});
+}
+
+// Every second reply with a descriptor, every fifth too large for the socket: replies are glued,
+// queued and cut, and each descriptor must still come with its own.
+void sendNumbered(Connection& connection, const Message& message) {
+    constexpr std::size_t large = 300'000;
+    const std::uint64_t number = message.body.find("number")->unsignedInteger().value_or(0);
+    Reply reply = createReply(message);
+    reply.body = message.body;
+    if (number % 5 == 0)
+        reply.body.set("much", Data{SharedBytes(std::string(large, 'x'))});
+    if (number % 2 == 1)
+        reply.descriptor = numbered(number);
+    connection.send(reply);
+}
+
+TEST_F(ClientConnectionTest, DescriptorsComeWithTheirOwnReplies) {
+    constexpr unsigned count = 400;
+    EchoServer server(path_, {}, sendNumbered);
+    connect();
+    askAndWait({{"number", 2U}});
+    const auto before = openDescriptors();
+    Counter replies;
+    int wrong = 0;
+    for (unsigned number = 0; number < count; ++number) {
+        if (number % 7 == 0) { // did not ask for one
+            ask({{"number", number}});
+            continue;
+        }
+        client_->sendForDescriptor({{"number", number}}, [&, number](auto reply) {
+            const bool flagged = reply && (::fcntl(reply->descriptor.get(), F_GETFD) & FD_CLOEXEC);
+            const bool right = number % 2 == 0 ? reply && !reply->descriptor
+                                               : flagged && numberIn(reply->descriptor) == number;
+            wrong += right ? 0 : 1;
+            replies.add();
+        });
+    }
+    ASSERT_TRUE(replies.reaches(count - (count + 6) / 7));
+    server.queue().sync([] {});
+    queue_->sync([] {});
+    EXPECT_EQ(wrong, 0);
+    EXPECT_EQ(openDescriptors(), before);
 }
 
 } // namespace
