@@ -1,0 +1,123 @@
+#include "platform/confine/FileRules.h"
+
+#include <cerrno>
+#include <fcntl.h>
+#include <filesystem>
+#include <string>
+#include <sys/stat.h>
+#include <unistd.h>
+
+namespace platform {
+
+namespace {
+
+using landlock::Rights;
+
+constexpr Rights mayRead = landlock::readFile | landlock::readFolder;
+constexpr Rights mayRun = mayRead | landlock::execute;
+constexpr Rights mayUseDevice = landlock::readFile | landlock::writeFile;
+// No sockets, as nobody may connect to one, no devices, and nothing to run: what runs was
+// installed.
+constexpr Rights mayKeep = mayRead | landlock::writeFile | landlock::truncate | landlock::refer |
+                           landlock::makeFile | landlock::makeFolder | landlock::makeLink |
+                           landlock::makeFifo | landlock::removeFile | landlock::removeFolder;
+
+struct SystemPath {
+    const char* path;
+    Rights rights;
+    bool forNetwork = false;
+};
+
+// In /etc and below, files are replaced by others of the same name: what counts is the one that is
+// there when the plug-in starts.
+constexpr SystemPath systemPaths[] = {
+    {"/usr", mayRun},
+    {"/bin", mayRun},
+    {"/lib", mayRun},
+    {"/lib32", mayRun},
+    {"/lib64", mayRun},
+    {"/etc/ld.so.cache", mayRead},
+    {"/etc/localtime", mayRead},
+    {"/sys/devices/system/cpu", mayRead},
+    {"/dev/null", mayUseDevice},
+    {"/dev/zero", mayUseDevice},
+    {"/dev/full", mayUseDevice},
+    {"/dev/random", mayUseDevice},
+    {"/dev/urandom", mayUseDevice},
+    {"/etc/resolv.conf", mayRead, true},
+    {"/etc/hosts", mayRead, true},
+    {"/etc/host.conf", mayRead, true},
+    {"/etc/nsswitch.conf", mayRead, true},
+    {"/etc/gai.conf", mayRead, true},
+    {"/etc/services", mayRead, true},
+    {"/etc/protocols", mayRead, true},
+    {"/etc/ssl/openssl.cnf", mayRead, true},
+    {"/etc/ssl/certs", mayRead, true},
+    {"/etc/ca-certificates", mayRead, true},
+};
+
+class Adder {
+public:
+    Adder(int ruleset, const KernelFeatures& features)
+        : ruleset_(ruleset), known_(landlock::rightsToFiles(features)) {}
+
+    // 0, or an errno value.
+    [[nodiscard]] int add(const std::string& path, Rights rights, int flags = 0) const {
+        const UniqueFd open(::open(path.c_str(), O_PATH | O_CLOEXEC | flags));
+        struct ::stat status{};
+        if (!open || ::fstat(open.get(), &status) != 0)
+            return errno;
+        if (!S_ISDIR(status.st_mode))
+            rights &= landlock::ofFile;
+        return landlock::allowBelow(ruleset_, open.get(), rights & known_);
+    }
+
+    // The same for a folder of our own, which no link leads to.
+    [[nodiscard]] std::optional<Error> addFolder(const std::string& path, Rights rights) const {
+        if (const int number = add(path, rights, O_DIRECTORY | O_NOFOLLOW))
+            return posixError(number, path);
+        return std::nullopt;
+    }
+
+private:
+    const int ruleset_;
+    const Rights known_;
+};
+
+// Where the system lies elsewhere than in /usr: plug-ins use its library, as they do there.
+void addOwnLibrary(const Adder& adder) {
+    std::error_code failed;
+    const auto program = std::filesystem::read_symlink("/proc/self/exe", failed);
+    const auto above = program.parent_path().parent_path();
+    for (const char* folder : {ZEPHRIN_LIBRARY_FOLDER, "lib"}) {
+        for (const auto& entry : std::filesystem::directory_iterator(above / folder, failed)) {
+            if (entry.path().filename().string().starts_with("libZephrin.so"))
+                (void)adder.add(entry.path(), mayRead);
+        }
+    }
+}
+
+} // namespace
+
+std::optional<Error> addFileRules(int ruleset, const ConfinementPlan& plan, const Profile& profile,
+                                  const KernelFeatures& features) {
+    const Adder adder(ruleset, features);
+    for (const SystemPath& system : systemPaths) {
+        if (profile.network || !system.forNetwork)
+            (void)adder.add(system.path, system.rights);
+    }
+    addOwnLibrary(adder);
+    if (auto error = adder.addFolder(plan.bundle, mayRun))
+        return error;
+    return plan.container ? adder.addFolder(*plan.container, mayKeep) : std::nullopt;
+}
+
+void addOwnProcess(int ruleset) noexcept {
+    const int self = ::open("/proc/self", O_PATH | O_DIRECTORY | O_CLOEXEC);
+    if (self < 0)
+        return;
+    (void)landlock::allowBelow(ruleset, self, mayRead);
+    ::close(self);
+}
+
+} // namespace platform
