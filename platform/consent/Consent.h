@@ -7,7 +7,7 @@
 
 namespace platform {
 
-class Bundle;
+class BundleReader;
 
 inline constexpr std::string_view kConsentInfoGranted = "kConsentInfoGranted"; // boolean
 inline constexpr std::string_view kConsentInfoService = "kConsentInfoService"; // a service's name
@@ -21,7 +21,7 @@ public:
     // A record (with the two entries above) of each service that the user was asked about for this
     // application; nothing when it cannot be told.
     [[nodiscard]] virtual std::optional<Array>
-    consentAccessCopyInformationForBundle(const Bundle& application) = 0;
+    consentAccessCopyInformationForBundle(const BundleReader& application) = 0;
 };
 
 } // namespace platform
