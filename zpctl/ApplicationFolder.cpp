@@ -1,15 +1,13 @@
 #include "zpctl/ApplicationFolder.h"
 
 #include <cerrno>
-#include <chrono>
 #include <cstdio>
 #include <fcntl.h>
-#include <sys/file.h>
 #include <sys/stat.h>
 #include <system_error>
-#include <thread>
 #include <unistd.h>
 
+#include "platform/file/FolderLock.h"
 #include "platform/file/OwnershipTest.h"
 #include "zpctl/FolderNames.h"
 #include "zpctl/TreeCopy.h"
@@ -20,7 +18,6 @@ namespace zpctl {
 namespace {
 
 using platform::UniqueFd;
-using namespace std::chrono_literals;
 
 constexpr int folderFlags = O_RDONLY | O_DIRECTORY | O_CLOEXEC;
 
@@ -28,9 +25,6 @@ constexpr int folderFlags = O_RDONLY | O_DIRECTORY | O_CLOEXEC;
 constexpr const char* lockName = ".zpctl.lock";
 constexpr const char* comingName = ".zpctl.new"; // the copy; after the exchange, the former one
 constexpr const char* leavingName = ".zpctl.old";
-
-constexpr auto longestWait = 60s; // for others to be done
-constexpr auto waitStep = 50ms;
 
 std::string message(int number) {
     return std::generic_category().message(number);
@@ -50,36 +44,6 @@ std::optional<std::string> makeDurably(const std::string& path) {
             return path.substr(0, slash) + ": " + message(errno);
     }
     return std::nullopt;
-}
-
-// Nobody but its owner may open the file, so that nobody else can hold the lock.
-UniqueFd openLock(int folder) {
-    UniqueFd lock(::openat(folder, lockName, O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC,
-                           S_IRUSR | S_IWUSR));
-    struct ::stat status = {};
-    const bool sound = lock && ::fstat(lock.get(), &status) == 0 && S_ISREG(status.st_mode) &&
-                       (status.st_uid == ::geteuid() || status.st_uid == 0) &&
-                       (status.st_mode & (S_IRWXG | S_IRWXO)) == 0;
-    if (lock && !sound) {
-        lock.reset();
-        errno = EPERM;
-    }
-    return lock;
-}
-
-std::expected<UniqueFd, std::string> lockIn(int folder, const std::string& path) {
-    UniqueFd lock = openLock(folder);
-    if (!lock)
-        return std::unexpected(path + "/" + lockName + ": " + message(errno));
-    const auto end = std::chrono::steady_clock::now() + longestWait;
-    while (::flock(lock.get(), LOCK_EX | LOCK_NB) != 0) {
-        if (errno != EWOULDBLOCK && errno != EINTR)
-            return std::unexpected(path + "/" + lockName + ": " + message(errno));
-        if (std::chrono::steady_clock::now() > end)
-            return std::unexpected("somebody else is changing " + path + " for too long");
-        std::this_thread::sleep_for(waitStep);
-    }
-    return lock;
 }
 
 bool renameIn(int folder, const char* from, const char* to, unsigned flags) {
@@ -128,7 +92,7 @@ std::expected<ApplicationFolder, std::string> ApplicationFolder::open(const std:
     UniqueFd opened(::open(canonical->c_str(), folderFlags));
     if (!opened)
         return std::unexpected(*canonical + ": " + message(errno));
-    auto lock = lockIn(opened.get(), *canonical);
+    auto lock = platform::lockInFolder(opened.get(), lockName, *canonical);
     if (!lock)
         return std::unexpected(std::move(lock.error()));
     ApplicationFolder folder(*canonical, std::move(opened), std::move(*lock));
