@@ -16,6 +16,7 @@ std::span<const Verb> verbs() {
         {"remove", "Unregister plug-ins by path", declareRemove},
         {"install", "Put an application into the application folder, safely", declareInstall},
         {"uninstall", "Take an application out of the application folder", declareUninstall},
+        {"consent", "Write down, or show, what the user agreed to", declareConsent},
         {"keygen", "Make a key to sign with", declareKeygen},
         {"sign", "Sign a bundle or an executable, with entitlements", declareSign},
         {"verify", "Tell what the signature of a bundle or an executable grants, and why",

@@ -15,6 +15,7 @@ Action declareAdd(CLI::App& command);
 Action declareRemove(CLI::App& command);
 Action declareInstall(CLI::App& command);
 Action declareUninstall(CLI::App& command);
+Action declareConsent(CLI::App& command);
 Action declareKeygen(CLI::App& command);
 Action declareSign(CLI::App& command);
 Action declareVerify(CLI::App& command);
