@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include "platform/file/File.h"
+#include "platform/file/FileGlance.h"
 
 namespace platform {
 
@@ -30,6 +31,12 @@ std::optional<unsigned long> numberAfter(std::string_view status, std::string_vi
     unsigned long number = 0;
     const auto result = std::from_chars(rest.data(), rest.data() + rest.size(), number);
     return result.ec == std::errc() ? std::optional(number) : std::nullopt;
+}
+
+bool hasKnownMounts(const Confinement& process, const Confinement& self,
+                    const std::optional<Confinement>& first) {
+    return process.mountNamespace == self.mountNamespace ||
+           (first && process.mountNamespace == first->mountNamespace);
 }
 
 } // namespace
@@ -58,9 +65,17 @@ bool isMoreConfined(const Confinement& process, const Confinement& self,
         return true;
     if (process.userNamespace != self.userNamespace)
         return true;
-    const bool knownMounts = process.mountNamespace == self.mountNamespace ||
-                             (first && process.mountNamespace == first->mountNamespace);
-    return !knownMounts;
+    return !hasKnownMounts(process, self, first);
+}
+
+bool seesOurFiles(const ipc::Peer& peer) {
+    const auto process = Confinement::of(peer.pid);
+    const auto self = Confinement::of(::getpid());
+    if (!process || !self || !hasKnownMounts(*process, *self, Confinement::of(1)))
+        return false;
+    const auto root = FileGlance::throughProc("/proc/" + std::to_string(peer.pid) + "/root");
+    const auto ours = FileGlance::throughProc("/proc/self/root");
+    return root && ours && root->isSameFileAs(*ours) && ipc::isAlive(peer);
 }
 
 } // namespace platform

@@ -5,6 +5,8 @@
 #include <string_view>
 #include <sys/types.h>
 
+#include "platform/ipc/Peer.h"
+
 namespace platform {
 
 // How confined a process is, as far as the kernel tells.
@@ -26,5 +28,9 @@ struct Confinement {
 // at).
 [[nodiscard]] bool isMoreConfined(const Confinement& process, const Confinement& self,
                                   const std::optional<Confinement>& first);
+
+// Whether a process surely has the same root folder as this one, and the same mounts or those of
+// process 1. Any thread.
+[[nodiscard]] bool seesOurFiles(const ipc::Peer& peer);
 
 } // namespace platform

@@ -9,6 +9,9 @@
 
 namespace platform {
 
+// The socket at which the daemon's broker serves (SandboxBroker.h).
+inline constexpr const char* sandboxServiceName = "com.tovana.sandbox";
+
 // The half of the sandbox service that works in a process which was given a token: Sandbox.h is the
 // half that issues tokens. Failures are errno values.
 class SandboxExtensions {
