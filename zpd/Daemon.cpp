@@ -21,6 +21,8 @@
 #include "platform/preferences/FilePreferences.h"
 #include "platform/process/ProcProcesses.h"
 #include "platform/sandbox/HmacSandbox.h"
+#include "platform/sandbox/SandboxBroker.h"
+#include "platform/sandbox/SandboxExtensions.h"
 #include "platform/signing/SignedPrograms.h"
 #include "platform/types/DeclaredTypes.h"
 #include "zpd/Platform.h"
@@ -41,6 +43,20 @@ void openStandardDescriptors() {
         ::close(fd);
 }
 
+void logCannotServe(const std::string& service, const platform::Error& why) {
+    ZPDLogOps().error("cannot serve %{public}@: %{public}@", service, why);
+}
+
+// Whether a canonical path is a registered bundle or lies in one. Any thread.
+bool isInRegisteredBundle(ARApplicationWorkspace& registry, std::string path) {
+    for (; path.size() > 1; path = platform::folderOf(path)) {
+        const auto application = registry.applicationProxyForBundlePath(path);
+        if ((application && !application->isPlaceholder()) || registry.zephrinProxyForPath(path))
+            return true;
+    }
+    return false;
+}
+
 } // namespace
 
 // In the order in which they are made; what comes later uses what came before.
@@ -51,6 +67,8 @@ struct Daemon::Parts {
     void watchFiles();
     [[nodiscard]] bool openRegistry();
     [[nodiscard]] bool makeServer(const ZPDOptions& options);
+    void makeBroker();
+    void stop() const;
     [[noreturn]] void terminate();
 
     const platform::Places places;
@@ -65,6 +83,7 @@ struct Daemon::Parts {
     platform::SystemLocale locale;
     platform::PathWatch trust; // noticing what changes there from here on
     std::unique_ptr<ARRegistry> registry;
+    std::unique_ptr<platform::SandboxBroker> broker;
     std::unique_ptr<ZPDServer> server;
     std::unique_ptr<platform::ipc::Watch> localeWatch;
     std::unique_ptr<platform::ipc::Watch> trustWatch;
@@ -122,15 +141,34 @@ bool Daemon::Parts::makeServer(const ZPDOptions& options) {
     auto made = ZPDServer::create(platform, {.socketPath = places.socketPath(options.serviceName),
                                              .databasePath = options.databasePath});
     if (!made) {
-        ZPDLogOps().error("cannot serve %{public}@: %{public}@", options.serviceName, made.error());
+        logCannotServe(options.serviceName, made.error());
         return false;
     }
     server = std::move(*made);
     return true;
 }
 
-void Daemon::Parts::terminate() {
+// Of several daemons on one home the first has it; the others serve without.
+void Daemon::Parts::makeBroker() {
+    const auto isInBundle = [registry = registry.get()](const std::string& path) {
+        return isInRegisteredBundle(*registry, path);
+    };
+    auto made = platform::SandboxBroker::create(places.socketPath(platform::sandboxServiceName),
+                                                sandbox, {.isInRegisteredBundle = isInBundle});
+    if (made)
+        broker = std::move(*made);
+    else
+        logCannotServe(platform::sandboxServiceName, made.error());
+}
+
+void Daemon::Parts::stop() const {
+    if (broker)
+        broker->stop();
     server->stop();
+}
+
+void Daemon::Parts::terminate() {
+    stop();
     platform::log::flush();
     ::_exit(EXIT_SUCCESS); // as other threads may be at work
 }
@@ -148,6 +186,7 @@ std::unique_ptr<Daemon> Daemon::create(const ZPDOptions& options) {
     auto parts = std::make_unique<Parts>(platform::Places::forThisProcess());
     if (!parts->openRegistry() || !parts->makeServer(options))
         return nullptr;
+    parts->makeBroker();
     parts->watchFiles();
     ZPPlugInCore::setExtensionPoints(std::make_shared<ZPDExtensionPoints>(*parts->registry));
     parts->server->setVerbose(options.verbose);
@@ -162,6 +201,8 @@ Daemon::~Daemon() = default;
 
 void Daemon::run() {
     parts_->mainLoop.onSignal(SIGTERM, [parts = parts_.get()] { parts->terminate(); });
+    if (parts_->broker)
+        parts_->broker->resume();
     parts_->server->resume();
     parts_->follower->start();
     parts_->mainLoop.run();
