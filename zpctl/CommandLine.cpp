@@ -56,6 +56,30 @@ std::string failureText(const CLI::App* app, const CLI::Error& error) {
            "\nzpctl --help tells how it is used.\n";
 }
 
+// Where the verb stands among the arguments, after the options before it.
+std::size_t verbIn(const std::vector<std::string>& arguments) {
+    std::size_t at = 0;
+    while (at < arguments.size() && arguments[at].starts_with('-')) {
+        const bool hasValue = arguments[at] == "--service" || arguments[at] == "--timeout";
+        at += hasValue ? 2 : 1;
+    }
+    return at;
+}
+
+// Takes the command off that stands after the first "--" of a verb that is to run one.
+std::vector<std::string> takeCommand(std::vector<std::string>& arguments) {
+    const std::size_t at = verbIn(arguments);
+    const auto takes = [&](const Verb& verb) {
+        return verb.takesCommand && at < arguments.size() && verb.name == arguments[at];
+    };
+    const auto mark = std::ranges::find(arguments, "--");
+    if (std::ranges::none_of(verbs(), takes) || mark == arguments.end())
+        return {};
+    std::vector<std::string> command(mark + 1, arguments.end());
+    arguments.erase(mark, arguments.end());
+    return command;
+}
+
 // A parsed command line: what to run, and with which options.
 class CommandLine {
 public:
@@ -82,6 +106,7 @@ public:
 
     // Throws CLI::ParseError, as help and version do too.
     void parse(std::vector<std::string> arguments) {
+        options_.command = takeCommand(arguments);
         std::ranges::reverse(arguments); // as the library takes them
         app_.parse(std::move(arguments));
     }

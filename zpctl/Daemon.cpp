@@ -15,6 +15,7 @@ namespace zpctl {
 namespace {
 
 using platform::Dictionary;
+using platform::Uuid;
 using platform::Value;
 using platform::ipc::ConnectionError;
 
@@ -41,8 +42,23 @@ std::string socketPathOf(const std::optional<std::string>& serviceName) {
     return platform::Places::forThisProcess().socketPath(serviceName.value_or(usual));
 }
 
-Failure refused(const platform::Error& error) {
-    return {Status::refused, error.description.value_or("the daemon gave no reason"), error.code};
+std::vector<std::string> conflictsIn(const Dictionary& reply) {
+    std::vector<std::string> identifiers;
+    const Value* const found = reply.find("conflicts");
+    if (!found || !found->array())
+        return identifiers;
+    for (const Value& conflict : *found->array()) {
+        const auto* const record = conflict.dictionary();
+        const Value* const identifier = record ? record->find("BQBundleIdentifier") : nullptr;
+        const auto text = identifier ? identifier->string() : std::nullopt;
+        identifiers.emplace_back(text.value_or("unknown"));
+    }
+    return identifiers;
+}
+
+Failure refused(const platform::Error& error, const Dictionary& reply) {
+    return {Status::refused, error.description.value_or("the daemon gave no reason"), error.code,
+            conflictsIn(reply)};
 }
 
 Failure unreadable(const char* what) {
@@ -65,7 +81,7 @@ std::expected<Dictionary, Failure> Daemon::ask(const Request& request) {
     if (!reply)
         return std::unexpected(disconnected(reply.error(), socketPath_));
     if (const auto error = ZPDaemonClient::errorInReply(reply))
-        return std::unexpected(refused(*error));
+        return std::unexpected(refused(*error, *reply));
     return *std::move(reply);
 }
 
@@ -140,6 +156,54 @@ std::optional<Failure> Daemon::add(const std::vector<std::string>& paths) {
 std::optional<Failure> Daemon::remove(const std::vector<std::string>& paths) {
     return tell(
         [&](ZPDaemonClient& client, auto reply) { client.removePlugIns(paths, std::move(reply)); });
+}
+
+std::optional<Failure> Daemon::ready(const std::vector<Uuid>& uuids,
+                                     const std::optional<Dictionary>& environment) {
+    return tell([&](ZPDaemonClient& client, auto reply) {
+        Dictionary message = client.request("ready");
+        ZPDaemonClient::setUuids(message, uuids);
+        if (environment)
+            message.set("environment", *environment);
+        client.send(message, std::move(reply));
+    });
+}
+
+std::expected<std::vector<std::string>, Failure> Daemon::access(const std::vector<Uuid>& uuids) {
+    const auto reply = ask([&](ZPDaemonClient& client, auto block) {
+        Dictionary message = client.request("access");
+        ZPDaemonClient::setUuids(message, uuids);
+        client.send(message, std::move(block));
+    });
+    if (!reply)
+        return std::unexpected(reply.error());
+    std::vector<std::string> tokens;
+    const Value* const extensions = reply->find("extensions");
+    if (extensions && extensions->array()) {
+        for (const Value& token : *extensions->array())
+            tokens.emplace_back(token.string().value_or(""));
+    }
+    if (tokens.size() != uuids.size())
+        return std::unexpected(unreadable("the daemon's answer is not a token for each plug-in"));
+    return tokens;
+}
+
+std::expected<Uuid, Failure> Daemon::hold(const std::vector<std::string>& paths,
+                                          std::uint64_t flags) {
+    const auto reply = ask([&](ZPDaemonClient& client, auto block) {
+        client.holdPlugins(paths, flags, std::move(block));
+    });
+    if (!reply)
+        return std::unexpected(reply.error());
+    const Value* const token = reply->find("uuids");
+    if (!token || !token->uuid())
+        return std::unexpected(unreadable("the daemon's answer holds no token"));
+    return *token->uuid();
+}
+
+std::optional<Failure> Daemon::release(const Uuid& token) {
+    return tell(
+        [&](ZPDaemonClient& client, auto reply) { client.releaseHold(token, std::move(reply)); });
 }
 
 } // namespace zpctl

@@ -18,7 +18,8 @@ namespace zpctl {
 struct Failure {
     Status status = Status::refused;
     std::string message;
-    std::optional<std::int64_t> code; // the daemon's, when it has refused
+    std::optional<std::int64_t> code;        // the daemon's, when it has refused
+    std::vector<std::string> conflicts = {}; // identifiers of the busy plug-ins, when that is why
 };
 
 // A connection to the daemon for a tool that asks and waits. Replies arrive on the client
@@ -42,6 +43,25 @@ public:
                                                   const platform::Dictionary& annotation);
     [[nodiscard]] std::optional<Failure> add(const std::vector<std::string>& paths);
     [[nodiscard]] std::optional<Failure> remove(const std::vector<std::string>& paths);
+
+    // Makes plug-ins ready for this process; the environment is for theirs.
+    [[nodiscard]] std::optional<Failure>
+    ready(const std::vector<platform::Uuid>& uuids,
+          const std::optional<platform::Dictionary>& environment);
+    // The tokens for the plug-ins' bundles, in their order.
+    [[nodiscard]] std::expected<std::vector<std::string>, Failure>
+    access(const std::vector<platform::Uuid>& uuids);
+
+    // Places a hold, which lives as long as this; the answer is its token. `flags` are the bits of
+    // "lock".
+    [[nodiscard]] std::expected<platform::Uuid, Failure> hold(const std::vector<std::string>& paths,
+                                                              std::uint64_t flags);
+    [[nodiscard]] std::optional<Failure> release(const platform::Uuid& token);
+
+    // Bits of the flags of `hold`.
+    static constexpr std::uint64_t holdPlugIns = 1; // the paths are of plug-ins, not applications
+    static constexpr std::uint64_t holdUnlessBusy = 2;
+    static constexpr std::uint64_t holdTerminates = 4;
 
 private:
     using Request = std::function<void(ZPDaemonClient&, ZPDaemonClient::ReplyBlock)>;

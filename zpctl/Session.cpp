@@ -42,6 +42,8 @@ Status Session::fail(const Failure& failure) const {
         nlohmann::ordered_json error{{"message", failure.message}};
         if (failure.code)
             error["code"] = *failure.code;
+        if (!failure.conflicts.empty())
+            error["conflicts"] = failure.conflicts;
         terminal_.err << jsonText({{"error", error}});
         return failure.status;
     }
@@ -49,6 +51,8 @@ Status Session::fail(const Failure& failure) const {
     if (failure.code)
         terminal_.err << " (code " << *failure.code << ')';
     terminal_.err << '\n';
+    for (const std::string& identifier : failure.conflicts)
+        terminal_.err << "  " << printable(identifier) << '\n';
     return failure.status;
 }
 

@@ -6,6 +6,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <vector>
 
 #include <nlohmann/json_fwd.hpp>
 
@@ -22,6 +23,7 @@ struct Options {
     std::optional<std::string> service;
     bool json = false;
     double timeout = usualTimeout;
+    std::vector<std::string> command; // what stands after "--", for the verbs that run something
 };
 
 // Where a run of the tool writes, and what that place can show.
@@ -50,6 +52,8 @@ public:
 
     // To wait for its reader to go; -1 when there is none.
     [[nodiscard]] int outDescriptor() const { return terminal_.descriptor; }
+
+    [[nodiscard]] const std::vector<std::string>& command() const { return options_.command; }
 
     [[nodiscard]] bool inJson() const { return options_.json; }
 

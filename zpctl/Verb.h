@@ -28,6 +28,7 @@ struct Verb {
     const char* name;
     const char* summary;
     Action (*declare)(CLI::App& command);
+    bool takesCommand = false; // after "--"; it is not the verb's to read
 };
 
 // All verbs, in the order in which help lists them. A new one is a row in verbs/Verbs.cpp and a

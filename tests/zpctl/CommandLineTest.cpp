@@ -66,6 +66,13 @@ TEST_F(CommandLine, RefusesWrongUsage) {
         {"remove"},
         {"uninstall", ""},
         {"monitor", "--count", "0"},
+        {"ready"},
+        {"ready", uuid, "x"},
+        {"ready", uuid, "--env", "=x"},
+        {"access", "--env", "A=B", uuid},
+        {"hold", "--app"},
+        {"hold", "--", "true"},
+        {"release", "x"},
     };
     for (const auto& arguments : cases) {
         SCOPED_TRACE(testing::PrintToString(arguments));
@@ -98,6 +105,10 @@ TEST_F(CommandLine, TellsWhenThereIsNoDaemon) {
         {"--service", "other", "find", "/x.appex"},
         {"elect", uuid, "on"},
         {"add", "/x.appex"},
+        {"ready", uuid, uuid, "--env", "A=B", "--env", "C="},
+        {"access", uuid},
+        {"--timeout", "5", "hold", "--app", "--terminate", "/x.app", "--", "true", "--", "--app"},
+        {"release", uuid},
     };
     for (const auto& arguments : cases) {
         const Run lost = run(arguments);

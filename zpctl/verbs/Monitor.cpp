@@ -1,7 +1,6 @@
 // "monitor": a line for each annotation-change notification, until it is told to end.
 
 #include <chrono>
-#include <csignal>
 #include <cstdint>
 #include <cstdio>
 #include <ctime>
@@ -9,11 +8,9 @@
 #include <optional>
 #include <ostream>
 #include <poll.h>
-#include <pthread.h>
 #include <string>
 #include <string_view>
 #include <sys/eventfd.h>
-#include <sys/signalfd.h>
 #include <unistd.h>
 
 #include <CLI/CLI.hpp>
@@ -21,6 +18,7 @@
 
 #include "Zephrin/ZPNotificationObserver.h"
 #include "platform/file/File.h"
+#include "zpctl/EndingSignals.h"
 #include "zpctl/Json.h"
 #include "zpctl/Session.h"
 #include "zpctl/verbs/Verbs.h"
@@ -45,37 +43,6 @@ Examples:
   zpctl --json monitor | while read -r line; do zpctl tree; done
 
 With --json: one {"time", "notification"} a line, the time in UTC.)";
-
-// What waits are ended by: a descriptor that is readable once one of the signals came. They are
-// held back in this thread and in those that it makes, for as long as this lives.
-class EndingSignals {
-public:
-    EndingSignals() {
-        ::sigset_t signals;
-        ::sigemptyset(&signals);
-        ::sigaddset(&signals, SIGINT);
-        ::sigaddset(&signals, SIGTERM);
-        ::pthread_sigmask(SIG_BLOCK, &signals, &before_);
-        came_.reset(::signalfd(-1, &signals, SFD_CLOEXEC));
-    }
-
-    EndingSignals(const EndingSignals&) = delete;
-    EndingSignals& operator=(const EndingSignals&) = delete;
-
-    // Those that came are taken as said: they have ended the wait.
-    ~EndingSignals() {
-        ::signalfd_siginfo one;
-        ::pollfd ready = {came_.get(), POLLIN, 0};
-        while (::poll(&ready, 1, 0) > 0 && ::read(came_.get(), &one, sizeof one) > 0) {}
-        ::pthread_sigmask(SIG_SETMASK, &before_, nullptr);
-    }
-
-    [[nodiscard]] int descriptor() const { return came_.get(); }
-
-private:
-    ::sigset_t before_;
-    platform::UniqueFd came_;
-};
 
 std::string localTime(Clock::time_point time) {
     const auto milliseconds =
