@@ -15,6 +15,9 @@
 #include "platform/file/File.h"
 #include "platform/file/PathWatch.h"
 #include "platform/ipc/Loop.h"
+#include "platform/jobs/JobManager.h"
+#include "platform/jobs/JobServer.h"
+#include "platform/jobs/LauncherProcess.h"
 #include "platform/locale/SystemLocale.h"
 #include "platform/notify/FileNotifications.h"
 #include "platform/paths/Places.h"
@@ -68,6 +71,8 @@ struct Daemon::Parts {
     [[nodiscard]] bool openRegistry();
     [[nodiscard]] bool makeServer(const ZPDOptions& options);
     void makeBroker();
+    void makeJobServer();
+    void resume();
     void stop() const;
     [[noreturn]] void terminate();
 
@@ -81,9 +86,13 @@ struct Daemon::Parts {
     platform::FileNotifications notifications;
     platform::FolderContainers containers;
     platform::SystemLocale locale;
+    platform::ipc::Loop jobsLoop{"jobs"};
+    platform::LauncherProcess launcher{jobsLoop};
+    platform::JobManager jobs{jobsLoop, launcher};
     platform::PathWatch trust; // noticing what changes there from here on
     std::unique_ptr<ARRegistry> registry;
     std::unique_ptr<platform::SandboxBroker> broker;
+    std::unique_ptr<platform::JobServer> jobServer;
     std::unique_ptr<ZPDServer> server;
     std::unique_ptr<platform::ipc::Watch> localeWatch;
     std::unique_ptr<platform::ipc::Watch> trustWatch;
@@ -137,6 +146,8 @@ bool Daemon::Parts::makeServer(const ZPDOptions& options) {
                             .notifications = notifications,
                             .containers = containers,
                             .locale = locale,
+                            .jobs = jobs,
+                            .assertions = jobs,
                             .workspace = *registry};
     auto made = ZPDServer::create(platform, {.socketPath = places.socketPath(options.serviceName),
                                              .databasePath = options.databasePath});
@@ -153,15 +164,39 @@ void Daemon::Parts::makeBroker() {
     const auto isInBundle = [registry = registry.get()](const std::string& path) {
         return isInRegisteredBundle(*registry, path);
     };
-    auto made = platform::SandboxBroker::create(places.socketPath(platform::sandboxServiceName),
-                                                sandbox, {.isInRegisteredBundle = isInBundle});
+    const auto isShutOut = [this](const platform::ipc::Peer& peer) { return jobs.isShutOut(peer); };
+    auto made = platform::SandboxBroker::create(
+        places.socketPath(platform::sandboxServiceName), sandbox,
+        {.isInRegisteredBundle = isInBundle, .isShutOut = isShutOut});
     if (made)
         broker = std::move(*made);
     else
         logCannotServe(platform::sandboxServiceName, made.error());
 }
 
+// Likewise: what is made ready by a daemon without cannot be started.
+void Daemon::Parts::makeJobServer() {
+    auto made =
+        platform::JobServer::create(jobsLoop, jobs, places.socketPath(platform::jobServiceName));
+    if (made)
+        jobServer = std::move(*made);
+    else
+        logCannotServe(platform::jobServiceName, made.error());
+}
+
+void Daemon::Parts::resume() {
+    if (broker)
+        broker->resume();
+    if (jobServer)
+        jobServer->resume();
+    jobsLoop.start();
+    server->resume();
+    follower->start();
+}
+
 void Daemon::Parts::stop() const {
+    if (jobServer)
+        jobServer->stop();
     if (broker)
         broker->stop();
     server->stop();
@@ -187,6 +222,7 @@ std::unique_ptr<Daemon> Daemon::create(const ZPDOptions& options) {
     if (!parts->openRegistry() || !parts->makeServer(options))
         return nullptr;
     parts->makeBroker();
+    parts->makeJobServer();
     parts->watchFiles();
     ZPPlugInCore::setExtensionPoints(std::make_shared<ZPDExtensionPoints>(*parts->registry));
     parts->server->setVerbose(options.verbose);
@@ -201,10 +237,7 @@ Daemon::~Daemon() = default;
 
 void Daemon::run() {
     parts_->mainLoop.onSignal(SIGTERM, [parts = parts_.get()] { parts->terminate(); });
-    if (parts_->broker)
-        parts_->broker->resume();
-    parts_->server->resume();
-    parts_->follower->start();
+    parts_->resume();
     parts_->mainLoop.run();
     parts_->terminate();
 }

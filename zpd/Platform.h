@@ -1,8 +1,10 @@
 #pragma once
 
 namespace platform {
+class Assertions;
 class CodeSigning;
 class Containers;
+class Jobs;
 class Locale;
 class Notifications;
 class Preferences;
@@ -25,5 +27,7 @@ struct Platform {
     platform::Notifications& notifications;
     platform::Containers& containers;
     platform::Locale& locale;
+    platform::Jobs& jobs;
+    platform::Assertions& assertions;
     ARApplicationWorkspace& workspace;
 };

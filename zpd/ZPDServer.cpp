@@ -5,6 +5,8 @@
 #include <variant>
 
 #include "Zephrin/ZPDLog.h"
+#include "platform/ipc/Connection.h"
+#include "platform/jobs/Jobs.h"
 #include "zpd/ZPDIpcClient.h"
 
 using platform::Error;
@@ -75,7 +77,7 @@ void ZPDServer::stop() {
 // Runs on the IPC loop.
 void ZPDServer::handle(ListenerEvent event) {
     if (auto* const connection = std::get_if<std::shared_ptr<Connection>>(&event)) {
-        ZPDIpcClient::create(*connection, *this);
+        adopt(*connection);
     } else if (const auto* const error = std::get_if<ConnectionError>(&event)) {
         if (*error == ConnectionError::invalid)
             ZPDLogOps().standard("potentially unexpected error from ipc: %{public}@", *error);
@@ -84,6 +86,15 @@ void ZPDServer::handle(ListenerEvent event) {
     } else {
         ZPDLogOps().error("unexpected message: %{public}@", std::get<Value>(event));
     }
+}
+
+// Runs on the IPC loop. A connection that nobody keeps is closed.
+void ZPDServer::adopt(const std::shared_ptr<Connection>& connection) {
+    if (services().jobs.isShutOut(*connection->peer())) {
+        ZPDLogOps().error("process %d is a plug-in's: its connection is closed", connection->pid());
+        return;
+    }
+    ZPDIpcClient::create(connection, *this);
 }
 
 // Runs on the registry's queue.

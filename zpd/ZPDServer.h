@@ -102,6 +102,7 @@ private:
 
     [[nodiscard]] std::optional<platform::Error> listen(const std::string& socketPath);
     void handle(platform::ipc::ListenerEvent event);
+    void adopt(const std::shared_ptr<platform::ipc::Connection>& connection);
 
     void removedPlugIns(const std::vector<ARZephrinProxy::Ptr>& plugIns) override;
     // REQUIRES: on "serverSync"

@@ -9,10 +9,12 @@
 #include <vector>
 
 #include "platform/container/Containers.h"
+#include "platform/jobs/Jobs.h"
 #include "platform/locale/Locale.h"
 #include "platform/notify/Notifications.h"
 #include "platform/preferences/Preferences.h"
 #include "platform/process/Processes.h"
+#include "platform/queue/SerialQueue.h"
 #include "platform/sandbox/Sandbox.h"
 #include "platform/signing/CodeSigning.h"
 #include "platform/types/Types.h"
@@ -195,6 +197,60 @@ struct FakeLocale final : platform::Locale {
     void observeChanges(ChangeHandler handler) override { changed = std::move(handler); }
 };
 
+struct FakeJobs final : platform::Jobs {
+    struct Added {
+        pid_t host;
+        platform::ExternalService service;
+        platform::Dictionary overlay;
+    };
+
+    int addCode = 0;                        // what adding is answered with
+    int removeCode = nothingOnRecord;       // and removing
+    bool answers = true;                    // whether removals are answered at once
+    bool shutOut = false;                   // everybody
+    std::vector<Added> added;               // read when nobody adds
+    std::vector<std::string> removed;       // "identifier version"
+    std::vector<std::function<void()>> due; // the answers that wait
+
+    int addExternalService(const std::shared_ptr<const platform::ipc::Peer>& host,
+                           const platform::ExternalService& service,
+                           const platform::Dictionary& overlay) override {
+        added.push_back({host->pid, service, overlay});
+        return addCode;
+    }
+
+    void removeExternalService(std::string_view identifier, std::string_view version,
+                               std::shared_ptr<platform::SerialQueue> queue,
+                               Answer answer) override {
+        const std::lock_guard lock(mutex_);
+        removed.push_back(std::string(identifier) + " " + std::string(version));
+        const auto kept = std::make_shared<Answer>(std::move(answer));
+        const auto answerIt = [queue, kept, code = removeCode] {
+            queue->async([kept, code] { (*kept)(code); });
+        };
+        if (answers)
+            answerIt();
+        else
+            due.emplace_back(answerIt);
+    }
+
+    bool isShutOut(const platform::ipc::Peer&) override { return shutOut; }
+
+private:
+    std::mutex mutex_;
+};
+
+struct FakeAssertions final : platform::Assertions {
+    std::vector<platform::Dictionary> busy; // records, whoever is asked for
+    std::vector<std::set<std::string>> asked;
+
+    std::vector<platform::Dictionary>
+    busyInstances(const std::set<std::string>& bundleIdentifiers) override {
+        asked.push_back(bundleIdentifiers);
+        return busy;
+    }
+};
+
 // All of them, and the struct in which they are handed to the server. Outlives what it is given to.
 struct FakePlatform {
     FakeProcesses processes;
@@ -205,10 +261,12 @@ struct FakePlatform {
     FakeNotifications notifications;
     FakeContainers containers;
     FakeLocale locale;
+    FakeJobs jobs;
+    FakeAssertions assertions;
     FakeWorkspace workspace;
 
     [[nodiscard]] Platform services() {
-        return {processes,     signing,    sandbox, types,    preferences,
-                notifications, containers, locale,  workspace};
+        return {processes,  signing, sandbox, types,      preferences, notifications,
+                containers, locale,  jobs,    assertions, workspace};
     }
 };
