@@ -11,6 +11,7 @@
 #include <map>
 #include <poll.h>
 #include <sys/prctl.h>
+#include <sys/resource.h>
 #include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -39,8 +40,10 @@ constexpr milliseconds firstPause{100};
 constexpr milliseconds longestPause{10'000};
 constexpr milliseconds livedForAWhile{10'000};
 
-// Instances, those that wait to be launched included.
+// Instances, those that wait to be launched included; and less where there may be less descriptors:
+// neither this process nor the launcher shall run out of them.
 constexpr std::size_t mostInstances = 4096;
+constexpr std::size_t descriptorsEach = 8;
 
 // How long a launcher that was let go may take to end its instances.
 constexpr milliseconds patience{5'000};
@@ -63,6 +66,13 @@ void reapProcess(const UniqueFd& process) {
     siginfo_t info{};
     while (::waitid(P_PIDFD, static_cast<id_t>(process.get()), &info, WEXITED) != 0 &&
            errno == EINTR) {}
+}
+
+std::size_t instanceLimit() {
+    rlimit limit{};
+    if (::getrlimit(RLIMIT_NOFILE, &limit) != 0)
+        return mostInstances;
+    return std::min<std::size_t>(mostInstances, limit.rlim_cur / descriptorsEach);
 }
 
 UniqueFd duplicate(const UniqueFd& descriptor) {
@@ -179,7 +189,8 @@ void LauncherProcess::Impl::died() {
     channel.reset();
     death.reset();
     reapProcess(process);
-    launcherLog().error("the launcher died; its %{public}lu instances are ended", instances.size());
+    launcherLog().error("the launcher died; what it launched (%{public}lu) is ended",
+                        instances.size());
     endOrphans();
 }
 
@@ -312,6 +323,7 @@ std::string LauncherProcess::programBesideThisOne() {
 
 Launcher::Id LauncherProcess::launch(Launch launch, StartedBlock started, EndedBlock ended) {
     Impl& impl = *impl_;
+    assert(impl.loop.isCurrent());
     const Id id = ++impl.lastId;
     impl.instances.emplace(id, Impl::Instance{std::move(started), std::move(ended)});
     const Dictionary message = launcher::encode(launcher::Launch{
@@ -320,7 +332,7 @@ Launcher::Id LauncherProcess::launch(Launch launch, StartedBlock started, EndedB
         impl.fail(id, posixError(EINVAL, "no process can be made of this"));
         return id;
     }
-    if (impl.instances.size() > mostInstances) {
+    if (impl.instances.size() > instanceLimit()) {
         impl.fail(id, posixError(EAGAIN, "too many processes were launched"));
         return id;
     }
@@ -336,6 +348,7 @@ Launcher::Id LauncherProcess::launch(Launch launch, StartedBlock started, EndedB
 
 void LauncherProcess::end(Id id) {
     Impl& impl = *impl_;
+    assert(impl.loop.isCurrent());
     if (!impl.instances.contains(id))
         return;
     if (impl.channel) {

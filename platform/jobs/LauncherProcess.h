@@ -30,6 +30,7 @@ public:
     // "zpd-launcher" in the folder of this process's own program.
     [[nodiscard]] static std::string programBesideThisOne();
 
+    // REQUIRES: on the loop.
     Id launch(Launch launch, StartedBlock started, EndedBlock ended) override;
     void end(Id id) override;
 
