@@ -178,20 +178,21 @@ std::expected<Child, Error> makeChild(const platform::launcher::Launch& launch,
     return child;
 }
 
-void letGo(const Child& child) {
+void letGo(int status) {
     const char go = 1;
-    (void)::send(child.status.get(), &go, sizeof go, MSG_NOSIGNAL | MSG_DONTWAIT);
+    (void)::send(status, &go, sizeof go, MSG_NOSIGNAL | MSG_DONTWAIT);
 }
 
-ChildOutcome readOutcome(const UniqueFd& status, ChildFailure& failure) {
-    const ssize_t size = ::recv(status.get(), &failure, sizeof failure, MSG_DONTWAIT);
+ChildOutcome readOutcome(int status, ChildFailure& failure) {
+    const ssize_t size = ::recv(status, &failure, sizeof failure, MSG_DONTWAIT);
     if (size == sizeof failure)
         return ChildOutcome::failed;
     if (size == 0)
         return ChildOutcome::runs;
     if (size < 0 && (errno == EAGAIN || errno == EINTR))
         return ChildOutcome::undecided;
-    return ChildOutcome::diedBefore; // it left unread that it may go
+    failure = {ChildStep::none, ECANCELED}; // it left unread that it may go
+    return ChildOutcome::failed;
 }
 
 std::string describe(const ChildFailure& failure) {
@@ -201,7 +202,8 @@ std::string describe(const ChildFailure& failure) {
                                       "its folder cannot be entered",
                                       "it cannot be confined",
                                       "it cannot be executed",
-                                      "it is a script, and only programs are launched"};
+                                      "it is a script, and only programs are launched",
+                                      "it was ended before it ran"};
     const auto step = static_cast<std::size_t>(failure.step);
     return std::string(step < steps.size() ? steps[step] : "it cannot be launched") + ": " +
            std::strerror(failure.error);

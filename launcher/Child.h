@@ -23,6 +23,7 @@ enum class ChildStep : std::int32_t {
     confinement,
     execution,
     script, // not executed: an interpreter would have to open the file by itself
+    none,   // it was ended before
 };
 
 struct ChildFailure {
@@ -51,11 +52,11 @@ makeChild(const platform::launcher::Launch& launch, const Passed& passed, int nu
           const platform::PreparedConfinement& confinement);
 
 // Until then it does not become the program.
-void letGo(const Child& child);
+void letGo(int status);
 
 // How a child's beginning went, as far as is known.
-enum class ChildOutcome : std::uint8_t { undecided, runs, failed, diedBefore };
-[[nodiscard]] ChildOutcome readOutcome(const platform::UniqueFd& status, ChildFailure& failure);
+enum class ChildOutcome : std::uint8_t { undecided, runs, failed };
+[[nodiscard]] ChildOutcome readOutcome(int status, ChildFailure& failure);
 
 // "the step: the reason", for the error that a caller gets.
 [[nodiscard]] std::string describe(const ChildFailure& failure);

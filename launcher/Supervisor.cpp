@@ -3,7 +3,6 @@
 #include <cerrno>
 #include <chrono>
 #include <csignal>
-#include <fcntl.h>
 #include <utility>
 
 #include "platform/confine/PreparedConfinement.h"
@@ -69,52 +68,46 @@ void Supervisor::launch(const Launch& launch, const Passed& passed) {
     auto child = makeChild(launch, passed, null_.get(), *confinement);
     if (!child)
         return fail(child.error());
-    begin(launch.id, std::move(*child), confinement->describe());
+    follow(launch.id, std::move(*child), confinement->describe());
 }
 
-void Supervisor::begin(Id id, Child child, platform::Dictionary confinement) {
+void Supervisor::follow(Id id, Child child, platform::Dictionary confinement) {
     Instance& instance = instances_[id];
-    instance.child = std::move(child);
+    instance.group = child.pid;
     instance.confinement = std::move(confinement);
-    leaders_.emplace(instance.child.pid, id);
+    instance.child = loop_.watchDescriptor(std::move(child.status), [this, id] { look(id); });
+    leaders_.emplace(child.pid, id);
     std::vector<UniqueFd> process;
-    process.push_back(std::move(instance.child.process));
-    tell(Made{id, instance.child.pid}, std::move(process));
-    if (channel_->isWaiting())
-        held_.push_back(id);
-    else
-        letGo(instance);
-    instance.statusWatch =
-        loop_.watchDescriptor(UniqueFd(::fcntl(instance.child.status.get(), F_DUPFD_CLOEXEC, 0)),
-                              [this, id] { look(id, instances_.at(id)); });
-}
-
-void Supervisor::letGo(Instance& instance) {
-    instance.wentOn = true;
-    ::letGo(instance.child);
+    process.push_back(std::move(child.process));
+    tell(Made{id, child.pid}, std::move(process));
+    held_.push_back(id);
+    if (!channel_->isWaiting())
+        letAllGo();
 }
 
 void Supervisor::letAllGo() {
     for (const Id id : std::exchange(held_, {})) {
         const auto place = instances_.find(id);
-        if (place != instances_.end())
-            letGo(place->second);
+        if (place == instances_.end() || !place->second.child)
+            continue;
+        place->second.wentOn = true;
+        letGo(place->second.child->descriptor());
     }
 }
 
 // At how the instance's beginning goes.
-void Supervisor::look(Id id, Instance& instance) {
-    if (instance.phase != Phase::beginning)
+void Supervisor::look(Id id) {
+    Instance& instance = instances_.at(id);
+    if (!instance.child)
         return;
-    ChildOutcome outcome = readOutcome(instance.child.status, instance.failure);
+    ChildOutcome outcome = readOutcome(instance.child->descriptor(), instance.failure);
     if (outcome == ChildOutcome::undecided)
         return;
-    if (outcome == ChildOutcome::runs && !instance.wentOn)
-        outcome = ChildOutcome::diedBefore;
-    if (outcome == ChildOutcome::diedBefore)
-        instance.failure = {ChildStep::execution, ECANCELED};
-    instance.statusWatch.reset();
-    instance.child.status.reset();
+    if (outcome == ChildOutcome::runs && !instance.wentOn) {
+        instance.failure = {ChildStep::none, ECANCELED};
+        outcome = ChildOutcome::failed;
+    }
+    instance.child.reset();
     instance.phase = outcome == ChildOutcome::runs ? Phase::running : Phase::unsuccessful;
     if (instance.phase == Phase::running)
         tell(Started{id, std::exchange(instance.confinement, {})});
@@ -125,14 +118,13 @@ void Supervisor::end(Id id) {
     if (place == instances_.end() || !place->second.leads || place->second.grace)
         return;
     Instance& instance = place->second;
-    const pid_t group = instance.child.pid;
-    ::kill(-group, SIGTERM);
-    ::kill(-group, SIGCONT); // one that is stopped would not notice
+    ::kill(-instance.group, SIGTERM);
+    ::kill(-instance.group, SIGCONT); // one that is stopped would not notice
     instance.grace = loop_.makeTimer();
     instance.grace->start(graceTime, [this, id] {
         const auto late = instances_.find(id);
         if (late != instances_.end() && late->second.leads)
-            ::kill(-late->second.child.pid, SIGKILL);
+            ::kill(-late->second.group, SIGKILL);
     });
 }
 

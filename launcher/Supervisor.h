@@ -41,27 +41,27 @@ private:
     };
 
     struct Instance {
-        Child child;
+        pid_t group = 0;
         platform::Dictionary confinement;
         Phase phase = Phase::beginning;
         bool wentOn = false; // was let go
         bool leads = true;   // the first process was not reaped yet
         int status = 0;      // of the first process, once reaped
         ChildFailure failure{};
-        std::unique_ptr<platform::ipc::Watch> statusWatch;
+        std::unique_ptr<platform::ipc::Watch> child; // its status, while it begins
         std::unique_ptr<platform::ipc::Timer> grace;
     };
 
     [[nodiscard]] bool take(const platform::Dictionary& message,
                             platform::launcher::LauncherChannel::Descriptors& descriptors);
     void launch(const platform::launcher::Launch& launch, const Passed& passed);
-    void begin(Id id, Child child, platform::Dictionary confinement);
+    void follow(Id id, Child child, platform::Dictionary confinement);
     void end(Id id);
-    void letGo(Instance& instance);
     void letAllGo();
-    void look(Id id, Instance& instance);
+    void look(Id id);
     void daemonGone(const char* fault);
 
+    [[nodiscard]] bool reapSome();
     void firstEnded(pid_t pid);
     void tellOfGone();
     void tellOfEnd(Id id, const Instance& instance);

@@ -1,7 +1,7 @@
-#include <algorithm>
 #include <cerrno>
 #include <csignal>
 #include <sys/wait.h>
+#include <vector>
 
 #include "launcher/Supervisor.h"
 
@@ -10,6 +10,8 @@
 using namespace platform::launcher;
 
 namespace {
+
+constexpr int mostReapedAtOnce = 256;
 
 // A child that has ended and was not reaped; 0 when there is none.
 pid_t endedChild() {
@@ -38,18 +40,27 @@ bool isEmpty(pid_t group) {
 } // namespace
 
 void Supervisor::reap() {
-    while (const pid_t pid = endedChild()) {
-        firstEnded(pid);
-        const auto place = leaders_.find(pid);
-        const int status = reapChild(pid);
-        if (place == leaders_.end())
-            continue;
-        instances_.at(place->second).status = status;
-        leaders_.erase(place);
-    }
+    if (!reapSome())
+        loop_.post([this] { reap(); });
     tellOfGone();
     if (daemonIsGone_ && instances_.empty())
         loop_.stop();
+}
+
+// False when there may be more: orders come first, however many processes an instance makes.
+bool Supervisor::reapSome() {
+    for (int count = 0; count < mostReapedAtOnce; ++count) {
+        const pid_t pid = endedChild();
+        if (!pid)
+            return true;
+        firstEnded(pid);
+        const int status = reapChild(pid);
+        if (const auto place = leaders_.find(pid); place != leaders_.end()) {
+            instances_.at(place->second).status = status;
+            leaders_.erase(place);
+        }
+    }
+    return false;
 }
 
 // Of an instance's first process: as long as it is not reaped, its number is the group's.
@@ -62,14 +73,14 @@ void Supervisor::firstEnded(pid_t pid) {
     Instance& instance = instances_.at(id);
     instance.leads = false;
     instance.grace.reset();
-    look(id, instance);
+    look(id);
     ending_.push_back(id);
 }
 
 void Supervisor::tellOfGone() {
     std::erase_if(ending_, [this](Id id) {
         const auto place = instances_.find(id);
-        if (!isEmpty(place->second.child.pid))
+        if (!isEmpty(place->second.group))
             return false;
         tellOfEnd(id, place->second);
         instances_.erase(place);

@@ -55,7 +55,8 @@ int main() {
     UniqueFd daemon(::fcntl(daemonSocket, F_DUPFD_CLOEXEC, lowestOwnDescriptor));
     ::close(daemonSocket);
     UniqueFd null = occupyLowDescriptors();
-    if (!daemon || !null || ::prctl(PR_SET_CHILD_SUBREAPER, 1) != 0)
+    // No folder is kept from being unmounted.
+    if (!daemon || !null || ::chdir("/") != 0 || ::prctl(PR_SET_CHILD_SUBREAPER, 1) != 0)
         return EXIT_FAILURE;
     platform::ipc::Loop loop("launcher");
     Supervisor supervisor(loop, std::move(daemon), std::move(null));
