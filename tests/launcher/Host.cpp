@@ -24,10 +24,6 @@ bool isReadable(int descriptor) {
     return ::poll(&poll, 1, patience) > 0;
 }
 
-std::string programs() {
-    return ZEPHRIN_TEST_PROGRAMS;
-}
-
 } // namespace
 
 Other::Other(pid_t pid)
@@ -66,9 +62,13 @@ std::string Launched::hear() {
     return line;
 }
 
-std::string Launched::ask(const std::string& line) {
+void Launched::say(const std::string& line) {
     const std::string text = line + "\n";
     (void)::send(socket.get(), text.data(), text.size(), MSG_NOSIGNAL);
+}
+
+std::string Launched::ask(const std::string& line) {
+    say(line);
     return hear();
 }
 
@@ -76,7 +76,7 @@ Other Launched::make(const std::string& kind) {
     return Other(std::atoi(ask(kind).c_str()));
 }
 
-Host::Host() {
+Host::Host(const std::string& launcher) {
     setMode(folder_.path(), 0755);
     std::filesystem::create_directories(folder_ / "bundle");
     std::filesystem::copy_file(programs() + "/launcher_probe", folder_ / "bundle/probe");
@@ -84,9 +84,9 @@ Host::Host() {
     if (::geteuid() == 0)
         giveAway(container(), launchedUser);
     loop_.start();
-    onLoop([this] {
-        launcher_ =
-            std::make_unique<platform::LauncherProcess>(loop_, programs() + "/zpd-launcher");
+    onLoop([&] {
+        launcher_ = std::make_unique<platform::LauncherProcess>(
+            loop_, launcher.empty() ? programs() + "/zpd-launcher" : launcher);
     });
 }
 
@@ -101,6 +101,10 @@ void Host::onLoop(const std::function<void()>& act) {
         done.give();
     });
     EXPECT_TRUE(done.comes());
+}
+
+std::string Host::programs() {
+    return ZEPHRIN_TEST_PROGRAMS;
 }
 
 platform::Launcher::Launch Host::usual() const {

@@ -41,6 +41,7 @@ struct Launched {
     [[nodiscard]] const platform::Launcher::Started* started() const;
     // Nothing when it did not fail.
     [[nodiscard]] std::optional<platform::Error> error() const;
+    void say(const std::string& line);
     // Sends a line; the line that answers. "" when none comes.
     std::string ask(const std::string& line);
     // The next line.
@@ -58,7 +59,8 @@ struct Launched {
 // container.
 class Host {
 public:
-    Host();
+    // With this program in the launcher's place, if any.
+    explicit Host(const std::string& launcher = {});
     Host(const Host&) = delete;
     Host& operator=(const Host&) = delete;
     ~Host();
@@ -70,6 +72,9 @@ public:
     [[nodiscard]] Launched start();
     void end(const Launched& run);
     [[nodiscard]] pid_t launcherPid();
+
+    // Where the launcher and the probe are.
+    [[nodiscard]] static std::string programs();
 
     [[nodiscard]] const TestFolder& folder() const { return folder_; }
 

@@ -2,6 +2,7 @@
 #include <csignal>
 #include <fcntl.h>
 #include <filesystem>
+#include <grp.h>
 #include <sstream>
 #include <sys/socket.h>
 #include <sys/wait.h>
@@ -9,11 +10,13 @@
 
 #include <gmock/gmock.h>
 
+#include "platform/ipc/FrameText.h"
 #include "platform/jobs/LauncherProgram.h"
 #include "tests/launcher/Host.h"
 #include "tests/support/Files.h"
 
 using namespace tests;
+namespace ipc = platform::ipc;
 using platform::describe;
 using platform::Dictionary;
 using platform::Launcher;
@@ -114,29 +117,31 @@ TEST(LauncherTest, theWholeTreeEnds) {
         {"ignore", "orphan", "stubborn"},
         {"session"},
         {"session orphan", "ignore"},
-        {"stop"},
         {"child", "child", "stubborn", "orphan", "session", "session orphan", "child"},
+        {"stop"}, // itself: it cannot be told anything then
     };
     for (const bool byItself : {false, true}) {
+        std::vector<Launched> runs;
+        std::vector<std::vector<Other>> processes;
         for (const auto& tree : trees) {
-            Launched run = host.start();
-            std::vector<Other> all;
+            Launched& run = runs.emplace_back(host.start());
+            std::vector<Other>& all = processes.emplace_back();
             all.emplace_back(run.started()->pid);
             for (const std::string& kind : tree)
-                if (kind == "ignore")
+                if (kind == "stop")
+                    run.say(kind);
+                else if (kind == "ignore")
                     run.ask(kind);
-                else if (kind == "stop") // stops the one that answers
-                    (void)::send(run.socket.get(), "stop\n", 5, MSG_NOSIGNAL);
                 else
                     all.push_back(run.make(kind));
-            if (byItself && tree != trees[6])
-                (void)::send(run.socket.get(), "exit\n", 5, MSG_NOSIGNAL);
-            else
-                host.end(run);
-            ASSERT_TRUE(run.ended.comes()) << testing::PrintToString(tree);
-            for (const Other& each : all)
-                EXPECT_FALSE(each.isThere()) << testing::PrintToString(tree);
-            host.end(run); // of no consequence
+        }
+        for (std::size_t i = 0; i < trees.size(); ++i)
+            byItself&& trees[i] != trees.back() ? runs[i].say("exit") : host.end(runs[i]);
+        for (std::size_t i = 0; i < trees.size(); ++i) {
+            ASSERT_TRUE(runs[i].ended.comes()) << testing::PrintToString(trees[i]);
+            for (const Other& each : processes[i])
+                EXPECT_FALSE(each.isThere()) << testing::PrintToString(trees[i]);
+            host.end(runs[i]); // of no consequence
         }
     }
     EXPECT_EQ(childrenOf(host.launcherPid()), "");
@@ -191,6 +196,66 @@ TEST(LauncherTest, aDeadOwnerTakesAllWithIt) {
         EXPECT_TRUE(each.vanishes());
 }
 
+// Instead of the launcher: nothing, a program that ends at once, and one that talks nonsense.
+TEST(LauncherTest, withoutALauncherALaunchFails) {
+    for (const auto& [program, error] :
+         {std::pair(std::string("/nonexistent"), ENOENT),
+          std::pair(std::string("/bin/true"), ECONNRESET),
+          std::pair(Host::programs() + "/launcher_probe", ECONNRESET)}) {
+        Host host(program);
+        const Launched run = host.launch(host.usual());
+        ASSERT_TRUE(run.error()) << program;
+        EXPECT_EQ(run.error()->code, error) << describe(*run.error());
+    }
+}
+
+TEST(LauncherTest, theLauncherEndsOnAnOrderThatMeansNothing) {
+    const auto frame = [](ipc::FrameKind kind, const Dictionary& message) {
+        return std::string(ipc::FrameText(kind, 0, message).text());
+    };
+    const auto order = [&](const Dictionary& message) {
+        return frame(ipc::FrameKind::oneWay, message);
+    };
+    const Dictionary launch{{"launch", 1U},
+                            {"path", "/bin/true"},
+                            {"environment", Dictionary()},
+                            {"profile", "plugin"},
+                            {"bundle", "/"}};
+    auto asRoot = launch;
+    asRoot.set("user", 0U);
+    auto numbered = launch;
+    numbered.set("path", 5);
+
+    const struct {
+        std::string bytes;
+        bool ends = true;
+    } cases[] = {
+        {order({{"end", 1U}}), false}, // one that is gone
+        {order(launch).substr(0, 40), false},
+        {order(launch)}, // without descriptors
+        {order(asRoot)},
+        {order(numbered)},
+        {order({{"end", "1"}})},
+        {order({})},
+        {frame(ipc::FrameKind::request, {{"end", 1U}})},
+        {std::string(100, 'x')},
+        {order(launch).replace(20, 4, "\xff\xff\xff\xff")},
+    };
+
+    for (const auto& each : cases) {
+        auto launcher = platform::launcher::startLauncher(Host::programs() + "/zpd-launcher");
+        ASSERT_TRUE(launcher) << describe(launcher.error());
+        Other process(launcher->pid);
+        ::send(launcher->socket.get(), each.bytes.data(), each.bytes.size(), MSG_NOSIGNAL);
+        if (!each.ends) {
+            ::usleep(20'000);
+            EXPECT_TRUE(process.isThere());
+            launcher->socket.reset();
+        }
+        EXPECT_TRUE(process.vanishes()) << testing::PrintToString(each.bytes);
+    }
+}
+
 TEST(LauncherTest, aHundredStartsLeaveNothing) {
     Host host;
     const Launched first = host.start(); // what is made once is there
@@ -209,4 +274,21 @@ TEST(LauncherTest, aHundredStartsLeaveNothing) {
     }
     EXPECT_EQ(descriptorsOf(host.launcherPid()), launchers);
     EXPECT_EQ(descriptorsOf(::getpid()), own);
+}
+
+// Which differs most: no user of its own, nothing that only root may do.
+TEST(LauncherTest, allOfItHoldsForAnOrdinaryUserToo) {
+    if (!isRoot())
+        return; // it was seen already
+    constexpr uid_t ordinary = 12345;
+    const pid_t child = ::fork();
+    if (child == 0) {
+        if (::setgroups(0, nullptr) == 0 && ::setresgid(ordinary, ordinary, ordinary) == 0 &&
+            ::setresuid(ordinary, ordinary, ordinary) == 0)
+            ::execl("/proc/self/exe", "test_launcher", "--gtest_filter=-*OrdinaryUser*", nullptr);
+        ::_exit(1);
+    }
+    int status = 0;
+    ASSERT_EQ(::waitpid(child, &status, 0), child);
+    EXPECT_EQ(status, 0);
 }

@@ -148,8 +148,10 @@ const std::map<std::string, std::function<std::string()>> commands{
 int main(int, char* argv[]) {
     program = argv[0];
     const char* number = std::getenv("ZEPHRIN_SOCKET");
-    if (!number)
-        return 1;
+    if (!number) { // it is taken for a launcher
+        (void)!::write(3, "this is no frame of any kind", 28);
+        stay();
+    }
     peer = std::atoi(number);
     say("ready");
     for (std::string line = nextLine(); !line.empty(); line = nextLine()) {
