@@ -92,7 +92,7 @@ JobHosts::Found JobHosts::find(const ipc::Peer& process, const ServiceChoice& ch
         return {};
     const auto fits = [&](const auto& service) {
         const ExternalService& what = service->what;
-        return what.identifier == choice.identifier &&
+        return (!choice.identifier || what.identifier == *choice.identifier) &&
                (!choice.version || what.version == *choice.version) &&
                (!choice.uuid || what.uuid == *choice.uuid);
     };

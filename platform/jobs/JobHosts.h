@@ -30,9 +30,9 @@ struct JobHost {
 
 // Names one of the services that were added for a host: the one added last, of those that fit.
 struct ServiceChoice {
-    std::string identifier;
-    std::optional<std::string> version;
-    std::optional<Uuid> uuid;
+    std::optional<std::string> identifier; // of the bundle
+    std::optional<std::string> version;    // of the bundle
+    std::optional<Uuid> uuid;              // of the registration
 };
 
 // Which host may start what. Owned by the job manager, whose mutex guards it.

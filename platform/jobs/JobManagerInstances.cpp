@@ -51,6 +51,10 @@ Dictionary formOf(const JobInstance& instance) {
     return form;
 }
 
+std::string nameOf(const ServiceChoice& choice) {
+    return choice.identifier ? *choice.identifier : describe(Value(choice.uuid.value_or(Uuid{})));
+}
+
 Error cannotStart(const JobService& service, const Error& why) {
     return jobError(jobErrorRefused,
                     log::renderText("cannot start plug-in %@: %@", service.what.identifier,
@@ -104,7 +108,7 @@ std::expected<JobManager::Prepared, Error> JobManager::prepare(const ipc::Peer& 
     if (!instance.service) {
         return std::unexpected(jobError(
             jobErrorNotFound,
-            log::renderText("plug-in %@ was not made ready for this process", choice.identifier)));
+            log::renderText("plug-in %@ was not made ready for this process", nameOf(choice))));
     }
     if (!mayStart(host)) {
         return std::unexpected(

@@ -29,12 +29,14 @@ std::optional<std::string> textFor(const Dictionary& body, std::string_view key)
 
 // A choice that is there must be of its type: to start something else would help nobody.
 std::expected<ServiceChoice, Error> choiceIn(const Dictionary& body) {
-    const auto identifier = textFor(body, "identifier");
+    const Value* const identifier = body.find("identifier");
     const Value* const version = body.find("version");
     const Value* const uuid = body.find("uuid");
-    if (!identifier || (version && !version->string()) || (uuid && !uuid->uuid()))
+    if ((identifier && !identifier->string()) || (version && !version->string()) ||
+        (uuid && !uuid->uuid()) || (!identifier && !uuid))
         return std::unexpected(jobError(jobErrorRefused, "invalid request format"));
-    return ServiceChoice{*identifier, textFor(body, "version"), uuid ? uuid->uuid() : std::nullopt};
+    return ServiceChoice{textFor(body, "identifier"), textFor(body, "version"),
+                         uuid ? uuid->uuid() : std::nullopt};
 }
 
 void fail(ipc::Reply& reply, const Error& error) {
