@@ -17,7 +17,7 @@ ARPass::ARPass(const Parts& parts, Apply apply)
       number_(model_.beginPass()),
       batchBegan_(std::chrono::steady_clock::now()) {}
 
-void ARPass::run(const platform::Places& places, ARDepth depth, const ARKeptPaths::Paths& kept) {
+void ARPass::run(const platform::Places& places, ARDepth depth, const ARKeptFacts::Facts& kept) {
     full_ = true;
     keptAway_.insert(kept.withdrawn.begin(), kept.withdrawn.end());
     watches_.beginFullPass(depth);

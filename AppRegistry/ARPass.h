@@ -13,7 +13,7 @@
 #include "AppRegistry/ARBundleFiles.h"
 #include "AppRegistry/ARBundleReader.h"
 #include "AppRegistry/ARComplaints.h"
-#include "AppRegistry/ARKeptPaths.h"
+#include "AppRegistry/ARKeptFacts.h"
 #include "AppRegistry/ARModel.h"
 #include "AppRegistry/ARScanner.h"
 #include "AppRegistry/ARStore.h"
@@ -61,7 +61,7 @@ public:
     ARPass(const Parts& parts, Apply apply);
 
     // Looks at everything; what was not met is gone. `kept` is what a lost database knew of paths.
-    void run(const platform::Places& places, ARDepth depth, const ARKeptPaths::Paths& kept = {});
+    void run(const platform::Places& places, ARDepth depth, const ARKeptFacts::Facts& kept = {});
     // Looks at single items.
     void look(const std::vector<std::string>& items);
     // Registers one plug-in by canonical path, with the application that it lies in; it stays until

@@ -5,6 +5,7 @@
 
 #include "AppRegistry/ARGrants.h"
 #include "AppRegistry/ARInfoCache.h"
+#include "AppRegistry/ARPlugInUsers.h"
 
 namespace platform {
 class Containers;
@@ -41,5 +42,6 @@ struct ARProxyContext {
     platform::Containers& containers;
     ARInfoCache infos;
     ARGrants grants;
+    ARPlugInUsers users;
     ARPublished published;
 };

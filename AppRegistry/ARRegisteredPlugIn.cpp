@@ -50,12 +50,16 @@ std::optional<std::string> ARRegisteredPlugIn::localizedShortName() const {
 }
 
 std::optional<std::string> ARRegisteredPlugIn::dataContainerPath() const {
-    auto made = context_->containers.dataContainer(row_->identifier.view());
+    auto made = context_->containers.dataContainer(row_->identifier.view(), userIdentifier());
     if (made)
         return std::move(*made);
     ARLog().error("no data container for %{public}@: %{public}@", row_->identifier.view(),
                   made.error());
     return std::nullopt;
+}
+
+std::optional<uid_t> ARRegisteredPlugIn::userIdentifier() const {
+    return context_->users.of(row_->identifier.view());
 }
 
 std::optional<std::string> ARRegisteredPlugIn::bundleIdentifier() const {

@@ -41,6 +41,7 @@ public:
     [[nodiscard]] ARApplicationProxy::Ptr containingBundle() const override { return application_; }
 
     [[nodiscard]] std::optional<std::string> dataContainerPath() const override;
+    [[nodiscard]] std::optional<uid_t> userIdentifier() const override;
     [[nodiscard]] std::optional<std::string> bundleIdentifier() const override;
     [[nodiscard]] std::optional<std::string> bundleVersion() const override;
 

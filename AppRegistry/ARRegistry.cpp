@@ -1,5 +1,7 @@
 #include "AppRegistry/ARRegistry.h"
 
+#include <unistd.h>
+
 #include "AppRegistry/ARLog.h"
 #include "AppRegistry/ARPass.h"
 #include "platform/bundle/InfoKeys.h"
@@ -25,7 +27,12 @@ ARRegistry::open(platform::Places places, platform::Locale& locale,
     const std::shared_ptr<ARStore> store = std::move(opened->store);
     const bool isComplete = opened->content.complete;
     const std::shared_ptr<ARProxyContext> context(
-        new ARProxyContext{locale, containers, ARInfoCache(store), ARGrants(store, signing), {}});
+        new ARProxyContext{locale,
+                           containers,
+                           ARInfoCache(store),
+                           ARGrants(store, signing),
+                           ARPlugInUsers(containers, ::geteuid() == 0),
+                           {}});
     std::unique_ptr<ARRegistry> registry(
         new ARRegistry(std::move(places), store, std::move(opened->content), context, types));
     registry->lock_ = std::move(opened->lock);
@@ -42,15 +49,18 @@ ARRegistry::ARRegistry(platform::Places places, std::shared_ptr<ARStore> store,
       context_(std::move(context)),
       types_(types),
       committer_(store_),
-      keptPaths_(ARFileBeside(places_.registryDatabase, ARKeptPaths::fileSuffix)),
+      keptFacts_(ARFileBeside(places_.registryDatabase, ARKeptFacts::fileSuffix)),
       editor_(places_, context_),
       knowledge_(content.knowledge) {
     model_.fill(std::move(content.rows));
+    context_->users.knowStored(content.users);
+    context_->users.onNew([this] { queue_.async([this] { storeNewUsers(); }); });
     context_->grants.onLearnt([this] { queue_.async([this] { storeLearntGrants(); }); });
 }
 
 ARRegistry::~ARRegistry() {
     context_->grants.onLearnt({});
+    context_->users.onNew({});
     queue_.sync([] {}); // what is queued still comes first
     context_->published.set(nullptr);
 }
@@ -67,16 +77,18 @@ auto ARRegistry::pass(Act&& act, Apply&& apply) {
 // A new database learns from the file beside it what the folders do not tell, and is complete only
 // then: what a crash left behind half made counts as new again.
 void ARRegistry::firstPass(bool isComplete) {
-    const ARKeptPaths::Paths kept = keptPaths_.read();
+    const ARKeptFacts::Facts kept = keptFacts_.read();
+    if (!isComplete)
+        context_->users.know(kept.users);
     pass(
         [&](ARPass& pass) {
-            pass.run(places_, ARDepth::roots, isComplete ? ARKeptPaths::Paths() : kept);
+            pass.run(places_, ARDepth::roots, isComplete ? ARKeptFacts::Facts() : kept);
         },
         [this](ARBatch&& batch) {
             store(batch);
             return true;
         });
-    keptPaths_.keep(model_);
+    keptFacts_.keep(model_, context_->users);
     if (!isComplete)
         committer_.markComplete();
     publish(editor_.build(model_.pick([](const ARModel::Entry&) { return true; })));
@@ -108,10 +120,17 @@ void ARRegistry::storeLearntGrants() {
     store(batch);
 }
 
+void ARRegistry::storeNewUsers() {
+    ARBatch batch;
+    batch.changes.users = context_->users.takeNew();
+    store(batch);
+    keptFacts_.keep(model_, context_->users);
+}
+
 // What is stored is shown to readers, and then to the observer. REQUIRES: readers are held.
 void ARRegistry::show(const ARBatch& batch) {
     if (batch.pathsChanged)
-        keptPaths_.keep(model_);
+        keptFacts_.keep(model_, context_->users);
     auto next = std::make_shared<ARSnapshot>(*context_->published.get());
     const auto outcome = editor_.apply(*next, batch);
     store_->releaseReaders([&] { publish(std::move(next)); });

@@ -10,7 +10,7 @@
 #include "AppRegistry/ARApplicationWorkspace.h"
 #include "AppRegistry/ARCommitter.h"
 #include "AppRegistry/ARComplaints.h"
-#include "AppRegistry/ARKeptPaths.h"
+#include "AppRegistry/ARKeptFacts.h"
 #include "AppRegistry/ARModel.h"
 #include "AppRegistry/ARProxyContext.h"
 #include "AppRegistry/ARSnapshotEditor.h"
@@ -88,6 +88,7 @@ private:
     void store(ARBatch& batch);
     [[nodiscard]] bool storeNow(ARBatch& batch);
     void storeLearntGrants();
+    void storeNewUsers();
     void show(const ARBatch& batch);
     bool storeAndShow(ARBatch&& batch);
     void lookAtEverything();
@@ -111,7 +112,7 @@ private:
 
     // On the queue.
     ARCommitter committer_;
-    ARKeptPaths keptPaths_;
+    ARKeptFacts keptFacts_;
     ARModel model_;
     ARComplaints complaints_;
     ARWatches watches_; // locks by itself

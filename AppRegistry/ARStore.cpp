@@ -65,6 +65,7 @@ ARStore::Impl::Impl(ARSqlConnection writing, ARSqlConnection reading)
                            " VALUES (?1, ?2, ?3, ?4)"),
       updateSignature(writer, "UPDATE signatures SET key = ?2, entitlements = ?3 WHERE id = ?1"),
       removeSignature(writer, "DELETE FROM signatures WHERE id = ?1"),
+      putUser(writer, "INSERT OR REPLACE INTO users (identifier, user) VALUES (?1, ?2)"),
       setKnowledge(writer, "UPDATE knowledge SET sequence = ?1, uuid = ?2 WHERE id = 1"),
       selectDigests(writer, "SELECT digests FROM details WHERE id = ?1"),
       reader(std::move(reading)),
@@ -76,7 +77,7 @@ ARStore::Impl::Impl(ARSqlConnection writing, ARSqlConnection reading)
 int ARStore::Impl::prepared() const {
     for (const ARSqlStatement* statement :
          {&begin, &end, &rollback, &insertEntry, &insertDetail, &updateEntry, &removeEntry,
-          &removeDetail, &putSignature, &updateSignature, &removeSignature, &setKnowledge,
+          &removeDetail, &putSignature, &updateSignature, &removeSignature, &putUser, &setKnowledge,
           &selectDigests, &selectInfo, &selectSignature}) {
         if (statement->prepared() != SQLITE_OK)
             return statement->prepared();
@@ -128,6 +129,15 @@ int ARStore::Impl::writeSignatures(const ARStoreChanges& changes) {
     return SQLITE_OK;
 }
 
+int ARStore::Impl::writeUsers(std::span<const ARPlugInUser> users) {
+    for (const auto& [identifier, user] : users) {
+        const int code = putUser.run(std::string_view(identifier), std::int64_t{user});
+        if (code != SQLITE_OK)
+            return code;
+    }
+    return SQLITE_OK;
+}
+
 int ARStore::Impl::setTo(const ARKnowledge& known) {
     const auto uuid = known.uuid ? std::optional(ARBytesOf(known.uuid->bytes))
                                  : std::optional<std::string_view>();
@@ -148,6 +158,8 @@ int ARStore::Impl::write(const ARStoreChanges& changes) {
             return code;
     }
     if (const int code = writeSignatures(changes); code != SQLITE_OK)
+        return code;
+    if (const int code = writeUsers(changes.users); code != SQLITE_OK)
         return code;
     return setTo(changes.knowledge);
 }

@@ -12,6 +12,7 @@
 
 #include "AppRegistry/ARApplicationWorkspace.h"
 #include "AppRegistry/ARBundleRow.h"
+#include "AppRegistry/ARPlugInUsers.h"
 #include "AppRegistry/ARSignature.h"
 #include "platform/file/File.h"
 #include "platform/value/Error.h"
@@ -34,11 +35,12 @@ struct ARStoreChanges {
     std::vector<ARSignatureOfEntry> signatures;
     // What came out when signatures that are stored were judged again; their content stays.
     std::vector<ARSignatureOfEntry> judgedAgain;
-    ARKnowledge knowledge; // after the change
+    std::vector<ARPlugInUser> users; // that were given
+    ARKnowledge knowledge;           // after the change
 
     [[nodiscard]] bool empty() const {
         return added.empty() && updated.empty() && removed.empty() && signatures.empty() &&
-               judgedAgain.empty();
+               judgedAgain.empty() && users.empty();
     }
 };
 
@@ -60,6 +62,7 @@ class ARStore {
 public:
     struct Content {
         std::vector<ARBundleRow> rows; // in order of registration
+        std::vector<ARPlugInUser> users;
         ARKnowledge knowledge;
         bool complete = false; // see markComplete
     };

@@ -28,6 +28,7 @@ struct ARStore::Impl {
     [[nodiscard]] int update(const ARBundleRow& row);
     [[nodiscard]] int remove(std::int64_t id);
     [[nodiscard]] int writeSignatures(const ARStoreChanges& changes);
+    [[nodiscard]] int writeUsers(std::span<const ARPlugInUser> users);
     [[nodiscard]] int setTo(const ARKnowledge& known);
 
     // Brings a log that became long into the database file, so that the next commit begins it
@@ -46,6 +47,7 @@ struct ARStore::Impl {
     ARSqlStatement putSignature;
     ARSqlStatement updateSignature;
     ARSqlStatement removeSignature;
+    ARSqlStatement putUser;
     ARSqlStatement setKnowledge;
     ARSqlStatement selectDigests;
     int logPages = 0;         // after the last commit

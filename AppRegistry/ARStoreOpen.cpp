@@ -15,7 +15,7 @@
 namespace {
 
 // Raised with every change of the tables. An older database is upgraded, a newer one rebuilt.
-constexpr std::int64_t schemaVersion = 2;
+constexpr std::int64_t schemaVersion = 3;
 constexpr int waitForOtherProcessMilliseconds = 5000;
 constexpr ::mode_t lockMode = 0600;
 constexpr int mostDaemons = 8; // on one home at a time
@@ -44,7 +44,13 @@ constexpr const char* version2 =
     " WHERE kind = 1 AND length(stamps) = 72 AND substr(stamps, 49, 8) <> zeroblob(8);"
     "PRAGMA user_version = 2;"
     "COMMIT;";
-constexpr const char* upgrades[schemaVersion] = {version1, version2}; // each from the one before
+constexpr const char* version3 =
+    "BEGIN;"
+    "CREATE TABLE users (identifier BLOB PRIMARY KEY, user INTEGER NOT NULL UNIQUE);"
+    "PRAGMA user_version = 3;"
+    "COMMIT;";
+constexpr const char* upgrades[schemaVersion] = {version1, version2,
+                                                 version3}; // each from the one before
 
 // The first checkpoint is made by the registry, once it has looked at everything.
 constexpr const char* writerSettings =
@@ -232,6 +238,11 @@ std::expected<ARStore::Content, ARStoreFailure> ARStore::load() {
         content.rows.push_back(std::move(*row));
         code = SQLITE_OK;
     }
+    if (code != SQLITE_DONE)
+        return std::unexpected(failure(code));
+    ARSqlStatement users(impl_->writer, "SELECT identifier, user FROM users");
+    while ((code = users.step()) == SQLITE_ROW)
+        content.users.emplace_back(users.bytes(0), static_cast<uid_t>(users.integer(1)));
     if (code != SQLITE_DONE)
         return std::unexpected(failure(code));
     const auto mark = firstNumber(impl_->writer, "PRAGMA application_id");

@@ -3,6 +3,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <sys/types.h>
 #include <vector>
 
 #include "AppRegistry/ARApplicationProxy.h"
@@ -40,6 +41,9 @@ public:
     [[nodiscard]] virtual ARApplicationProxy::Ptr containingBundle() const = 0;
     // The plug-in's data container, made if missing.
     [[nodiscard]] virtual std::optional<std::string> dataContainerPath() const = 0;
+    // The user id that its processes run as, and that the container belongs to. Nothing when the
+    // daemon does not run as root: then they run as its own user.
+    [[nodiscard]] virtual std::optional<uid_t> userIdentifier() const = 0;
     // "BQBundleIdentifier" and "BQBundleVersion".
     [[nodiscard]] virtual std::optional<std::string> bundleIdentifier() const = 0;
     [[nodiscard]] virtual std::optional<std::string> bundleVersion() const = 0;

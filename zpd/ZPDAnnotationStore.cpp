@@ -156,7 +156,7 @@ std::string ZPDAnnotationStore::defaultDatabasePath() {
 }
 
 std::expected<std::string, Error> ZPDAnnotationStore::containerPath() const {
-    auto container = containers_.dataContainer(olderContainer);
+    auto container = containers_.dataContainer(olderContainer, std::nullopt);
     if (container)
         return *container + storeFile;
     const auto code = static_cast<std::uint64_t>(container.error().code);

@@ -2,14 +2,44 @@
 
 #include <cerrno>
 #include <fcntl.h>
+#include <filesystem>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include "platform/file/File.h"
 
 namespace platform {
 
-std::expected<std::string, Error> FolderContainers::dataContainer(std::string_view identifier) {
-    constexpr mode_t privateMode = 0700;
+namespace {
+
+constexpr mode_t privateMode = 0700;
+
+// 0, or an errno value.
+int giveFolder(int folder, uid_t owner) {
+    struct ::stat status{};
+    if (::fstat(folder, &status) != 0)
+        return errno;
+    if (status.st_uid == owner && status.st_gid == owner)
+        return 0;
+    return ::fchown(folder, owner, owner) == 0 ? 0 : errno;
+}
+
+// A container and its "tmp". The latter first, while the former is not the plug-in's yet; one that
+// a plug-in put something else in place of is left as it is.
+int give(int container, uid_t owner) {
+    const UniqueFd temporary(
+        ::openat(container, "tmp", O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    if (temporary) {
+        if (const int failed = giveFolder(temporary.get(), owner))
+            return failed;
+    }
+    return giveFolder(container, owner);
+}
+
+} // namespace
+
+std::expected<std::string, Error> FolderContainers::dataContainer(std::string_view identifier,
+                                                                  std::optional<uid_t> owner) {
     if (!isPlainName(identifier))
         return std::unexpected(posixError(EINVAL, "container " + std::string(identifier)));
     if (auto error = makeFolders(folder_, 0755))
@@ -24,10 +54,23 @@ std::expected<std::string, Error> FolderContainers::dataContainer(std::string_vi
         return std::unexpected(posixError(errno, path));
     if (::mkdirat(container.get(), "tmp", privateMode) != 0 && errno != EEXIST)
         return std::unexpected(posixError(errno, path + "/tmp"));
+    if (const int failed = owner ? give(container.get(), *owner) : 0)
+        return std::unexpected(posixError(failed, path));
     const auto canonical = canonicalPath(path);
     if (!canonical)
         return std::unexpected(posixError(canonical.error(), path));
     return *canonical;
+}
+
+std::vector<std::pair<std::string, uid_t>> FolderContainers::owners() {
+    std::vector<std::pair<std::string, uid_t>> found;
+    std::error_code failed;
+    for (const auto& entry : std::filesystem::directory_iterator(folder_, failed)) {
+        struct ::stat status{};
+        if (::lstat(entry.path().c_str(), &status) == 0 && S_ISDIR(status.st_mode))
+            found.emplace_back(entry.path().filename(), status.st_uid);
+    }
+    return found;
 }
 
 } // namespace platform

@@ -13,7 +13,8 @@ public:
     explicit FolderContainers(std::string folder) : folder_(std::move(folder)) {}
 
     [[nodiscard]] std::expected<std::string, Error>
-    dataContainer(std::string_view identifier) override;
+    dataContainer(std::string_view identifier, std::optional<uid_t> owner) override;
+    [[nodiscard]] std::vector<std::pair<std::string, uid_t>> owners() override;
 
 private:
     const std::string folder_;

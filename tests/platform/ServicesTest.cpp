@@ -100,13 +100,13 @@ TEST(FileNotifications, NeverWaitAndNeverLeaveTheirFolder) {
 TEST(FolderContainers, MakesAPrivateFolderOnce) {
     const TestFolder folder;
     FolderContainers containers(folder / "lib/Containers");
-    const auto made = containers.dataContainer("com.x.app");
+    const auto made = containers.dataContainer("com.x.app", std::nullopt);
     ASSERT_TRUE(made);
     EXPECT_EQ(*made, folder / "lib/Containers/com.x.app");
     EXPECT_EQ(modeOf(*made), 0700U);
     EXPECT_EQ(modeOf(*made + "/tmp"), 0700U);
     folder.write("lib/Containers/com.x.app/file", "kept");
-    EXPECT_EQ(containers.dataContainer("com.x.app").value_or("none"), *made);
+    EXPECT_EQ(containers.dataContainer("com.x.app", std::nullopt).value_or("none"), *made);
     EXPECT_TRUE(fs::exists(*made + "/file"));
 }
 
@@ -120,9 +120,9 @@ TEST(FolderContainers, RefusesWhatWouldLeadElsewhere) {
     const std::string_view identifiers[] = {
         "", ".", "..", "a/b", "/a", std::string_view("a\0b", 3), "a\nb", "link", "file"};
     for (const auto identifier : identifiers)
-        EXPECT_FALSE(containers.dataContainer(identifier)) << identifier;
-    EXPECT_FALSE(containers.dataContainer(std::string(256, 'a')));
-    EXPECT_TRUE(containers.dataContainer(std::string(255, 'a')));
+        EXPECT_FALSE(containers.dataContainer(identifier, std::nullopt)) << identifier;
+    EXPECT_FALSE(containers.dataContainer(std::string(256, 'a'), std::nullopt));
+    EXPECT_TRUE(containers.dataContainer(std::string(255, 'a'), std::nullopt));
     EXPECT_TRUE(fs::is_empty(folder / "elsewhere"));
 }
 

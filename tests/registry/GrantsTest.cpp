@@ -170,7 +170,7 @@ TEST_F(Grants, AnOlderDatabaseIsUpgradedWithoutLoss) {
     ASSERT_FALSE(registry->unregisterPlugin(home / two));
     const std::vector before{uuidOf(one), uuidOf(outside)};
     const auto knowledge = registry->knowledge();
-    execute("DROP TABLE signatures; PRAGMA user_version = 1");
+    execute("DROP TABLE users; DROP TABLE signatures; PRAGMA user_version = 1");
     verified();
 
     EXPECT_EQ(open(), "");

@@ -3,7 +3,7 @@
 #include <fstream>
 #include <sys/resource.h>
 
-#include "AppRegistry/ARKeptPaths.h"
+#include "AppRegistry/ARKeptFacts.h"
 #include "AppRegistry/ARStore.h"
 #include "tests/registry/RegistryFixture.h"
 
@@ -217,17 +217,17 @@ TEST_F(Registration, KeepsPathsOfAnyBytesBesideTheDatabase) {
     EXPECT_FALSE(registry->registerPlugin(home / outside));
     EXPECT_FALSE(registry->unregisterPlugin(home / inside));
     registry.reset();
-    const std::string file = ARFileBeside(places.registryDatabase, ARKeptPaths::fileSuffix);
-    EXPECT_EQ(ARKeptPaths(file).read(),
-              (ARKeptPaths::Paths{{home / odd, home / outside}, {home / inside}}));
+    const std::string file = ARFileBeside(places.registryDatabase, ARKeptFacts::fileSuffix);
+    EXPECT_EQ(ARKeptFacts(file).read(),
+              (ARKeptFacts::Facts{{home / odd, home / outside}, {home / inside}, {}}));
     for (const char* content :
          {"", "broken", "<plist><dict><key>version</key><integer>2</integer></dict></plist>"}) {
         std::ofstream(file) << content;
         const std::string log =
-            logOf([&] { EXPECT_EQ(ARKeptPaths(file).read(), ARKeptPaths::Paths()); });
+            logOf([&] { EXPECT_EQ(ARKeptFacts(file).read(), ARKeptFacts::Facts()); });
         EXPECT_NE(log.find("ignoring " + file), std::string::npos) << log;
     }
     open(); // the database still knows, and the file is well again
     EXPECT_EQ(identifiers(), (Strings{"odd", "out"}));
-    EXPECT_EQ(ARKeptPaths(file).read().added.size(), 2u);
+    EXPECT_EQ(ARKeptFacts(file).read().added.size(), 2u);
 }

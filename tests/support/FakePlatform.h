@@ -180,12 +180,14 @@ struct FakeContainers final : platform::Containers {
     std::vector<std::string> asked;
 
     std::expected<std::string, platform::Error>
-    dataContainer(std::string_view identifier) override {
+    dataContainer(std::string_view identifier, std::optional<uid_t> /*owner*/) override {
         asked.emplace_back(identifier);
         if (failure)
             return std::unexpected(*failure);
         return folder + "/" + std::string(identifier);
     }
+
+    std::vector<std::pair<std::string, uid_t>> owners() override { return {}; }
 };
 
 struct FakeLocale final : platform::Locale {

@@ -41,6 +41,7 @@ struct FakePlugIn final : ARZephrinProxy {
     std::shared_ptr<FakeApplication> application;
     std::optional<std::string> container = "/containers/com.example.sample";
     std::optional<std::string> version = "7";
+    std::optional<uid_t> user;
 
     const platform::Uuid& plugInUUID() const override { return uuid; }
 
@@ -70,6 +71,8 @@ struct FakePlugIn final : ARZephrinProxy {
     ARApplicationProxy::Ptr containingBundle() const override { return application; }
 
     std::optional<std::string> dataContainerPath() const override { return container; }
+
+    std::optional<uid_t> userIdentifier() const override { return user; }
 
     std::optional<std::string> bundleIdentifier() const override { return identifier; }
 
