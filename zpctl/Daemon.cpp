@@ -14,24 +14,32 @@ namespace zpctl {
 
 namespace {
 
-using platform::Dictionary;
-using platform::Uuid;
-using platform::Value;
-using platform::ipc::ConnectionError;
-
 std::string secondsText(std::chrono::milliseconds time) {
     char text[32];
     std::snprintf(text, sizeof text, "%g s", static_cast<double>(time.count()) / 1000);
     return text;
 }
 
+} // namespace
+
 Failure noAnswer(std::chrono::milliseconds timeout) {
     return {Status::noDaemon, "the daemon did not answer within " + secondsText(timeout), {}};
 }
 
+Failure goneWhileAsked() {
+    return {Status::noDaemon, "the daemon went away while it was asked", {}};
+}
+
+namespace {
+
+using platform::Dictionary;
+using platform::Uuid;
+using platform::Value;
+using platform::ipc::ConnectionError;
+
 Failure disconnected(ConnectionError error, const std::string& socketPath) {
     if (error == ConnectionError::interrupted)
-        return {Status::noDaemon, "the daemon went away while it was asked", {}};
+        return goneWhileAsked();
     const bool tooLong = socketPath.size() > platform::ipc::longestSocketPath;
     const char* why = tooLong ? " (the path is too long for a socket)" : "";
     return {Status::noDaemon, "no daemon at " + socketPath + why, {}};

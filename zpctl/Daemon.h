@@ -22,6 +22,10 @@ struct Failure {
     std::vector<std::string> conflicts = {}; // identifiers of the busy plug-ins, when that is why
 };
 
+// What is said when the daemon is silent, or gone.
+[[nodiscard]] Failure noAnswer(std::chrono::milliseconds timeout);
+[[nodiscard]] Failure goneWhileAsked();
+
 // A connection to the daemon for a tool that asks and waits. Replies arrive on the client
 // library's queue; every call here blocks its thread until then, or until the time is up. Owned by
 // the session; one thread.

@@ -15,13 +15,21 @@ bool Terminal::readerIsGone() const {
     return ::poll(&watched, 1, 0) > 0;
 }
 
+std::chrono::milliseconds Session::timeout() const {
+    const std::chrono::duration<double> seconds(options_.timeout);
+    return std::chrono::duration_cast<std::chrono::milliseconds>(seconds);
+}
+
 Daemon& Session::daemon() {
-    if (!daemon_) {
-        const std::chrono::duration<double> timeout(options_.timeout);
-        daemon_ = std::make_unique<Daemon>(
-            options_.service, std::chrono::duration_cast<std::chrono::milliseconds>(timeout));
-    }
+    if (!daemon_)
+        daemon_ = std::make_unique<Daemon>(options_.service, timeout());
     return *daemon_;
+}
+
+Jobs& Session::jobs() {
+    if (!jobs_)
+        jobs_ = std::make_unique<Jobs>(timeout());
+    return *jobs_;
 }
 
 Status Session::report(const nlohmann::ordered_json& json,

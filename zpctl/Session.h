@@ -11,6 +11,7 @@
 #include <nlohmann/json_fwd.hpp>
 
 #include "zpctl/Daemon.h"
+#include "zpctl/Jobs.h"
 #include "zpctl/Table.h"
 #include "zpctl/Verb.h"
 
@@ -47,6 +48,7 @@ public:
 
     // Made with the first call, so that verbs which need no daemon never look for one.
     [[nodiscard]] Daemon& daemon();
+    [[nodiscard]] Jobs& jobs();
 
     [[nodiscard]] std::ostream& out() const { return terminal_.out; }
 
@@ -69,10 +71,13 @@ public:
     Status fail(const Failure& failure) const;
 
 private:
+    [[nodiscard]] std::chrono::milliseconds timeout() const;
+
     const Options options_;
     const Terminal terminal_;
     const Paint paint_;
     std::unique_ptr<Daemon> daemon_;
+    std::unique_ptr<Jobs> jobs_;
 };
 
 } // namespace zpctl

@@ -73,6 +73,8 @@ TEST_F(CommandLine, RefusesWrongUsage) {
         {"hold", "--app"},
         {"hold", "--", "true"},
         {"release", "x"},
+        {"run", uuid, uuid},
+        {"ps", "x"},
     };
     for (const auto& arguments : cases) {
         SCOPED_TRACE(testing::PrintToString(arguments));
@@ -107,6 +109,8 @@ TEST_F(CommandLine, TellsWhenThereIsNoDaemon) {
         {"add", "/x.appex"},
         {"ready", uuid, uuid, "--env", "A=B", "--env", "C="},
         {"access", uuid},
+        {"run", uuid, "--env", "A=B"},
+        {"ps"},
         {"--timeout", "5", "hold", "--app", "--terminate", "/x.app", "--", "true", "--", "--app"},
         {"release", uuid},
     };

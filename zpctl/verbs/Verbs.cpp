@@ -12,6 +12,8 @@ std::span<const Verb> verbs() {
         {"annotate", "Set what is kept for a plug-in: the election and further settings",
          declareAnnotate},
         {"monitor", "Tell of each change of annotations as it comes", declareMonitor},
+        {"run", "Start a plug-in and talk to it", declareRun},
+        {"ps", "List the plug-ins that run", declarePs},
         {"ready", "Make plug-ins ready, or tell why not", declareReady},
         {"access", "Write tokens to read plug-ins' bundles", declareAccess},
         {"hold", "Keep plug-ins from being used, while a command runs or until interrupted",

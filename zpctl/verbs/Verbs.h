@@ -11,6 +11,8 @@ Action declareTree(CLI::App& command);
 Action declareElect(CLI::App& command);
 Action declareAnnotate(CLI::App& command);
 Action declareMonitor(CLI::App& command);
+Action declareRun(CLI::App& command);
+Action declarePs(CLI::App& command);
 Action declareReady(CLI::App& command);
 Action declareAccess(CLI::App& command);
 Action declareHold(CLI::App& command);
