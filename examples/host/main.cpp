@@ -1,7 +1,9 @@
 // A host application in little: asks the daemon which plug-ins it may use and prints them.
 //
-//   Cinema                        all of them
-//   Cinema com.example.artwork    those of one extension point
+//   Cinema                                 all of them
+//   Cinema com.example.artwork             those of one extension point
+//   Cinema com.example.artwork Sunrise     says "Sunrise" to the first of them, and prints what it
+//                                          answers
 //
 // As the program of an application bundle it shows one thing more: where its own application
 // contains a plug-in, the host sees that one and no other of the same identifier, however new.
@@ -9,18 +11,49 @@
 #include <cstdlib>
 #include <iostream>
 #include <string>
+#include <vector>
 
 #include "examples/host/PlugInList.h"
+#include "examples/host/Talk.h"
 
-int main(int argc, char** argv) {
-    const auto plugIns = example::plugInsAt(argc > 1 ? argv[1] : "");
-    if (!plugIns) {
-        std::cerr << argv[0] << ": " << plugIns.error() << '\n';
-        return EXIT_FAILURE;
-    }
-    for (const auto& plugIn : *plugIns)
+namespace {
+
+int complain(const std::string& what) {
+    std::cerr << what << '\n';
+    return EXIT_FAILURE;
+}
+
+void print(const std::vector<ZPPlugInCore::Ptr>& plugIns) {
+    for (const auto& plugIn : plugIns)
         std::cout << plugIn->identifier() << ' ' << plugIn->exportedVersion() << "  "
                   << plugIn->localizedName().value_or(plugIn->identifier()) << "  "
                   << plugIn->path() << '\n';
-    std::cout << plugIns->size() << (plugIns->size() == 1 ? " plug-in\n" : " plug-ins\n");
+    std::cout << plugIns.size() << (plugIns.size() == 1 ? " plug-in\n" : " plug-ins\n");
+}
+
+int talk(const ZPPlugInCore& plugIn, const std::vector<std::string>& lines) {
+    const auto answers = example::talkWith(plugIn, lines);
+    if (!answers)
+        return complain(answers.error());
+    for (const std::string& answer : *answers)
+        std::cout << plugIn.identifier() << ": " << answer << '\n';
+    const auto size = example::sizeByToken(plugIn, "Info.plist");
+    if (!size)
+        return complain(size.error());
+    std::cout << "its Info.plist has " << *size << " bytes, as read by token\n";
+    return EXIT_SUCCESS;
+}
+
+} // namespace
+
+int main(int argc, char** argv) {
+    const auto plugIns = example::plugInsAt(argc > 1 ? argv[1] : "");
+    if (!plugIns)
+        return complain(plugIns.error());
+    if (argc <= 2)
+        print(*plugIns);
+    else if (plugIns->empty())
+        return complain("no plug-in to talk to");
+    else
+        return talk(*plugIns->front(), std::vector<std::string>(argv + 2, argv + argc));
 }
