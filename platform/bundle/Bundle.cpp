@@ -36,6 +36,13 @@ std::expected<BundleReader, Error> BundleReader::read(const std::string& path) {
     return bundle;
 }
 
+BundleReader BundleReader::known(std::string canonicalPath, Value info) {
+    BundleReader bundle;
+    bundle.path_ = std::move(canonicalPath);
+    bundle.info_ = std::move(info);
+    return bundle;
+}
+
 BundleReader BundleReader::atPath(const std::string& path) {
     return read(path).value_or(BundleReader());
 }
@@ -88,6 +95,11 @@ std::optional<std::string> BundleReader::executablePath() const {
 
 std::optional<std::string> BundleReader::stringProperty(Property property) const {
     return property == Property::executablePath ? executablePath() : path_;
+}
+
+std::string describe(const BundleReader& bundle) {
+    const auto path = bundle.stringProperty(BundleReader::Property::bundlePath);
+    return "<BundleReader " + path.value_or("(null)") + ">";
 }
 
 } // namespace platform

@@ -23,6 +23,8 @@ public:
     [[nodiscard]] static std::expected<BundleReader, Error> read(const std::string& path);
     // The same; invalid when there is none.
     [[nodiscard]] static BundleReader atPath(const std::string& path);
+    // One whose Info.plist was read before: nothing but the executable is looked for again.
+    [[nodiscard]] static BundleReader known(std::string canonicalPath, Value info);
     // The nearest enclosing folder whose Info.plist names this very file as its executable.
     [[nodiscard]] static BundleReader forExecutable(const std::string& path);
     // The same for a program that someone else runs: nothing is read that others than root and
@@ -48,5 +50,8 @@ private:
     std::optional<std::string> path_; // canonical
     std::optional<Value> info_;
 };
+
+// "<BundleReader path>", for log lines.
+[[nodiscard]] std::string describe(const BundleReader& bundle);
 
 } // namespace platform
