@@ -45,7 +45,9 @@ struct World : RecordWorld {
     }
 
     platform::DeclaredTypes types{"/nonexistent/Types.plist"};
-    ZPDPlugInContext context{platform.workspace, platform.sandbox, types, annotations, keys};
+    ZPDPlugInContext context{
+        platform.workspace, platform.sandbox,    types,           annotations, keys,
+        platform.jobs,      platform.assertions, platform.consent};
     ZPDPlugIn::Ptr plugIn;
 };
 

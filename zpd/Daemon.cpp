@@ -11,6 +11,7 @@
 #include "AppRegistry/ARRegistry.h"
 #include "Zephrin/ZPDLog.h"
 #include "Zephrin/ZPPlugInCore.h"
+#include "platform/consent/FileConsent.h"
 #include "platform/container/FolderContainers.h"
 #include "platform/file/File.h"
 #include "platform/file/PathWatch.h"
@@ -84,6 +85,7 @@ struct Daemon::Parts {
     platform::DeclaredTypes types;
     platform::FilePreferences preferences;
     platform::FileNotifications notifications;
+    platform::FileConsent consent;
     platform::FolderContainers containers;
     platform::SystemLocale locale;
     platform::ipc::Loop jobsLoop{"jobs"};
@@ -105,6 +107,7 @@ Daemon::Parts::Parts(platform::Places where)
       types(places.types),
       preferences(places.preferences),
       notifications(places.notify),
+      consent(places.consent),
       containers(places.containers),
       locale(places.locale),
       trust(places.trust) {}
@@ -148,6 +151,7 @@ bool Daemon::Parts::makeServer(const ZPDOptions& options) {
                             .locale = locale,
                             .jobs = jobs,
                             .assertions = jobs,
+                            .consent = consent,
                             .workspace = *registry};
     auto made = ZPDServer::create(platform, {.socketPath = places.socketPath(options.serviceName),
                                              .databasePath = options.databasePath});

@@ -3,6 +3,7 @@
 namespace platform {
 class Assertions;
 class CodeSigning;
+class Consent;
 class Containers;
 class Jobs;
 class Locale;
@@ -29,5 +30,6 @@ struct Platform {
     platform::Locale& locale;
     platform::Jobs& jobs;
     platform::Assertions& assertions;
+    platform::Consent& consent;
     ARApplicationWorkspace& workspace;
 };

@@ -60,6 +60,11 @@ std::shared_ptr<Connection> ZPDIpcClient::connection() const {
     return acceptWork() ? connection_.lock() : nullptr;
 }
 
+bool ZPDIpcClient::isConnected() const {
+    const auto there = connection();
+    return there && there->isAlive();
+}
+
 std::optional<Value> ZPDIpcClient::entitlementValueForKey(std::string_view key) {
     server_.assertOnServiceQueue();
     if (!vouched_)

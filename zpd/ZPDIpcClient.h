@@ -2,6 +2,7 @@
 
 #include <atomic>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -42,7 +43,7 @@ public:
     [[nodiscard]] ZPDServer& server() const { return server_; }
 
     // Who connected; stays when the connection is gone.
-    [[nodiscard]] const platform::ipc::Peer& peer() const { return *peer_; }
+    [[nodiscard]] const std::shared_ptr<const platform::ipc::Peer>& peer() const { return peer_; }
 
     // 0 once the connection is gone.
     [[nodiscard]] pid_t pid() const { return pid_; }
@@ -67,6 +68,13 @@ public:
     [[nodiscard]] std::optional<platform::Value>
     entitlementValueForKey(std::string_view key) override;
     [[nodiscard]] bool hasEntitlement(std::string_view key) override;
+
+    // Carries out a part of a request that came back to the service queue: entitlements are those
+    // of whoever sent it. REQUIRES: on the service queue
+    void attend(const Transaction& transaction, const std::function<void()>& part);
+
+    // False once the connection is gone; then it soon takes its holds along. Any thread.
+    [[nodiscard]] bool isConnected() const;
 
     [[nodiscard]] std::string description() const;
 

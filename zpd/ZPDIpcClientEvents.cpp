@@ -91,10 +91,15 @@ void ZPDIpcClient::carryOut(Transaction& transaction) {
     server_.assertOnServiceQueue();
     if (++requestCount_ % countedEvery == 0)
         ZPDLogOps().debug("client %d used %u requests so far", pid(), requestCount_);
+    attend(transaction, [&] { transaction.dispatch(); });
+}
+
+void ZPDIpcClient::attend(const Transaction& transaction, const std::function<void()>& part) {
+    server_.assertOnServiceQueue();
     vouched_ = transaction.isVouchedFor();
     rechecked_ = false;
     isStillItself_.reset();
-    transaction.dispatch();
+    part();
     vouched_ = false;
 }
 

@@ -88,6 +88,7 @@ bool ZPDPlugIn::setupWithProxy(const ARZephrinProxy::Ptr& proxy) {
     setOriginalIdentifier(proxy->originalIdentifier());
     setEntitlements(proxy->entitlements());
     dataContainerPath_ = proxy->dataContainerPath();
+    userIdentifier_ = proxy->userIdentifier();
     setHubProtocolVersion(hubProtocolVersionOf(plugInInfo, info));
     setContainingPath(containing ? std::optional(containing->bundlePath()) : std::nullopt);
     return true;

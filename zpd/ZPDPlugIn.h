@@ -4,14 +4,22 @@
 #include <expected>
 #include <memory>
 #include <optional>
+#include <set>
 #include <string>
 #include <string_view>
+#include <sys/types.h>
 
 #include "AppRegistry/ARZephrinProxy.h"
 #include "Zephrin/ZPPlugInCore.h"
 #include "zpd/ZPDPlugInContext.h"
 
+namespace platform {
+struct ExternalService;
+}
+
 class ZPDEntitlementHolder;
+class ZPDIpcClient;
+class ZPDLaunchEnvironment;
 class ZPDPlugInInfo;
 
 // The daemon's record of one plug-in: the shared record and what only the registry knows of it,
@@ -133,6 +141,19 @@ public:
     [[nodiscard]] std::optional<std::string> allowForClient(ZPDEntitlementHolder& client) const;
     [[nodiscard]] std::optional<std::string> allowForClient(ZPDEntitlementHolder& client,
                                                             const ZPDPlugInInfo* info) const;
+    // What the user granted to the application that contains it; reads the application's bundle.
+    [[nodiscard]] std::set<std::string> allowedConsentServices() const;
+
+    // ---- Launching (ZPDPlugInLaunch.cpp)
+
+    // Lets the client's process start the plug-in, in its sandbox. `environment` is the client's
+    // own wish, which the plug-in's container and bundle have their say after.
+    [[nodiscard]] std::optional<platform::Error>
+    enableForClient(const ZPDIpcClient& client, const platform::Dictionary& environment) const;
+    // Names one instance that runs, if any does.
+    [[nodiscard]] std::optional<platform::Dictionary> checkBusy() const;
+    // A token that lets its holder read the bundle, or an errno value.
+    [[nodiscard]] std::expected<std::string, int> issueBundleExtension() const;
 
 private:
     // What is kept of an encoded form, and what it was made of.
@@ -162,6 +183,15 @@ private:
     [[nodiscard]] std::expected<std::string, int>
     issueServiceExtension(const std::string& bundleIdentifier) const;
 
+    [[nodiscard]] platform::Dictionary launchOverlay(const ZPDPlugInInfo* info,
+                                                     const platform::Dictionary& environment) const;
+    [[nodiscard]] platform::ExternalService externalService(const std::string& executable) const;
+    [[nodiscard]] static std::string shownVersion(const ZPDPlugInInfo* info);
+    void addContainer(ZPDLaunchEnvironment& environment, const ZPDPlugInInfo* info) const;
+    [[nodiscard]] platform::Dictionary serviceOf(const ZPDPlugInInfo* info) const;
+    [[nodiscard]] std::string_view sandboxProfile(const ZPDPlugInInfo* info) const;
+    [[nodiscard]] std::string_view keyboardProfile(const ZPDPlugInInfo& info) const;
+
     [[nodiscard]] bool matchKey(std::string_view key, const platform::Value& pattern,
                                 const ZPDPlugInInfo* info) const;
     [[nodiscard]] bool matchPattern(const platform::Value* value,
@@ -171,6 +201,7 @@ private:
 
     const ZPDPlugInContext& context_;
     std::optional<std::string> dataContainerPath_;
+    std::optional<uid_t> userIdentifier_; // as which its processes run
     std::size_t identifierHash_ = 0;
 
     // Guarded by the record's lock; refreshed behind const readers.

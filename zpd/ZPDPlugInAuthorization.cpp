@@ -1,19 +1,30 @@
 // Who may see and use a plug-in. Two restrictions, each in force by itself, the first denial wins:
 // what the host's own entitlement leaves it (rules for plug-ins), and the entitlement that the
-// plug-in asks of every host.
+// plug-in asks of every host. And what the user granted.
 
+#include "Zephrin/ZPDLog.h"
+#include "platform/bundle/Bundle.h"
+#include "platform/consent/Consent.h"
 #include "platform/log/Render.h"
 #include "zpd/Entitlements.h"
 #include "zpd/ZPDEntitlementHolder.h"
 #include "zpd/ZPDPlugIn.h"
 #include "zpd/ZPDPlugInInfo.h"
 
+using platform::BundleReader;
 using platform::Value;
 
 namespace {
 
 std::string lacksEntitlement(const Value& entitlement) {
     return platform::log::renderText("the host does not have the \"%@\" entitlement", entitlement);
+}
+
+std::optional<std::string_view> grantedService(const Value& record) {
+    const platform::Dictionary* const entries = record.dictionary();
+    const Value* const granted = entries ? entries->find(platform::kConsentInfoGranted) : nullptr;
+    const Value* const service = entries ? entries->find(platform::kConsentInfoService) : nullptr;
+    return granted && granted->equalsTrue() && service ? service->string() : std::nullopt;
 }
 
 } // namespace
@@ -36,4 +47,26 @@ std::optional<std::string> ZPDPlugIn::allowForClient(ZPDEntitlementHolder& clien
             return lacksEntitlement(*required);
     }
     return std::nullopt;
+}
+
+// The bundle is read anew each time: of what it says nothing is remembered.
+std::set<std::string> ZPDPlugIn::allowedConsentServices() const {
+    if (!containingPath())
+        return {};
+    const auto bundle = BundleReader::atPath(*containingPath());
+    if (!bundle.stringProperty(BundleReader::Property::bundlePath)) {
+        ZPDLogOps().info("failed to create bundle for %@", path());
+        return {};
+    }
+    const auto records = context_.consent.consentAccessCopyInformationForBundle(bundle);
+    if (!records) {
+        ZPDLogOps().info("ConsentAccessCopyInformationForBundle failed for %@", bundle);
+        return {};
+    }
+    std::set<std::string> granted;
+    for (const Value& record : *records) {
+        if (const auto service = grantedService(record))
+            granted.emplace(*service);
+    }
+    return granted;
 }

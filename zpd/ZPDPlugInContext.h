@@ -5,6 +5,9 @@
 #include "platform/value/Value.h"
 
 namespace platform {
+class Assertions;
+class Consent;
+class Jobs;
 class Sandbox;
 class Types;
 } // namespace platform
@@ -29,4 +32,7 @@ struct ZPDPlugInContext {
     platform::Types& types;
     ZPDAnnotationSource& annotations;
     ZPDKeyPool& keys;
+    platform::Jobs& jobs;
+    platform::Assertions& assertions;
+    platform::Consent& consent;
 };

@@ -181,6 +181,10 @@ std::expected<std::string, int> ZPDPlugIn::issueFileExtension(const std::string&
     return token;
 }
 
+std::expected<std::string, int> ZPDPlugIn::issueBundleExtension() const {
+    return issueFileExtension(path());
+}
+
 std::expected<std::string, int>
 ZPDPlugIn::issueServiceExtension(const std::string& bundleIdentifier) const {
     auto token = context_.sandbox.issueServiceExtension(serviceClass, bundleIdentifier, noFlags);

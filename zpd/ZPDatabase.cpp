@@ -33,7 +33,8 @@ bool debugging(const platform::log::Category& category) {
 
 ZPDatabase::ZPDatabase(const Platform& platform, const std::optional<std::string>& databasePath)
     : platform_(platform),
-      context_{platform.workspace, platform.sandbox, platform.types, *this, keys_},
+      context_{platform.workspace, platform.sandbox,    platform.types,  *this, keys_,
+               platform.jobs,      platform.assertions, platform.consent},
       annotations_(databasePath, platform.containers),
       sync_("ZPDatabase", platform::QueueRank::leaf),
       saver_(annotations_.annotationsPath(), annotations_.changes(),

@@ -56,8 +56,9 @@ struct RecordWorld {
     FakePlatform platform;
     FakeAnnotations annotations;
     ZPDKeyPool keys;
-    ZPDPlugInContext context{platform.workspace, platform.sandbox, platform.types, annotations,
-                             keys};
+    ZPDPlugInContext context{
+        platform.workspace, platform.sandbox,    platform.types,  annotations, keys,
+        platform.jobs,      platform.assertions, platform.consent};
 
     // The record of a plug-in that the registry knows.
     [[nodiscard]] ZPDPlugIn::Ptr record(const std::shared_ptr<FakePlugIn>& plugIn) {

@@ -8,6 +8,7 @@
 #include <string>
 #include <vector>
 
+#include "platform/consent/Consent.h"
 #include "platform/container/Containers.h"
 #include "platform/jobs/Jobs.h"
 #include "platform/locale/Locale.h"
@@ -206,13 +207,12 @@ struct FakeJobs final : platform::Jobs {
         platform::Dictionary overlay;
     };
 
-    int addCode = 0;                        // what adding is answered with
-    int removeCode = nothingOnRecord;       // and removing
-    bool answers = true;                    // whether removals are answered at once
-    bool shutOut = false;                   // everybody
-    std::vector<Added> added;               // read when nobody adds
-    std::vector<std::string> removed;       // "identifier version"
-    std::vector<std::function<void()>> due; // the answers that wait
+    int addCode = 0;                  // what adding is answered with
+    std::map<std::string, int> codes; // and removing, by identifier; else nothingOnRecord
+    bool answers = true;              // whether removals are answered at once
+    bool shutOut = false;             // everybody
+    std::vector<Added> added;         // read when nobody adds
+    std::vector<std::string> removed; // "identifier version"
 
     int addExternalService(const std::shared_ptr<const platform::ipc::Peer>& host,
                            const platform::ExternalService& service,
@@ -226,20 +226,37 @@ struct FakeJobs final : platform::Jobs {
                                Answer answer) override {
         const std::lock_guard lock(mutex_);
         removed.push_back(std::string(identifier) + " " + std::string(version));
-        const auto kept = std::make_shared<Answer>(std::move(answer));
-        const auto answerIt = [queue, kept, code = removeCode] {
-            queue->async([kept, code] { (*kept)(code); });
-        };
+        const auto found = codes.find(std::string(identifier));
+        const int code = found == codes.end() ? nothingOnRecord : found->second;
+        auto block = [answer = std::move(answer), code]() mutable { answer(code); };
         if (answers)
-            answerIt();
+            queue->async(std::move(block));
         else
-            due.emplace_back(answerIt);
+            due_.emplace(identifier, Due{std::move(queue), std::move(block)});
+    }
+
+    // How many removals wait to be answered.
+    [[nodiscard]] std::size_t waiting() {
+        const std::lock_guard lock(mutex_);
+        return due_.size();
+    }
+
+    void answer(const std::string& identifier) {
+        const std::lock_guard lock(mutex_);
+        auto one = due_.extract(due_.find(identifier));
+        one.mapped().queue->async(std::move(one.mapped().block));
     }
 
     bool isShutOut(const platform::ipc::Peer&) override { return shutOut; }
 
 private:
+    struct Due {
+        std::shared_ptr<platform::SerialQueue> queue;
+        platform::SerialQueue::Block block;
+    };
+
     std::mutex mutex_;
+    std::multimap<std::string, Due> due_; // by identifier
 };
 
 struct FakeAssertions final : platform::Assertions {
@@ -250,6 +267,17 @@ struct FakeAssertions final : platform::Assertions {
     busyInstances(const std::set<std::string>& bundleIdentifiers) override {
         asked.push_back(bundleIdentifiers);
         return busy;
+    }
+};
+
+struct FakeConsent final : platform::Consent {
+    std::optional<platform::Array> records; // of every application
+    std::atomic<int> asked = 0;
+
+    std::optional<platform::Array>
+    consentAccessCopyInformationForBundle(const platform::BundleReader&) override {
+        ++asked;
+        return records;
     }
 };
 
@@ -265,10 +293,11 @@ struct FakePlatform {
     FakeLocale locale;
     FakeJobs jobs;
     FakeAssertions assertions;
+    FakeConsent consent;
     FakeWorkspace workspace;
 
     [[nodiscard]] Platform services() {
         return {processes,  signing, sandbox, types,      preferences, notifications,
-                containers, locale,  jobs,    assertions, workspace};
+                containers, locale,  jobs,    assertions, consent,     workspace};
     }
 };

@@ -61,7 +61,7 @@ std::vector<SharedBytes> Transaction::discover(const std::optional<Dictionary>& 
 // Asks for the sandbox only where the entitlement is held.
 bool Transaction::mayDiscoverAll() const {
     return client().hasEntitlement(Entitlement::manager) &&
-           !server().services().sandbox.isSandboxed(client().peer());
+           !server().services().sandbox.isSandboxed(*client().peer());
 }
 
 Discovery::Discovery(const Transaction& transaction, std::optional<Dictionary> rules,

@@ -94,7 +94,7 @@ void Discovery::hideRivals(const OwnPlugIns& ownPlugIns) {
 
 std::optional<std::string> Discovery::clientPath() const {
     const ZPDIpcClient& client = transaction_.client();
-    auto path = transaction_.server().services().processes.executablePath(client.peer(), pathRoom);
+    auto path = transaction_.server().services().processes.executablePath(*client.peer(), pathRoom);
     if (path)
         return std::move(*path);
     ZPDLogOps().error("Failed to determine path for pid %d, %{errno}d", client.pid(), path.error());
