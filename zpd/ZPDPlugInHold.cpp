@@ -1,5 +1,6 @@
 #include "zpd/ZPDPlugInHold.h"
 
+#include <unordered_set>
 #include <utility>
 
 #include "zpd/ZPDPlugIn.h"
@@ -7,12 +8,9 @@
 ZPDPlugInHold::ZPDPlugInHold(const std::vector<std::shared_ptr<ZPDPlugIn>>& plugIns,
                              std::weak_ptr<ZPDIpcClient> client)
     : client_(std::move(client)) {
+    std::unordered_set<platform::Uuid> seen;
     for (const auto& plugIn : plugIns) {
-        if (blockedUuids_.insert(plugIn->uuid()).second)
+        if (seen.insert(plugIn->uuid()).second)
             blocked_.push_back(plugIn);
     }
-}
-
-bool ZPDPlugInHold::blocks(const ZPDPlugIn& plugIn) const {
-    return blockedUuids_.contains(plugIn.uuid());
 }

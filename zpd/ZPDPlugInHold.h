@@ -2,7 +2,6 @@
 
 #include <chrono>
 #include <memory>
-#include <unordered_set>
 #include <vector>
 
 #include "platform/process/ProcessActivity.h"
@@ -25,8 +24,6 @@ public:
     // The token by which the hold is released.
     [[nodiscard]] const platform::Uuid& uuid() const { return uuid_; }
 
-    [[nodiscard]] bool blocks(const ZPDPlugIn& plugIn) const;
-
     // In the order in which they were named.
     [[nodiscard]] const std::vector<std::shared_ptr<ZPDPlugIn>>& blocked() const {
         return blocked_;
@@ -44,7 +41,6 @@ public:
 private:
     const platform::Uuid uuid_ = platform::Uuid::random();
     std::vector<std::shared_ptr<ZPDPlugIn>> blocked_;
-    std::unordered_set<platform::Uuid> blockedUuids_;
     const std::weak_ptr<ZPDIpcClient> client_;
     const std::chrono::system_clock::time_point created_ = std::chrono::system_clock::now();
     const platform::ProcessActivity activity_;

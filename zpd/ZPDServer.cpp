@@ -21,6 +21,7 @@ ZPDServer* ZPDServer::theServer = nullptr;
 ZPDServer::ZPDServer(const Platform& platform, const Settings& settings)
     : ZPDatabase(platform, settings.databasePath),
       userPrefs_(platform.preferences),
+      terminations_(platform.jobs),
       syncQueue_("serverSync", platform::QueueRank::leaf),
       ipcLoop_("ipc"),
       registrationQueue_("registration", platform::QueueRank::service),
@@ -44,8 +45,9 @@ ZPDServer::~ZPDServer() {
     mainQueue_.sync([] {});
     registrationQueue_.sync([] {});
     mainQueue_.sync([] {}); // what came back from there
-    closeAnnotations();     // the last requests are answered while the loop is still there
     setDelegate(nullptr);
+    terminations_.close();
+    closeAnnotations(); // the last requests are answered while the loop is still there
     theServer = nullptr;
 }
 
@@ -99,7 +101,8 @@ void ZPDServer::adopt(const std::shared_ptr<Connection>& connection) {
 
 // Runs on the registry's queue.
 void ZPDServer::removedPlugIns(const std::vector<ARZephrinProxy::Ptr>& plugIns) {
-    // No plug-in process is ever started by this daemon, so that there is none to end.
-    if (ZPDLogOps().enabled(platform::log::Level::debug))
-        ZPDLogOps().debug("removal complete for %@", describeAll(plugIns));
+    terminatePlugIns(plugIns, [plugIns] {
+        if (ZPDLogOps().enabled(platform::log::Level::debug))
+            ZPDLogOps().debug("removal complete for %@", describeAll(plugIns));
+    });
 }

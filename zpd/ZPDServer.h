@@ -15,8 +15,10 @@
 #include "platform/value/Error.h"
 #include "platform/value/Uuid.h"
 #include "zpd/Platform.h"
+#include "zpd/ZPDHolds.h"
 #include "zpd/ZPDPlugInHold.h"
 #include "zpd/ZPDPreparations.h"
+#include "zpd/ZPDTerminations.h"
 #include "zpd/ZPDUserPrefs.h"
 #include "zpd/ZPDatabase.h"
 
@@ -31,6 +33,7 @@ class ZPDIpcClient;
 //   "registration"  what "add" and "remove" take long for, and where listed paths lead; of the rank
 //                 of "service", and neither waits for the other
 //   "serverSync"  a leaf: every access to the holds, always entered synchronously
+//   "killer", "killer-waiter"  the answers to forced terminations, and what waits for them
 //
 // Made and destroyed on the main thread. The platform's services outlive it; it outlives its
 // clients, whose connections end with the loop.
@@ -90,12 +93,23 @@ public:
 
     // ---- Holds (ZPDServerHolds.cpp). Any thread.
 
+    // A client has at most so many holds.
+    static constexpr std::size_t mostHolds = 1'024;
+
     [[nodiscard]] bool holdOnPlugIn(const ZPDPlugIn& plugIn);
-    void addHold(ZPDPlugInHold::Ptr hold);
+    // Fails when its client has too many, or has gone.
+    [[nodiscard]] std::optional<platform::Error> addHold(const ZPDPlugInHold::Ptr& hold);
     // Releases the hold with this token; an unknown one does nothing.
     void unholdToken(const platform::Uuid& token);
     // Releases every hold that this client placed.
     void unholdClient(const ZPDIpcClient& client);
+
+    // Ends the running processes of these plug-ins, and then, on "killer-waiter", completes. Any
+    // thread.
+    void terminatePlugIns(const std::vector<ARZephrinProxy::Ptr>& plugIns,
+                          ZPDTerminations::Completion completion) {
+        terminations_.terminate(plugIns, std::move(completion));
+    }
 
 private:
     ZPDServer(const Platform& platform, const Settings& settings);
@@ -106,16 +120,16 @@ private:
 
     void removedPlugIns(const std::vector<ARZephrinProxy::Ptr>& plugIns) override;
     // REQUIRES: on "serverSync"
-    void removeHold(std::vector<ZPDPlugInHold::Ptr>::const_iterator hold);
+    [[nodiscard]] std::optional<platform::Error> objectionTo(const ZPDPlugInHold& hold) const;
     void releaseAllHolds();
-    [[nodiscard]] bool releaseOneHoldOf(const ZPDIpcClient& client);
 
     static ZPDServer* theServer;
 
     unsigned verbose_ = 0;
     ZPDUserPrefs userPrefs_;
-    std::vector<ZPDPlugInHold::Ptr> holds_; // only on "serverSync"
-    std::atomic<bool> holdsAny_ = false;    // whether there is one; changed there, read anywhere
+    ZPDHolds holds_;                     // only on "serverSync"
+    std::atomic<bool> holdsAny_ = false; // whether there is one; changed there, read anywhere
+    ZPDTerminations terminations_;
     ZPDPreparations preparations_;
     platform::SerialQueue syncQueue_;
     platform::ipc::Loop ipcLoop_;

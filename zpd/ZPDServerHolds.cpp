@@ -1,71 +1,76 @@
 // The list of holds, touched only on the queue "serverSync".
 
-#include <algorithm>
 #include <utility>
 
+#include "Zephrin/ZPDError.h"
 #include "Zephrin/ZPDLog.h"
 #include "zpd/ZPDIpcClient.h"
+#include "zpd/ZPDPlugIn.h"
 #include "zpd/ZPDServer.h"
+
+using platform::Error;
 
 bool ZPDServer::holdOnPlugIn(const ZPDPlugIn& plugIn) {
     if (!holdsAny_)
         return false; // asked for every candidate of every discovery
-    return syncQueue_.sync([&] {
-        return std::ranges::any_of(holds_, [&](const auto& hold) { return hold->blocks(plugIn); });
-    });
+    return syncQueue_.sync([&] { return holds_.block(plugIn.uuid()); });
 }
 
-void ZPDServer::addHold(ZPDPlugInHold::Ptr hold) {
-    syncQueue_.sync([&] {
-        holds_.push_back(std::move(hold));
+std::optional<Error> ZPDServer::addHold(const ZPDPlugInHold::Ptr& hold) {
+    auto objection = syncQueue_.sync([&]() -> std::optional<Error> {
+        if (auto found = objectionTo(*hold))
+            return found;
+        holds_.add(hold);
         holdsAny_ = true;
+        return std::nullopt;
     });
-    notifyAnnotationChange();
+    if (!objection)
+        notifyAnnotationChange();
+    return objection;
+}
+
+// A client that goes takes its holds along right after it counts as gone: a hold must be there
+// before that, or not at all.
+std::optional<Error> ZPDServer::objectionTo(const ZPDPlugInHold& hold) const {
+    syncQueue_.assertOnQueue();
+    const auto client = hold.client();
+    if (!client)
+        return std::nullopt;
+    if (!client->isConnected())
+        return ZPDErrorMake(ZPDErrorCode::invalidRequest, "the client has gone");
+    if (holds_.countOf(*client) < mostHolds)
+        return std::nullopt;
+    return ZPDErrorMakeFormat(ZPDErrorCode::invalidRequest,
+                              "a client may have at most %d holds at a time", mostHolds);
 }
 
 void ZPDServer::unholdToken(const platform::Uuid& token) {
     syncQueue_.sync([&] {
-        const auto found = std::ranges::find(holds_, token, &ZPDPlugInHold::uuid);
-        if (found == holds_.end())
+        if (!holds_.take(token))
             return;
         ZPDLogOps().debug("releasing plug-in hold %{public}@ at client's request", token);
-        removeHold(found);
+        holdsAny_ = !holds_.empty();
         notifyAnnotationChange();
     });
 }
 
 void ZPDServer::unholdClient(const ZPDIpcClient& client) {
     syncQueue_.sync([&] {
-        while (releaseOneHoldOf(client))
+        for (const auto& hold : holds_.takeAllOf(client)) {
+            ZPDLogOps().debug("releasing plug-in hold %{public}@ for dead client pid %d",
+                              hold->uuid(), client.pid());
             notifyAnnotationChange();
+        }
+        holdsAny_ = !holds_.empty();
     });
-}
-
-bool ZPDServer::releaseOneHoldOf(const ZPDIpcClient& client) {
-    syncQueue_.assertOnQueue();
-    const auto found = std::ranges::find_if(
-        holds_, [&](const auto& hold) { return hold->client().get() == &client; });
-    if (found == holds_.end())
-        return false;
-    ZPDLogOps().debug("releasing plug-in hold %{public}@ for dead client pid %d", (*found)->uuid(),
-                      client.pid());
-    removeHold(found);
-    return true;
-}
-
-void ZPDServer::removeHold(std::vector<ZPDPlugInHold::Ptr>::const_iterator hold) {
-    syncQueue_.assertOnQueue();
-    holds_.erase(hold);
-    holdsAny_ = !holds_.empty();
 }
 
 void ZPDServer::releaseAllHolds() {
     syncQueue_.sync([&] {
-        for (const auto& hold : holds_) {
+        for (const auto& hold : holds_.takeAll()) {
             ZPDLogOps().debug("releasing plug-in hold %{public}@ because server is stopping",
                               hold->uuid());
         }
-        holds_.clear();
         holdsAny_ = false;
         notifyAnnotationChange();
     });

@@ -34,14 +34,19 @@ TEST_F(Client, IsGoneWithItsConnection) {
     EXPECT_TRUE(client()->description().ends_with(" NO CONNECTION>")) << client()->description();
 }
 
+ZPDPlugInHold::Ptr holdOf(const ZPDPlugIn::Ptr& plugIn,
+                          const std::shared_ptr<ZPDIpcClient>& client = nullptr) {
+    return std::make_shared<const ZPDPlugInHold>(std::vector{plugIn}, client);
+}
+
 TEST_F(Client, TakesItsHoldsAlong) {
     const auto plugIn = server().findPlugIn(addPlugIn("a")->uuid);
     const auto other = server().findPlugIn(addPlugIn("b")->uuid);
     for (int i = 0; i < 2; ++i)
-        server().addHold(std::make_shared<ZPDPlugInHold>(std::vector{plugIn}, client()));
-    server().addHold(
-        std::make_shared<ZPDPlugInHold>(std::vector{other}, std::weak_ptr<ZPDIpcClient>()));
+        EXPECT_FALSE(server().addHold(holdOf(plugIn, client())));
+    EXPECT_FALSE(server().addHold(holdOf(other)));
     disconnect();
+    EXPECT_TRUE(server().addHold(holdOf(plugIn, client()))) << "a dead client would leave it";
     EXPECT_FALSE(server().holdOnPlugIn(*plugIn));
     EXPECT_TRUE(server().holdOnPlugIn(*other)) << "nobody's hold stays";
     EXPECT_EQ(platform_.notifications.posted.size(), 5U) << "one for each made and each released";
@@ -71,11 +76,11 @@ TEST_F(Hold, BlocksUntilItIsReleasedByToken) {
     const auto a = addPlugIn("a");
     const auto plugIn = server().findPlugIn(a->uuid);
     const auto other = server().findPlugIn(addPlugIn("b")->uuid);
-    auto hold =
+    const auto hold =
         std::make_shared<ZPDPlugInHold>(std::vector{plugIn, plugIn}, std::weak_ptr<ZPDIpcClient>());
     EXPECT_EQ(hold->blocked().size(), 1U);
     EXPECT_FALSE(server().holdOnPlugIn(*plugIn));
-    server().addHold(hold);
+    EXPECT_FALSE(server().addHold(hold));
     EXPECT_TRUE(server().holdOnPlugIn(*plugIn));
     EXPECT_FALSE(server().holdOnPlugIn(*other));
     server().unholdToken(platform::Uuid::random());
@@ -88,8 +93,7 @@ TEST_F(Hold, BlocksUntilItIsReleasedByToken) {
 TEST_F(Hold, AllGoWithOnePostWhenTheServerStops) {
     const auto plugIn = server().findPlugIn(addPlugIn("a")->uuid);
     for (int i = 0; i < 3; ++i)
-        server().addHold(
-            std::make_shared<ZPDPlugInHold>(std::vector{plugIn}, std::weak_ptr<ZPDIpcClient>()));
+        EXPECT_FALSE(server().addHold(holdOf(plugIn)));
     server().stop();
     EXPECT_FALSE(server().holdOnPlugIn(*plugIn));
     EXPECT_EQ(platform_.notifications.posted, Posts(4, change));

@@ -45,7 +45,7 @@ protected:
     ZPDPlugInHold::Ptr hold(const FakePlugIn& plugIn) {
         auto hold = std::make_shared<ZPDPlugInHold>(std::vector{server().findPlugIn(plugIn.uuid)},
                                                     std::weak_ptr<ZPDIpcClient>());
-        server().addHold(hold);
+        EXPECT_FALSE(server().addHold(hold));
         return hold;
     }
 
