@@ -25,8 +25,11 @@ const Transaction::RequestType Transaction::requestTypes[] = {
     {"remove", &Transaction::removePlugIns},
     {"bulk", &Transaction::bulkPlugIns},
     {"match", &Transaction::matchPlugIns},
+    {"ready", &Transaction::readyPlugIns},
+    {"access", &Transaction::accessPlugIns},
     {"annotate", &Transaction::annotatePlugIns},
     {"bulk-annotate", &Transaction::bulkAnnotatePlugIns},
+    {"lock", &Transaction::lockDownPlugIns},
     {"find", &Transaction::findPlugIn},
 };
 

@@ -23,6 +23,7 @@ class SerialQueue;
 
 class ZPDIpcClient;
 class ZPDPlugIn;
+class ZPDPlugInHold;
 class ZPDServer;
 struct ReplyForm;
 
@@ -87,6 +88,10 @@ public:
     // REQUIRES: on the service queue
     void processPaths(platform::SerialQueue& queue, PathBlock block);
 
+    // The same with another end: `whole` is called back on the service queue.
+    // REQUIRES: on the service queue
+    void walkPaths(platform::SerialQueue& queue, PathBlock block, std::function<void()> whole);
+
     // Gets each plug-in and tells whether to go on; when not, it has failed the transaction.
     using PlugInBlock = std::function<bool(const std::shared_ptr<ZPDPlugIn>& plugIn)>;
     // Walks "uuids", with "paths" for what is not found. False when the transaction has failed;
@@ -141,6 +146,10 @@ private:
     // However long the list, whoever else has work for that queue gets a turn in between. The
     // transaction is kept meanwhile.
     void takeTurns(platform::SerialQueue& queue, std::size_t first, Walk walk);
+    void walkRequestedPaths(platform::SerialQueue& queue, PathBlock block,
+                            std::function<void()> whole);
+    // Goes on on the service queue. Any thread.
+    void comeBack(std::function<void()> part);
     [[nodiscard]] bool marshalPath(const platform::Value& entry, const PathBlock& block);
     void send(const platform::ipc::Reply& reply);
 
@@ -177,6 +186,27 @@ private:
     [[nodiscard]] std::shared_ptr<ZPDPlugIn>
     listedPlugIn(const platform::Uuid& uuid, const platform::Value* path, std::size_t index) const;
     [[nodiscard]] bool followListedPath(std::size_t index);
+
+    // ---- zpd/requests/Activation.cpp
+    void readyPlugIns();
+    void accessPlugIns();
+    using PlugIns = std::vector<std::shared_ptr<ZPDPlugIn>>;
+    // These fail the transaction when they answer false.
+    [[nodiscard]] bool mayProvideEnvironment();
+    [[nodiscard]] bool mayReady(const ZPDPlugIn& plugIn);
+    void readyListed();
+    void enable(const std::shared_ptr<const PlugIns>& plugIns, std::size_t first);
+    void accessListed();
+
+    // ---- zpd/requests/Holds.cpp
+    void lockDownPlugIns();
+    struct Collection;
+    void releaseHolds(const platform::Array& tokens);
+    // These fail the transaction when they answer false.
+    [[nodiscard]] bool collect(Collection& collection, const std::string& path, bool resolved);
+    [[nodiscard]] bool refuseBusy(const PlugIns& plugIns);
+    void hold(const PlugIns& plugIns);
+    void terminateHeld(const ZPDPlugInHold& hold);
 
     // ---- zpd/requests/Annotation.cpp
     void annotatePlugIns();

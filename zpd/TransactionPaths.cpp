@@ -9,6 +9,8 @@
 #include "platform/log/Render.h"
 #include "platform/queue/SerialQueue.h"
 #include "zpd/Transaction.h"
+#include "zpd/ZPDIpcClient.h"
+#include "zpd/ZPDServer.h"
 
 using platform::Value;
 
@@ -41,6 +43,17 @@ bool Transaction::marshalPath(const Value& entry, const PathBlock& block) {
 }
 
 void Transaction::processPaths(platform::SerialQueue& queue, PathBlock block) {
+    walkRequestedPaths(queue, std::move(block), [this] { done(); });
+}
+
+void Transaction::walkPaths(platform::SerialQueue& queue, PathBlock block,
+                            std::function<void()> whole) {
+    walkRequestedPaths(queue, std::move(block),
+                       [this, whole = std::move(whole)] { comeBack(whole); });
+}
+
+void Transaction::walkRequestedPaths(platform::SerialQueue& queue, PathBlock block,
+                                     std::function<void()> whole) {
     const platform::Array* const paths = requestedPaths();
     if (!paths)
         return;
@@ -48,11 +61,17 @@ void Transaction::processPaths(platform::SerialQueue& queue, PathBlock block) {
     const auto step = [this, paths, block = std::move(block)](std::size_t index) {
         return marshalPath((*paths)[index], block);
     };
-    const auto finish = [this](bool whole) {
-        if (whole)
-            done();
+    const auto finish = [whole = std::move(whole)](bool isWhole) {
+        if (isWhole)
+            whole();
     };
     takeTurns(queue, 0, {paths->size(), step, finish});
+}
+
+void Transaction::comeBack(std::function<void()> part) {
+    server().submitWork([self = shared_from_this(), part = std::move(part)] {
+        self->client().attend(*self, part);
+    });
 }
 
 void Transaction::takeTurns(platform::SerialQueue& queue, std::size_t first, Walk walk) {

@@ -15,8 +15,14 @@ using platform::ipc::Listener;
 ClientFixture::ClientFixture() : replyQueue_(std::make_shared<platform::SerialQueue>("replies")) {}
 
 ClientFixture::~ClientFixture() {
+    endClient();
+}
+
+void ClientFixture::endClient() {
     otherEnd_.reset();
     accepted_.reset();
+    if (!hasServer())
+        return;
     onServiceQueue([] {}); // no request is left that knows its connection
     listener_.reset();
     loop_.stop();

@@ -21,6 +21,8 @@ protected:
 
     // Connected with the first call.
     const std::shared_ptr<ZPDIpcClient>& client();
+    // Lets everything of the client go; afterwards the server may stop.
+    void endClient();
     // The other end goes away; returns when the client object knows.
     void disconnect();
 

@@ -44,6 +44,8 @@ protected:
     ZPDServer& server();
     void stopServer();
 
+    [[nodiscard]] bool hasServer() const { return server_ != nullptr; }
+
     [[nodiscard]] Reply ask(const Dictionary& request);
     // The keys besides the envelope's.
     [[nodiscard]] Reply ask(std::string_view type, Dictionary keys, std::uint64_t version = 3);

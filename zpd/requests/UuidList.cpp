@@ -116,9 +116,7 @@ void Transaction::followListedPaths(std::function<void()> then) {
         return then();
     leaveOpen();
     const auto step = [this](std::size_t index) { return followListedPath(index); };
-    const auto finish = [this, then = std::move(then)](bool) {
-        server().submitWork([self = shared_from_this(), then] { then(); });
-    };
+    const auto finish = [this, then = std::move(then)](bool) { comeBack(then); };
     takeTurns(server().registrationQueue(), 0, {lists.uuids->size(), step, finish});
 }
 
