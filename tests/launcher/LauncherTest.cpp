@@ -40,6 +40,35 @@ bool isRoot() {
 
 } // namespace
 
+// The first, since it forks: before there is any thread.
+TEST(LauncherTest, aDeadOwnerTakesAllWithIt) {
+    int ends[2];
+    ASSERT_EQ(::pipe(ends), 0);
+    const pid_t owner = ::fork();
+    if (owner == 0) {
+        Host host;
+        Launched run = host.start();
+        run.ask("ignore");
+        const std::string made = std::to_string(run.started()->pid) + " " + run.ask("orphan") +
+                                 " " + run.ask("session") + " " +
+                                 std::to_string(host.launcherPid()) + "\n";
+        (void)!::write(ends[1], made.data(), made.size());
+        for (;;)
+            ::pause();
+    }
+    char text[200] = "";
+    ASSERT_GT(::read(ends[0], text, sizeof text - 1), 0);
+    std::vector<Other> all;
+    std::istringstream numbers(text);
+    for (pid_t pid = 0; numbers >> pid;)
+        all.emplace_back(pid);
+    EXPECT_EQ(all.size(), 4U);
+    ::kill(owner, SIGKILL);
+    ASSERT_EQ(::waitpid(owner, nullptr, 0), owner);
+    for (const Other& each : all)
+        EXPECT_TRUE(each.vanishes());
+}
+
 TEST(LauncherTest, aProgramIsMadeOfExactlyWhatTheLaunchSays) {
     Host host;
     auto launch = host.usual();
@@ -166,34 +195,6 @@ TEST(LauncherTest, aDeadLauncherTakesAllWithItAndIsStartedAgain) {
         (void)host.start();
         EXPECT_NE(host.launcherPid(), launcher);
     }
-}
-
-TEST(LauncherTest, aDeadOwnerTakesAllWithIt) {
-    int ends[2];
-    ASSERT_EQ(::pipe(ends), 0);
-    const pid_t owner = ::fork();
-    if (owner == 0) {
-        Host host;
-        Launched run = host.start();
-        run.ask("ignore");
-        const std::string made = std::to_string(run.started()->pid) + " " + run.ask("orphan") +
-                                 " " + run.ask("session") + " " +
-                                 std::to_string(host.launcherPid()) + "\n";
-        (void)!::write(ends[1], made.data(), made.size());
-        for (;;)
-            ::pause();
-    }
-    char text[200] = "";
-    ASSERT_GT(::read(ends[0], text, sizeof text - 1), 0);
-    std::vector<Other> all;
-    std::istringstream numbers(text);
-    for (pid_t pid = 0; numbers >> pid;)
-        all.emplace_back(pid);
-    EXPECT_EQ(all.size(), 4U);
-    ::kill(owner, SIGKILL);
-    ASSERT_EQ(::waitpid(owner, nullptr, 0), owner);
-    for (const Other& each : all)
-        EXPECT_TRUE(each.vanishes());
 }
 
 // Instead of the launcher: nothing, a program that ends at once, and one that talks nonsense.
