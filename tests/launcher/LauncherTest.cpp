@@ -4,6 +4,7 @@
 #include <filesystem>
 #include <grp.h>
 #include <sstream>
+#include <sys/prctl.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -44,6 +45,7 @@ bool isRoot() {
 TEST(LauncherTest, aDeadOwnerTakesAllWithIt) {
     int ends[2];
     ASSERT_EQ(::pipe(ends), 0);
+    ::prctl(PR_SET_CHILD_SUBREAPER, 1); // of the launcher
     const pid_t owner = ::fork();
     if (owner == 0) {
         Host host;
