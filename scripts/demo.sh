@@ -12,11 +12,13 @@ step_limit=100 # tenths of a second that anything here may take
 home=
 daemon=
 monitor=
+talk=
+hold=
 
 clean_up() {
     status=$?
     trap - EXIT INT TERM
-    for process in $monitor $daemon; do
+    for process in $monitor $talk $hold $daemon; do
         kill "$process" 2>/dev/null || true
         wait "$process" 2>/dev/null || true
     done
@@ -29,6 +31,8 @@ trap 'exit 143' TERM
 
 # Not below TMPDIR: the path of a socket must be short.
 home=$(mktemp -d /tmp/zpd-demo.XXXXXX)
+# As root each plug-in is a user of its own, who must get through to its bundle and container.
+chmod 711 "$home"
 log=$home/zpd.log
 output=$home/output
 PATH=$build/bin:$PATH
@@ -128,6 +132,52 @@ stop_monitor() {
     [ $status -eq 0 ] || fail "the monitor ended with status $status, expected 0"
     sed 's/^/  /' "$home/heard"
     grep -qF com.tovana.zephrin.annotation-change "$home/heard" || fail "it heard something else"
+}
+
+# start_talk UUID TEXT ANSWER: runs a plug-in until the talk is stopped; it has answered by then.
+start_talk() {
+    mkfifo "$home/words"
+    echo "\$ zpctl run $1 <words >answers &"
+    zpctl run "$1" <"$home/words" >"$home/answers" 2>"$home/talk" &
+    talk=$!
+    exec 3>"$home/words"
+    echo "\$ echo $2 >words"
+    echo "$2" >&3
+    eventually grep -qF "$3" "$home/answers" || {
+        cat "$home/talk"
+        fail "no answer from the plug-in"
+    }
+    sed 's/^/  /' "$home/answers"
+}
+
+# The plug-in was ended, so its talk is at an end.
+stop_talk() {
+    eventually ended "$talk" || fail "the talk goes on"
+    status=0
+    wait "$talk" || status=$?
+    talk=
+    exec 3>&-
+    [ $status -eq 0 ] || fail "the talk ended with status $status, expected 0"
+}
+
+# start_hold PATH: a hold until it is stopped; its token is in $token.
+start_hold() {
+    echo "\$ zpctl hold $1 &"
+    zpctl hold "$1" >"$home/hold" 2>&1 &
+    hold=$!
+    eventually grep -qF token "$home/hold" || fail "no hold"
+    cp "$home/hold" "$output"
+    sed 's/^/  /' "$output"
+    token=$(uuid_in_output)
+}
+
+stop_hold() {
+    echo "\$ kill %2"
+    kill "$hold"
+    status=0
+    wait "$hold" || status=$?
+    hold=
+    [ $status -eq 0 ] || fail "the hold ended with status $status, expected 0"
 }
 
 ended() {
@@ -296,6 +346,42 @@ shows '0 plug-ins'
 run 0 zpctl tree
 shows ' not elected '
 run 0 zpctl elect "$subtitles" on
+
+title "A plug-in is made ready, launched in its sandbox, and talked to over its socket"
+predict=$ZEPHRIN_HOME/Applications/Jukebox.app/PlugIns/Predict.appex
+run 0 zpctl ready "$uuid"
+run 0 sh -c "echo co | zpctl run $uuid"
+shows 'comedy concert cooking'
+
+title "A host does the same through libZephrin, and reads a file of the bundle by a token"
+run 0 "$ZEPHRIN_HOME/Applications/Jukebox.app/Jukebox" com.tovana.keyboard-service co
+shows com.example.predict 'comedy concert cooking' 'by token'
+run 0 zpctl access "$uuid"
+shows "$uuid" 'zsx1;com.tovana.app-sandbox.read;1;file;' Predict.appex
+
+title "While it runs, everybody can see it, and what it is confined by"
+start_talk "$uuid" co 'comedy concert cooking'
+run 0 zpctl ps
+shows com.example.predict keyboard '1 plug-in running'
+run 0 zpctl --json ps
+shows '"wanted"' '"enforced"'
+
+title "A maintainer's hold: refused while the plug-in is busy, or it ends the plug-in first"
+run 1 zpctl hold --refuse-busy "$predict" -- echo held
+shows 'plug-ins are busy' 'code 14' com.example.predict
+hides held
+run 7 zpctl hold --terminate "$predict" -- sh -c \
+    "zpctl ps; zpctl match HXExtensionIdentifier=com.example.predict; zpctl ready $uuid; exit 7"
+shows '0 plug-ins running' '0 plug-ins' 'access to plugin com.example.predict denied: the plug-in is on hold'
+stop_talk
+
+title "A hold for longer, and its release by its token"
+start_hold "$predict"
+run 1 zpctl ready "$uuid"
+shows 'on hold' 'code 11'
+run 0 zpctl release "$token"
+run 0 zpctl ready "$uuid"
+stop_hold
 
 title "An application goes while the daemon runs"
 run 0 zpctl uninstall com.example.cinema

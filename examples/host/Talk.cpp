@@ -21,7 +21,6 @@ namespace {
 using platform::Dictionary;
 using platform::Error;
 using platform::UniqueFd;
-using platform::Value;
 using Reply = ZPDaemonClient::Reply;
 
 constexpr std::chrono::seconds patience(5);
