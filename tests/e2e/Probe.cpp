@@ -237,6 +237,12 @@ void Probe::run(const std::string& line) {
              const Words paths(words.begin() + 1, words.end());
              say(said(client().request(pathsRequest("remove", paths))));
          }},
+        {"hold",
+         [&] {
+             const Item keys = Item::map({{"paths", Item::array({words[1]})}, {"flags", 1}});
+             const Item reply = client().request(envelope("lock", keys));
+             say(reply.has("uuids") ? "held" : said(reply));
+         }},
         {"child-asks", [&] { waitpid(aside([&] { say(ask()); }), nullptr, 0); }},
         {"heir-asks", [&] { askAfterOwnEnd(false); }},
         {"namesake-asks", [&] { askAfterOwnEnd(true); }},
