@@ -94,17 +94,17 @@ TEST(Pressure, FiveHundredConnectionsAreServed) {
 TEST(Pressure, ConnectionsBeyondTheUsersShareAreClosedAtOnce) {
     const Home home;
     // A quarter of the descriptors is this user's.
-    Daemon daemon(home.path(), {.logLevel = "default", .descriptors = 256});
+    Daemon daemon(home.path(), {.logLevel = "default", .descriptors = 512});
     std::vector<WireClient> clients;
     std::size_t refused = 0;
-    for (int i = 0; i < 70; ++i) {
+    for (int i = 0; i < 134; ++i) {
         WireClient client(daemon.socketPath(), WireClient::Greeting::leave);
         if (client.receive())
             clients.push_back(std::move(client));
         else
             ++refused;
     }
-    EXPECT_EQ(clients.size(), 64u);
+    EXPECT_EQ(clients.size(), 128u);
     EXPECT_EQ(refused, 6u);
     EXPECT_TRUE(eventually([&] { return daemon.log().size() >= refused; }));
     for (WireClient& client : clients)

@@ -22,6 +22,12 @@ TEST_F(Client, IsServedWithoutPathAndBundle) {
     EXPECT_TRUE(askThroughClient({{"version", 3}, {"request", "match"}})->contains("matches"));
 }
 
+TEST_F(Client, IsNoPlugInThatIsKeptAway) {
+    platform_.jobs.shutOut = true;
+    EXPECT_EQ(failureOf({{"version", 3U}, {"request", "match"}}),
+              "no reply: Connection interrupted");
+}
+
 TEST_F(Client, IsGoneWithItsConnection) {
     const std::string there = client()->description();
     EXPECT_TRUE(there.starts_with("<ZPDIpcClient 0x")) << there;
