@@ -73,6 +73,16 @@ std::expected<SocketPair, Error> makeSockets() {
     return SocketPair{UniqueFd(ends[0]), UniqueFd(ends[1])};
 }
 
+// Where this kernel does not do all that the profile asks for.
+void tellWhatIsLacking(const JobService& service, const Launcher::Started& started) {
+    const Dictionary* const wanted = started.confinement.findDictionary("wanted");
+    const Dictionary* const enforced = started.confinement.findDictionary("enforced");
+    if (wanted && enforced && *wanted != *enforced)
+        jobLog().standard("process %{public}d of plug-in %{public}@ is confined by %{public}@; "
+                          "wanted was %{public}@",
+                          started.pid, service.what.identifier, Value(*enforced), Value(*wanted));
+}
+
 } // namespace
 
 void JobManager::start(const ipc::Peer& host, const ServiceChoice& choice, StartedBlock started) {
@@ -163,6 +173,7 @@ void JobManager::didStart(Number number, std::expected<Launcher::Started, Error>
     }
     jobLog().info("started plug-in %{public}@ as process %{public}d", service->what.identifier,
                   outcome->pid);
+    tellWhatIsLacking(*service, *outcome);
     started(Started{outcome->pid, std::move(socket)});
 }
 

@@ -58,7 +58,7 @@ Running start(const std::string& bundle, std::optional<uid_t> user,
     if (confinement && confinement->enforce() != 0)
         ::_exit(91);
     const char* const arguments[] = {"probe", nullptr};
-    const char* const environment[] = {"ZEPHRIN_SOCKET=3", "ASAN_OPTIONS=detect_leaks=0", nullptr};
+    const char* const environment[] = {"ZEPHRIN_SOCKET=3", nullptr};
     ::syscall(SYS_execveat, executable, "", arguments, environment, AT_EMPTY_PATH);
     ::_exit(92);
 }
@@ -110,6 +110,7 @@ void tryEverything(const Stage& stage) {
                                   .container = container,
                                   .otherContainer = stage.folder / "other",
                                   .sockets = {},
+                                  .files = {},
                                   .hasSuid = stage.hasSuid});
     for (const Control control : {Control::daemon, Control::plugIn}) {
         SCOPED_TRACE(control == Control::daemon ? "as the daemon's user, not confined"

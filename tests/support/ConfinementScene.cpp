@@ -82,7 +82,7 @@ ConfinementScene::ConfinementScene(Places places)
     writeOpenFile(home_ + "/secret", "secret");
     writeOpenFile(places_.folder + "/annotations/store", "store");
     writeOpenFile(places_.otherContainer + "/file", "theirs");
-    writeOpenFile(places_.bundle + "/resource", "resource");
+    writeOpenFile(places_.bundle + "/Resources/note", "resource");
     fs::copy_file(places_.bundle + "/probe", places_.container + "/program");
     listen();
     victim_ = sleepingChild();
@@ -109,10 +109,10 @@ std::vector<Attempt> ConfinementScene::attempts() const {
     using enum Allowed;
     using enum Control;
     const std::string victim = std::to_string(victim_);
-    const auto& [folder, bundle, container, otherContainer, otherSockets, hasSuid] = places_;
+    const auto& [folder, bundle, container, otherContainer, sockets, files, hasSuid] = places_;
     std::vector<Attempt> all = {
         // its own
-        {"read " + bundle + "/resource", always, plugIn},
+        {"read " + bundle + "/Resources/note", always, plugIn},
         {"run " + bundle + "/probe", always, plugIn},
         {"run /bin/true", always, plugIn},
         {"write " + container + "/file", always, plugIn},
@@ -144,12 +144,12 @@ std::vector<Attempt> ConfinementScene::attempts() const {
         {"mode " + home_ + "/secret"},
         {"folder " + home_ + "/folder"},
         {"rename " + home_ + "/secret"},
-        {"write " + bundle + "/new"},
-        {"write " + bundle + "/resource"},
-        {"truncate " + bundle + "/resource"},
-        {"empty " + bundle + "/resource"},
-        {"mode " + bundle + "/resource"},
-        {"remove " + bundle + "/resource"},
+        {"write " + bundle + "/Resources/new"},
+        {"write " + bundle + "/Resources/note"},
+        {"truncate " + bundle + "/Resources/note"},
+        {"empty " + bundle + "/Resources/note"},
+        {"mode " + bundle + "/Resources/note"},
+        {"remove " + bundle + "/Resources/note"},
         // other processes
         {"signal " + victim},
         {"limit " + victim},
@@ -173,8 +173,10 @@ std::vector<Attempt> ConfinementScene::attempts() const {
         {"unixDatagram " + folder + "/datagram"},
         {"unix " + abstract_},
     };
-    for (const std::string& path : otherSockets)
+    for (const std::string& path : sockets)
         all.push_back({"unix " + path});
+    for (const std::string& path : files)
+        all.push_back({"read " + path});
     if (hasSuid)
         all.push_back({"gain " + bundle + "/suid", never, plugIn});
     return all;
@@ -185,9 +187,9 @@ void ConfinementScene::tidy() const {
         fs::remove(places_.container + made);
     for (const char* made : {"/new", "/folder", "/secret-2"})
         fs::remove(home_ + made);
-    fs::remove(places_.bundle + "/new");
+    fs::remove(places_.bundle + "/Resources/new");
     writeOpenFile(home_ + "/secret", "secret");
-    writeOpenFile(places_.bundle + "/resource", "resource");
+    writeOpenFile(places_.bundle + "/Resources/note", "resource");
 }
 
 ProbeTalk::~ProbeTalk() {

@@ -31,6 +31,7 @@ public:
         std::string container;
         std::string otherContainer;
         std::vector<std::string> sockets; // to which others listen
+        std::vector<std::string> files;   // that only others may read
         bool hasSuid = false;
     };
 
