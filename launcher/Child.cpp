@@ -30,6 +30,9 @@ static_assert(statusDescriptor < lowestOwnDescriptor);
 // What programs are used to: one that calls select() breaks above it.
 constexpr rlim_t openFiles = 1024;
 
+// Of one plug-in's user id, all its instances together: the box survives one that forks for ever.
+constexpr rlim_t processes = 512;
+
 // All that the child needs, so that it takes no memory.
 struct ChildPlan {
     const ProgramText& arguments;
@@ -83,6 +86,12 @@ void limitResources() {
     require(::setrlimit(RLIMIT_NOFILE, &files) == 0, ChildStep::limits);
 }
 
+// Only for a user id that the instance shares with nobody else: another's count is not its own.
+void limitProcesses() {
+    const rlimit limit{processes, processes};
+    require(::setrlimit(RLIMIT_NPROC, &limit) == 0, ChildStep::limits);
+}
+
 // By the kernel's own calls: the library's concern all threads, of which it would keep a list.
 void becomeUser(uid_t user) {
     require(::syscall(SYS_setgroups, 0, nullptr) == 0, ChildStep::user);
@@ -118,8 +127,10 @@ bool isScript() {
 [[noreturn]] void becomeProgram(const ChildPlan& plan) {
     arrangeDescriptors(plan);
     limitResources();
-    if (plan.user)
+    if (plan.user) {
+        limitProcesses();
         becomeUser(*plan.user);
+    }
     require(::chdir(plan.folder) == 0, ChildStep::folder);
     dieWithLauncher(plan.launcher);
     unblockSignals();
