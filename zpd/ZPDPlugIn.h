@@ -19,7 +19,6 @@ struct ExternalService;
 
 class ZPDEntitlementHolder;
 class ZPDIpcClient;
-class ZPDLaunchEnvironment;
 class ZPDPlugInInfo;
 
 // The daemon's record of one plug-in: the shared record and what only the registry knows of it,
@@ -187,7 +186,7 @@ private:
                                                      const platform::Dictionary& environment) const;
     [[nodiscard]] platform::ExternalService externalService(const std::string& executable) const;
     [[nodiscard]] static std::string shownVersion(const ZPDPlugInInfo* info);
-    void addContainer(ZPDLaunchEnvironment& environment, const ZPDPlugInInfo* info) const;
+    [[nodiscard]] platform::Dictionary containerVariables(const ZPDPlugInInfo* info) const;
     [[nodiscard]] platform::Dictionary serviceOf(const ZPDPlugInInfo* info) const;
     [[nodiscard]] std::string_view sandboxProfile(const ZPDPlugInInfo* info) const;
     [[nodiscard]] std::string_view keyboardProfile(const ZPDPlugInInfo& info) const;

@@ -3,6 +3,9 @@
 // executable is looked for.
 
 #include <cstdlib>
+#include <initializer_list>
+#include <utility>
+#include <vector>
 
 #include "Zephrin/InfoKeys.h"
 #include "Zephrin/ZPDError.h"
@@ -12,7 +15,6 @@
 #include "platform/jobs/Jobs.h"
 #include "zpd/ZPDIpcClient.h"
 #include "zpd/ZPDJobName.h"
-#include "zpd/ZPDLaunchEnvironment.h"
 #include "zpd/ZPDPlugIn.h"
 #include "zpd/ZPDPlugInInfo.h"
 
@@ -59,6 +61,20 @@ constexpr ProfileOfPoint profiles[] = {
 
 std::string_view textOf(const Value* value) {
     return value ? value->string().value_or("") : "";
+}
+
+Dictionary daemonVariables() {
+    const char* const sdk = std::getenv(testSdk);
+    return sdk ? Dictionary{{testSdk, sdk}} : Dictionary();
+}
+
+// All entries, of equal keys the last one. What no process can have in its environment the job
+// manager leaves out.
+Dictionary laterWins(std::initializer_list<Dictionary> sources) {
+    std::vector<platform::DictionaryEntry> entries;
+    for (const Dictionary& source : sources)
+        entries.insert(entries.end(), source.begin(), source.end());
+    return Dictionary(std::move(entries));
 }
 
 // Empty when there is none.
@@ -116,18 +132,13 @@ std::string ZPDPlugIn::shownVersion(const ZPDPlugInInfo* info) {
 
 // ---- The overlay
 
-// Later sources of the environment win: the request, the container, the daemon, the bundle.
 Dictionary ZPDPlugIn::launchOverlay(const ZPDPlugInInfo* info, const Dictionary& requested) const {
-    ZPDLaunchEnvironment environment;
-    environment.add(requested);
-    addContainer(environment, info);
+    const Dictionary ofContainer = containerVariables(info);
     const std::string_view profile = sandboxProfile(info);
-    if (const char* const sdk = std::getenv(testSdk))
-        environment.add(testSdk, sdk);
     Dictionary service = serviceOf(info);
-    if (const Dictionary* const own = service.findDictionary(environmentKey))
-        environment.add(*own);
-    service.set(environmentKey, environment.dictionary());
+    const Dictionary* const own = service.findDictionary(environmentKey);
+    service.set(environmentKey,
+                laterWins({requested, ofContainer, daemonVariables(), own ? *own : Dictionary()}));
     service.set(profileKey, profile);
     service.set(omitParametersKey, true);
     ZPDLogAr().info("assigning plug-in %@(%@) %{public}@ to %s sandbox", identifier(),
@@ -135,15 +146,15 @@ Dictionary ZPDPlugIn::launchOverlay(const ZPDPlugInInfo* info, const Dictionary&
     return {{serviceKey, service}, {packageTypeKey, packageType}};
 }
 
-void ZPDPlugIn::addContainer(ZPDLaunchEnvironment& environment, const ZPDPlugInInfo* info) const {
+Dictionary ZPDPlugIn::containerVariables(const ZPDPlugInInfo* info) const {
     const auto container = dataContainerPath();
     if (!container) {
-        return ZPDLogAr().debug("no data container for plug-in %@(%@) %{public}@ at %@",
-                                identifier(), shownVersion(info), uuid(), path());
+        ZPDLogAr().debug("no data container for plug-in %@(%@) %{public}@ at %@", identifier(),
+                         shownVersion(info), uuid(), path());
+        return {};
     }
-    environment.add("HOME", *container);
-    environment.add("BQFIXED_USER_HOME", *container);
-    environment.add("TMPDIR", *container + "/tmp");
+    return {
+        {"HOME", *container}, {"BQFIXED_USER_HOME", *container}, {"TMPDIR", *container + "/tmp"}};
 }
 
 Dictionary ZPDPlugIn::serviceOf(const ZPDPlugInInfo* info) const {
