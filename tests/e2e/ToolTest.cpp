@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <csignal>
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <gmock/gmock.h>
@@ -26,6 +27,7 @@ protected:
         return Program({.command = command,
                         .settings = {{"ZEPHRIN_HOME", home.path()}, {"TZ", "UTC"}},
                         .errorFile = home / "errors",
+                        .inputFile = fs::exists(input) ? input : "/dev/null",
                         .outputFile = home / "output",
                         .outputFd = outputFd});
     }
@@ -38,6 +40,16 @@ protected:
     }
 
     [[nodiscard]] std::string output() const { return readFile(home / "output"); }
+
+    // A plug-in that answers lines, and its UUID.
+    [[nodiscard]] std::string addTalker() {
+        addProgram(addAppWith(home, "Some", {.identifier = "some"}) + "/plugin", "launcher_probe");
+        start();
+        return uuidAt(talker);
+    }
+
+    const std::string input = home / "input"; // where there is one
+    const std::string talker = home / "Applications/Some.app/PlugIns/Some.appex";
 
     [[nodiscard]] std::string uuidAt(const std::string& path) {
         return findAt(*client, path)["uuid"].text();
@@ -155,6 +167,68 @@ TEST_F(Tool, MonitorTellsOfChangesAndEndsWell) {
     elect();
     EXPECT_EQ(counted.exitStatus(), 0);
     EXPECT_EQ(lines(), 1);
+}
+
+TEST_F(Tool, RunsAPlugInUntilItHangsUp) {
+    const std::string uuid = addTalker();
+    writeFile(input, "descriptors\nexit\n");
+    EXPECT_EQ(run({"run", uuid}), "0 ready\n0:null 1:null 2:null 3:socket\n");
+    EXPECT_THAT(run({"run", uuid, "--env", "A=B"}),
+                testing::StartsWith("1 zpctl: Transmission of environment variables requires the"));
+    EXPECT_THAT(run({"access", uuid}), HasSubstr(uuid + "  zsx1;"));
+
+    fs::remove(input);
+    ASSERT_EQ(::mkfifo(input.c_str(), 0600), 0);
+    const int silent = ::open(input.c_str(), O_RDWR | O_CLOEXEC);
+    int ends[2];
+    ASSERT_EQ(::pipe2(ends, O_CLOEXEC), 0);
+    Program talk = begin({"run", uuid}, ends[1]);
+    char said[6];
+    ASSERT_EQ(::read(ends[0], said, sizeof said), 6);
+    const std::string host = std::to_string(talk.pid()) + " " + builtProgram("zpctl");
+    EXPECT_THAT(run({"ps"}), AllOf(HasSubstr("some"), HasSubstr("  plugin  "), HasSubstr(host),
+                                   HasSubstr("\n1 plug-in running\n")));
+    EXPECT_THAT(run({"--json", "hold", "--refuse-busy", talker, "--", "true"}),
+                AllOf(testing::StartsWith("1 "), HasSubstr("\"code\": 14"),
+                      HasSubstr("\"conflicts\": [\n      \"some\"\n")));
+    talk.signal(SIGINT);
+    EXPECT_EQ(talk.exitStatus(), 128 + SIGINT);
+    EXPECT_TRUE(eventually([&] { return run({"ps"}) == "0 0 plug-ins running\n"; }));
+    for (const int each : {silent, ends[0], ends[1]})
+        ::close(each);
+}
+
+TEST_F(Tool, HoldsWhileACommandRuns) {
+    const std::string uuid = addTalker();
+    const std::string denied = "access to plugin some denied: the plug-in is on hold (code 11)\n";
+    const std::pair<std::vector<std::string>, std::string> cases[] = {
+        {{"sh", "-c", "echo done; exit 7"}, "7 done\n"},
+        {{"sh", "-c", "kill -9 $$"}, "137 "},
+        {{"no-such-command"}, "127 zpctl: no-such-command: No such file or directory\n"},
+        {{"/etc/passwd"}, "126 zpctl: /etc/passwd: Permission denied\n"},
+        {{builtProgram("zpctl"), "--service", "e2e", "ready", uuid}, "1 zpctl: " + denied},
+    };
+    for (const auto& [command, result] : cases) {
+        std::vector<std::string> words = {"hold", "--app", home / "Applications/Some.app", "--"};
+        words.insert(words.end(), command.begin(), command.end());
+        EXPECT_EQ(run(words), result);
+        EXPECT_EQ(run({"ready", uuid}), "0 " + uuid + " can be launched\n");
+    }
+
+    Program stubborn = begin({"hold", talker, "--", "sh", "-c",
+                              "trap 'exit 9' TERM; echo on; while :; do sleep 0.05; done"});
+    ASSERT_TRUE(eventually([&] { return output() == "on\n"; }));
+    stubborn.signal(SIGTERM);
+    EXPECT_EQ(stubborn.exitStatus(), 9) << "the command was told";
+
+    Program hold = begin({"hold", talker});
+    ASSERT_TRUE(eventually([&] { return output().ends_with(talker + "\n"); }));
+    const std::string token = output().substr(std::string("holding by token ").size(), 36);
+    EXPECT_EQ(run({"ready", uuid}), "1 zpctl: " + denied);
+    EXPECT_THAT(run({"release", token}), testing::StartsWith("0 no hold by token " + token));
+    EXPECT_EQ(run({"ready", uuid}), "0 " + uuid + " can be launched\n");
+    hold.signal(SIGINT);
+    EXPECT_EQ(hold.exitStatus(), 0);
 }
 
 } // namespace
