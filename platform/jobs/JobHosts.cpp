@@ -20,10 +20,16 @@ bool isSameProcess(const ipc::Peer& a, const ipc::Peer& b) {
     return a.pid == b.pid && ipc::isAlive(a) && ipc::isAlive(b) && ipc::isAlive(a);
 }
 
+JobHost* JobHosts::hostOf(const ipc::Peer& process) {
+    const auto [first, last] = hosts_.equal_range(process.pid);
+    const auto found = std::find_if(first, last, [&](const auto& entry) {
+        return isSameProcess(*entry.second.process, process);
+    });
+    return found == last ? nullptr : &found->second;
+}
+
 const JobHost* JobHosts::hostOf(const ipc::Peer& process) const {
-    const auto place = hosts_.find(process.pid);
-    const bool known = place != hosts_.end() && isSameProcess(*place->second.process, process);
-    return known ? &place->second : nullptr;
+    return const_cast<JobHosts*>(this)->hostOf(process);
 }
 
 int JobHosts::add(const std::shared_ptr<const ipc::Peer>& process,
@@ -31,8 +37,8 @@ int JobHosts::add(const std::shared_ptr<const ipc::Peer>& process,
     if (process->pid <= 0 || !ipc::isAlive(*process))
         return ESRCH;
     JobHost fresh{process, {}, nullptr};
-    const bool known = hostOf(*process);
-    JobHost& host = known ? hosts_.at(process->pid) : fresh;
+    JobHost* const known = hostOf(*process);
+    JobHost& host = known ? *known : fresh;
     if (!mayAdd(host, *service))
         return EDQUOT;
     if (!known && !(fresh.exit = watch(fresh)))
@@ -42,7 +48,7 @@ int JobHosts::add(const std::shared_ptr<const ipc::Peer>& process,
     });
     host.services.push_back(std::move(service));
     if (!known)
-        hosts_.insert_or_assign(process->pid, std::move(fresh));
+        hosts_.emplace(process->pid, std::move(fresh));
     return 0;
 }
 
@@ -78,12 +84,9 @@ std::size_t JobHosts::remove(std::string_view identifier, std::string_view versi
     return count;
 }
 
-bool JobHosts::forget(const ipc::Peer& process) {
-    const auto place = hosts_.find(process.pid);
-    if (place == hosts_.end() || place->second.process.get() != &process)
-        return false;
-    hosts_.erase(place);
-    return true;
+void JobHosts::forget(const ipc::Peer& process) {
+    std::erase_if(hosts_,
+                  [&](const auto& entry) { return entry.second.process.get() == &process; });
 }
 
 JobHosts::Found JobHosts::find(const ipc::Peer& process, const ServiceChoice& choice) const {
@@ -100,6 +103,13 @@ JobHosts::Found JobHosts::find(const ipc::Peer& process, const ServiceChoice& ch
     if (found == host->services.rend())
         return {};
     return {host->process, *found};
+}
+
+bool JobHosts::holds(const Found& found) const {
+    return std::ranges::any_of(std::views::values(hosts_), [&](const JobHost& host) {
+        return host.process == found.host &&
+               std::ranges::find(host.services, found.service) != host.services.end();
+    });
 }
 
 } // namespace platform

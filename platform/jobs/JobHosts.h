@@ -52,8 +52,8 @@ public:
                           std::shared_ptr<const JobService> service, const Watcher& watch);
     // Takes it from all hosts; tells how many had it.
     std::size_t remove(std::string_view identifier, std::string_view version);
-    // The host is gone. False when it is not this process that is on record.
-    bool forget(const ipc::Peer& process);
+    // The host, by the object that it was added with, is gone.
+    void forget(const ipc::Peer& process);
 
     struct Found {
         std::shared_ptr<const ipc::Peer> host; // as it is on record
@@ -62,12 +62,16 @@ public:
 
     // The one that was added last, of those that fit; empty when there is none.
     [[nodiscard]] Found find(const ipc::Peer& process, const ServiceChoice& choice) const;
+    // Whether what was found is still there.
+    [[nodiscard]] bool holds(const Found& found) const;
 
 private:
     [[nodiscard]] const JobHost* hostOf(const ipc::Peer& process) const;
+    [[nodiscard]] JobHost* hostOf(const ipc::Peer& process);
     [[nodiscard]] bool mayAdd(const JobHost& host, const JobService& service) const;
 
-    std::map<pid_t, JobHost> hosts_;
+    // Where a pid is used again, the process that had it first stays until its exit was seen to.
+    std::multimap<pid_t, JobHost> hosts_;
 };
 
 } // namespace platform

@@ -58,31 +58,23 @@ std::unique_ptr<ipc::Watch> JobManager::watch(const JobHost& host) {
 
 // Runs on the loop.
 void JobManager::hostExited(const std::shared_ptr<const ipc::Peer>& host) {
-    std::vector<Launcher::Id> ended;
+    std::vector<Number> ended;
     {
         const std::lock_guard lock(mutex_);
-        if (!hosts_.forget(*host))
-            return;
+        hosts_.forget(*host);
         for (const auto& [number, instance] : instances_) {
             if (instance.host == host)
-                ended.push_back(instance.launch);
+                ended.push_back(number);
         }
     }
-    for (const Launcher::Id id : ended)
-        launcher_.end(id);
+    end(ended);
 }
 
+// What is added after this call stays. The last instance that lets the removal go answers.
 void JobManager::removeExternalService(std::string_view identifier, std::string_view version,
                                        std::shared_ptr<SerialQueue> queue, Answer answer) {
-    auto removal = std::make_shared<JobRemoval>(std::move(queue), std::move(answer));
-    loop_.post([this, removal = std::move(removal), identifier = std::string(identifier),
-                version = std::string(version)] { remove(identifier, version, removal); });
-}
-
-// Runs on the loop. Answers when the last instance lets the removal go.
-void JobManager::remove(std::string_view identifier, std::string_view version,
-                        const std::shared_ptr<JobRemoval>& removal) {
-    std::vector<Launcher::Id> ended;
+    const auto removal = std::make_shared<JobRemoval>(std::move(queue), std::move(answer));
+    std::vector<Number> ended;
     {
         const std::lock_guard lock(mutex_);
         hosts_.remove(identifier, version);
@@ -91,13 +83,20 @@ void JobManager::remove(std::string_view identifier, std::string_view version,
             if (what.identifier != identifier || what.version != version)
                 continue;
             instance.removals.push_back(removal);
-            ended.push_back(instance.launch);
+            ended.push_back(number);
         }
     }
     if (ended.empty())
-        removal->answerWith(nothingOnRecord);
-    for (const Launcher::Id id : ended)
-        launcher_.end(id);
+        return removal->answerWith(nothingOnRecord);
+    loop_.post([this, ended = std::move(ended)] { end(ended); });
+}
+
+// Runs on the loop.
+void JobManager::end(const std::vector<Number>& instances) {
+    for (const Number number : instances) {
+        if (const auto place = instances_.find(number); place != instances_.end())
+            launcher_.end(place->second.launch);
+    }
 }
 
 bool JobManager::isShutOut(const ipc::Peer& peer) {

@@ -104,8 +104,7 @@ private:
 
     [[nodiscard]] std::unique_ptr<ipc::Watch> watch(const JobHost& host);
     void hostExited(const std::shared_ptr<const ipc::Peer>& host);
-    void remove(std::string_view identifier, std::string_view version,
-                const std::shared_ptr<JobRemoval>& removal);
+    void end(const std::vector<Number>& instances);
 
     struct Prepared {
         JobInstance instance;
@@ -116,6 +115,7 @@ private:
     [[nodiscard]] std::expected<Prepared, Error> prepare(const ipc::Peer& host,
                                                          const ServiceChoice& choice);
     [[nodiscard]] bool mayStart(const ipc::Peer& host);
+    [[nodiscard]] bool record(Number number, JobInstance instance);
     void didStart(Number number, std::expected<Launcher::Started, Error> outcome, UniqueFd socket,
                   StartedBlock started);
     void drop(Number number, int code);

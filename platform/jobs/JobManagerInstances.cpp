@@ -55,6 +55,12 @@ std::string nameOf(const ServiceChoice& choice) {
     return choice.identifier ? *choice.identifier : describe(Value(choice.uuid.value_or(Uuid{})));
 }
 
+Error notReady(const ServiceChoice& choice) {
+    return jobError(
+        jobErrorNotFound,
+        log::renderText("plug-in %@ was not made ready for this process", nameOf(choice)));
+}
+
 Error cannotStart(const JobService& service, const Error& why) {
     return jobError(jobErrorRefused,
                     log::renderText("cannot start plug-in %@: %@", service.what.identifier,
@@ -90,11 +96,8 @@ void JobManager::start(const ipc::Peer& host, const ServiceChoice& choice, Start
     if (!prepared)
         return started(std::unexpected(std::move(prepared).error()));
     const Number number = ++lastNumber_;
-    {
-        const std::lock_guard lock(mutex_);
-        instances_.emplace(number, std::move(prepared->instance));
-        ++instanceCount_;
-    }
+    if (!record(number, std::move(prepared->instance)))
+        return started(std::unexpected(notReady(choice)));
     const Launcher::Id id = launcher_.launch(
         std::move(prepared->launch),
         [this, number, socket = std::move(prepared->socket),
@@ -115,11 +118,8 @@ std::expected<JobManager::Prepared, Error> JobManager::prepare(const ipc::Peer& 
         instance.host = found.host;
         instance.service = found.service;
     }
-    if (!instance.service) {
-        return std::unexpected(jobError(
-            jobErrorNotFound,
-            log::renderText("plug-in %@ was not made ready for this process", nameOf(choice))));
-    }
+    if (!instance.service)
+        return std::unexpected(notReady(choice));
     if (!mayStart(host)) {
         return std::unexpected(
             jobError(jobErrorRefused, "too many plug-ins of this user are running"));
@@ -142,6 +142,16 @@ std::expected<JobManager::Prepared, Error> JobManager::prepare(const ipc::Peer& 
                                             .container = what.container,
                                             .user = what.user}};
     return Prepared{std::move(instance), std::move(launch), std::move(sockets->host)};
+}
+
+// Not when the service was removed meanwhile: who removed it must not find an instance later.
+bool JobManager::record(Number number, JobInstance instance) {
+    const std::lock_guard lock(mutex_);
+    if (!hosts_.holds({instance.host, instance.service}))
+        return false;
+    instances_.emplace(number, std::move(instance));
+    ++instanceCount_;
+    return true;
 }
 
 bool JobManager::mayStart(const ipc::Peer& host) {

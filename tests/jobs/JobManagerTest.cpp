@@ -299,6 +299,20 @@ TEST_F(JobManagerTest, ARemovalIsAnsweredWhenAllInstancesAreGone) {
     EXPECT_EQ(jobs_.instances(), Array());
 }
 
+TEST_F(JobManagerTest, WhatIsAddedAfterARemovalStays) {
+    ASSERT_EQ(add(service()), 0);
+    ASSERT_TRUE(start());
+    std::promise<void> resumed;
+    loop_.post([&] { resumed.get_future().wait(); });
+    auto code = remove();
+    ASSERT_EQ(add(service()), 0);
+    resumed.set_value();
+    EXPECT_THAT(askedToEnd(), ElementsAre(1U));
+    EXPECT_EQ(startError(), "");
+    launcher_.ended(1);
+    EXPECT_EQ(code.get(), 0) << "not for the new one";
+}
+
 TEST_F(JobManagerTest, AHostThatExitsTakesItsInstancesWithIt) {
     Idler host;
     const auto peer = host.peer();
