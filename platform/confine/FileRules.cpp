@@ -54,6 +54,9 @@ constexpr SystemPath systemPaths[] = {
     {"/etc/ssl/openssl.cnf", mayRead, true},
     {"/etc/ssl/certs", mayRead, true},
     {"/etc/ca-certificates", mayRead, true},
+    {"/run/systemd/resolve", mayRead, true}, // where resolv.conf may be a link to
+    {"/run/resolvconf", mayRead, true},
+    {"/run/connman", mayRead, true},
 };
 
 class Adder {

@@ -1,6 +1,6 @@
 #include "platform/confine/KernelFeatures.h"
 
-#include <algorithm>
+#include <cstdint>
 #include <linux/seccomp.h>
 #include <sys/prctl.h>
 #include <sys/syscall.h>

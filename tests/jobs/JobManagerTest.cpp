@@ -18,6 +18,7 @@
 #include "tests/platform/TestFolder.h"
 #include "tests/server/Awaited.h"
 #include "tests/support/Files.h"
+#include "tests/support/LogOf.h"
 #include "tests/support/PeerOfProcess.h"
 
 namespace fs = std::filesystem;
@@ -38,7 +39,7 @@ struct FakeLauncher final : Launcher {
             if (failure)
                 started(std::unexpected(posixError(failure, "exec")));
             else
-                started(Started{pid, {}, {{"wanted", Dictionary{}}}});
+                started(Started{pid, {}, confinement});
         });
         return ends.size();
     }
@@ -52,6 +53,7 @@ struct FakeLauncher final : Launcher {
     ipc::Loop& loop;
     int failure = 0;
     pid_t pid = 4'000'000; // of nobody
+    Dictionary confinement{{"wanted", Dictionary{}}};
     std::vector<Launch> launches;
     std::vector<Id> asked;
     std::vector<EndedBlock> ends;
@@ -219,6 +221,19 @@ TEST_F(JobManagerTest, AStartedPlugInGetsWhatWasAddedAndIsConnected) {
     byte = 0;
     ASSERT_EQ(::recv(started->socket.get(), &byte, 1, 0), 1);
     EXPECT_EQ(byte, 'x');
+}
+
+TEST_F(JobManagerTest, WhatTheKernelLacksIsTold) {
+    const Dictionary whole{{"files", "landlock"}, {"signals", "landlock"}};
+    const Dictionary part{{"files", "landlock"}, {"signals", "seccomp"}};
+    ASSERT_EQ(add(service()), 0);
+    for (const Dictionary& enforced : {whole, part}) {
+        launcher_.confinement = {{"wanted", whole}, {"enforced", enforced}};
+        const std::string log = logOf([this] { EXPECT_TRUE(start()); });
+        const bool told = log.find("com.example.a is confined by " + describe(Value(part)) +
+                                   "; wanted was " + describe(Value(whole))) != log.npos;
+        EXPECT_EQ(told, enforced == part) << log;
+    }
 }
 
 TEST_F(JobManagerTest, TheServiceAddedLastOfThoseThatFitIsStarted) {
