@@ -48,6 +48,8 @@ TEST_F(Sandbox, ConfinedProcessesReadABundleByItsToken) {
     EXPECT_EQ(talk->ask("open Resources/none"), "ENOENT");
     EXPECT_EQ(talk->ask("expel"), "-1");
     EXPECT_EQ(talk->ask("open Resources/note"), "EBADF");
+    const std::string ofService = findAt(*client, bundle)["service-extension"].text();
+    EXPECT_EQ(talk->ask("consume " + ofService), "nothing");
 }
 
 TEST_F(Sandbox, ADescriptorDoesNotLeadOutOfAMountNamespace) {

@@ -5,7 +5,11 @@
 #include <cerrno>
 #include <fcntl.h>
 #include <filesystem>
+#include <linux/landlock.h>
+#include <sys/prctl.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
+#include <thread>
 #include <unistd.h>
 
 #include <gtest/gtest.h>
@@ -99,6 +103,28 @@ TEST_F(SandboxBrokerTest, GivesFilesAndFoldersToRead) {
     EXPECT_EQ(client_.release(*handle), 0);
     EXPECT_EQ(client_.release(*handle), EBADF);
     EXPECT_EQ(client_.release(-1), EBADF);
+}
+
+// The calling thread can open nothing to read from here on.
+bool confineThread() {
+    landlock_ruleset_attr nothing{};
+    nothing.handled_access_fs = LANDLOCK_ACCESS_FS_READ_FILE | LANDLOCK_ACCESS_FS_READ_DIR;
+    const UniqueFd rules(static_cast<int>(
+        ::syscall(SYS_landlock_create_ruleset, &nothing, sizeof nothing.handled_access_fs, 0)));
+    return rules && ::prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0 &&
+           ::syscall(SYS_landlock_restrict_self, rules.get(), 0) == 0;
+}
+
+TEST_F(SandboxBrokerTest, GivesWhatTheClientCouldNotOpen) {
+    const std::string file = token(bundle_ + "/file");
+    const std::string whole = token(bundle_);
+    std::jthread([&] {
+        ASSERT_TRUE(confineThread());
+        EXPECT_FALSE(UniqueFd(::open((bundle_ + "/file").c_str(), O_RDONLY)));
+        EXPECT_EQ(consumed(file), "content");
+        EXPECT_EQ(opened(whole, "Resources/deep/file"), "deep");
+        EXPECT_EQ(opened(whole, "../outside"), "EINVAL");
+    }).join();
 }
 
 TEST_F(SandboxBrokerTest, GivesNothingForOtherTokens) {
