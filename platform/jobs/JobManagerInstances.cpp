@@ -93,8 +93,11 @@ void tellWhatIsLacking(const JobService& service, const Launcher::Started& start
 
 void JobManager::start(const ipc::Peer& host, const ServiceChoice& choice, StartedBlock started) {
     auto prepared = prepare(host, choice);
-    if (!prepared)
+    if (!prepared) {
+        jobLog().info("refused to start for process %{public}d: %@", host.pid,
+                      prepared.error().description.value_or(""));
         return started(std::unexpected(std::move(prepared).error()));
+    }
     const Number number = ++lastNumber_;
     if (!record(number, std::move(prepared->instance)))
         return started(std::unexpected(notReady(choice)));

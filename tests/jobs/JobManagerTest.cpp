@@ -328,23 +328,6 @@ TEST_F(JobManagerTest, WhatIsAddedAfterARemovalStays) {
     EXPECT_EQ(code.get(), 0) << "not for the new one";
 }
 
-TEST_F(JobManagerTest, AHostThatExitsTakesItsInstancesWithIt) {
-    Idler host;
-    const auto peer = host.peer();
-    ASSERT_EQ(jobs_.addExternalService(peer, service(), overlay()), 0);
-    ASSERT_EQ(add(service()), 0);
-    ASSERT_TRUE(start());
-    const bool started = onLoop([&] {
-        jobs_.start(*peer, {.identifier = "com.example.a", .version = {}, .uuid = {}}, [](auto) {});
-        return launcher_.launches.size() == 2;
-    });
-    ASSERT_TRUE(started);
-    host.end();
-    while (askedToEnd().empty())
-        std::this_thread::yield();
-    EXPECT_THAT(askedToEnd(), ElementsAre(2U));
-}
-
 TEST_F(JobManagerTest, NobodyGetsMoreThanTheLimits) {
     for (std::size_t i = 0; i < JobHosts::servicesOfHost; ++i)
         ASSERT_EQ(add(service("com.example.a", std::to_string(i))), 0);

@@ -4,6 +4,8 @@
 #include <fcntl.h>
 #include <sys/socket.h>
 #include <unistd.h>
+#include <utility>
+#include <vector>
 
 #include <gtest/gtest.h>
 
@@ -33,16 +35,11 @@ TEST(PlugInSocketTest, TakesWhatIsASocketOnce) {
 TEST(PlugInSocketTest, LeavesAnythingElseAlone) {
     const UniqueFd file(::open("/dev/null", O_RDONLY));
     const UniqueFd datagrams = half(SOCK_DGRAM);
-    const std::string number = std::to_string(half(SOCK_STREAM).get()); // closed by now
-    const std::pair<std::string, int> cases[] = {{"", EBADF},
-                                                 {"0", EBADF},
-                                                 {"-1", EBADF},
-                                                 {"3x", EBADF},
-                                                 {" 3", EBADF},
-                                                 {"99999999999", EBADF},
-                                                 {number, EBADF},
-                                                 {std::to_string(file.get()), ENOTSOCK},
-                                                 {std::to_string(datagrams.get()), ENOTSOCK}};
+    std::vector<std::pair<std::string, int>> cases;
+    for (const char* text : {"", "0", "-1", "3x", " 3", "99999999999", "9999"})
+        cases.emplace_back(text, EBADF);
+    for (const UniqueFd* open : {&file, &datagrams})
+        cases.emplace_back(std::to_string(open->get()), ENOTSOCK);
     for (const auto& [text, error] : cases) {
         ::setenv(ZPPlugInSocket::variable, text.c_str(), 1);
         const auto taken = ZPPlugInSocket::take();
