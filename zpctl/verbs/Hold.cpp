@@ -48,6 +48,8 @@ With --json: {"released": token}.)";
 constexpr int commandNotFound = 127;
 constexpr int commandNotRun = 126;
 
+constexpr int signalBase = 128;
+
 struct Arguments {
     std::vector<std::string> paths;
     bool applications = false;
@@ -95,7 +97,9 @@ Status hold(const Arguments& arguments, Session& session) {
     if (!token)
         return session.fail(token.error());
     Status status = Status::done;
-    if (session.command().empty()) {
+    if (const int signal = signals.take(); signal != 0) {
+        status = Status(signalBase + signal); // came while the daemon was asked
+    } else if (session.command().empty()) {
         tell(*token, paths, session);
         waitForTheEnd(signals, session);
     } else {
