@@ -28,10 +28,6 @@ JobHost* JobHosts::hostOf(const ipc::Peer& process) {
     return found == last ? nullptr : &found->second;
 }
 
-const JobHost* JobHosts::hostOf(const ipc::Peer& process) const {
-    return const_cast<JobHosts*>(this)->hostOf(process);
-}
-
 int JobHosts::add(const std::shared_ptr<const ipc::Peer>& process,
                   std::shared_ptr<const JobService> service, const Watcher& watch) {
     if (process->pid <= 0 || !ipc::isAlive(*process))
@@ -89,7 +85,7 @@ void JobHosts::forget(const ipc::Peer& process) {
                   [&](const auto& entry) { return entry.second.process.get() == &process; });
 }
 
-JobHosts::Found JobHosts::find(const ipc::Peer& process, const ServiceChoice& choice) const {
+JobHosts::Found JobHosts::find(const ipc::Peer& process, const ServiceChoice& choice) {
     const JobHost* const host = hostOf(process);
     if (!host)
         return {};

@@ -61,12 +61,11 @@ public:
     };
 
     // The one that was added last, of those that fit; empty when there is none.
-    [[nodiscard]] Found find(const ipc::Peer& process, const ServiceChoice& choice) const;
+    [[nodiscard]] Found find(const ipc::Peer& process, const ServiceChoice& choice);
     // Whether what was found is still there.
     [[nodiscard]] bool holds(const Found& found) const;
 
 private:
-    [[nodiscard]] const JobHost* hostOf(const ipc::Peer& process) const;
     [[nodiscard]] JobHost* hostOf(const ipc::Peer& process);
     [[nodiscard]] bool mayAdd(const JobHost& host, const JobService& service) const;
 

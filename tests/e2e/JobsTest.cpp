@@ -132,6 +132,7 @@ TEST_F(Jobs, WhoeverEndsTakesTheirInstancesAlong) {
 
     const pid_t ofTwo = pidFrom(two->ask("pid"));
     const pid_t before = launcher();
+    ASSERT_GT(before, 1);
     ASSERT_EQ(::kill(before, SIGKILL), 0);
     EXPECT_TRUE(vanishes(ofTwo) && vanishes(before));
     ASSERT_EQ(startIn(*two), "ready") << "by another launcher";
