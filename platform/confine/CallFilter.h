@@ -6,7 +6,7 @@
 
 #include "platform/value/Error.h"
 
-struct sock_filter;
+struct sock_filter; // NOLINT(readability-identifier-naming): the kernel's
 
 namespace platform {
 

@@ -109,6 +109,7 @@ void tryEverything(const Stage& stage) {
                                   .bundle = bundle,
                                   .container = container,
                                   .otherContainer = stage.folder / "other",
+                                  .library = "",
                                   .sockets = {},
                                   .files = {},
                                   .hasSuid = stage.hasSuid});

@@ -9,6 +9,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <dlfcn.h>
 #include <fcntl.h>
 #include <functional>
 #include <linux/capability.h>
@@ -32,7 +33,7 @@
 #include <unistd.h>
 
 // In builds with AddressSanitizer: its leak check traces the process, which a plug-in cannot have.
-extern "C" const char* __asan_default_options() { // NOLINT(bugprone-reserved-identifier)
+extern "C" const char* __asan_default_options() { // NOLINT(*-reserved-identifier,*-naming)
     return "detect_leaks=0";
 }
 
@@ -162,6 +163,7 @@ const std::map<std::string_view, Attempt> files = {
     {"rename",
      [](const auto& path) { return outcome(::rename(path.c_str(), (path + "-2").c_str())); }},
     {"link", [](const auto& path) { return outcome(::symlink("anywhere", path.c_str())); }},
+    {"load", [](const auto& path) { return ::dlopen(path.c_str(), RTLD_NOW) ? 0 : EACCES; }},
     {"run", [](const auto& path) { return run(path, "nothing"); }},
     {"gain", [](const auto& path) { return run(path, "root"); }},
     {"unix", [](const auto& path) { return toUnix(path, SOCK_STREAM); }},

@@ -39,7 +39,7 @@ protected:
     Confined() {
         for (const char* name : {"zpd", "zpd-launcher", "zpctl"})
             (void)addProgram(home / (std::string("bin/") + name), name);
-        (void)addProgram(home / "lib/libZephrin.so.0", "../lib/libZephrin.so.0");
+        (void)addProgram(library_, "../lib/libZephrin.so.0");
         addProbe("Typing", "com.tovana.keyboard-service");
         addProbe("Widget", "com.tovana.widget");
     }
@@ -67,6 +67,7 @@ protected:
              .bundle = bundleOf(name),
              .container = containerOf(name),
              .otherContainer = containerOf(other),
+             .library = library_,
              .sockets = {daemon->socketPath(), home / "run/com.tovana.jobd",
                          home / "run/com.tovana.sandbox"},
              .files = {home / "annotations", home / "lib/AppRegistry.db"},
@@ -98,6 +99,8 @@ protected:
     bool hasSuid = false;
 
 private:
+    const std::string library_ = home / "lib/libZephrin.so.0"; // beside what no plug-in may read
+
     void addProbe(const std::string& name, const std::string& point) const {
         const PlugIn plugIn{.identifier = name,
                             .point = point,

@@ -109,7 +109,8 @@ std::vector<Attempt> ConfinementScene::attempts() const {
     using enum Allowed;
     using enum Control;
     const std::string victim = std::to_string(victim_);
-    const auto& [folder, bundle, container, otherContainer, sockets, files, hasSuid] = places_;
+    const auto& [folder, bundle, container, otherContainer, library, sockets, files, hasSuid] =
+        places_;
     std::vector<Attempt> all = {
         // its own
         {"read " + bundle + "/Resources/note", always, plugIn},
@@ -177,6 +178,8 @@ std::vector<Attempt> ConfinementScene::attempts() const {
         all.push_back({"unix " + path});
     for (const std::string& path : files)
         all.push_back({"read " + path});
+    if (!library.empty())
+        all.push_back({"load " + library, always, daemon});
     if (hasSuid)
         all.push_back({"gain " + bundle + "/suid", never, plugIn});
     return all;

@@ -30,6 +30,7 @@ public:
         std::string bundle; // with a copy of the probe, "probe", and "suid", set-user-id root if so
         std::string container;
         std::string otherContainer;
+        std::string library;              // of the system; none when empty
         std::vector<std::string> sockets; // to which others listen
         std::vector<std::string> files;   // that only others may read
         bool hasSuid = false;
