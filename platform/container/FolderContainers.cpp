@@ -14,26 +14,22 @@ namespace {
 
 constexpr mode_t privateMode = 0700;
 
-// 0, or an errno value.
-int giveFolder(int folder, uid_t owner) {
+bool belongsTo(int folder, uid_t owner) {
     struct ::stat status{};
-    if (::fstat(folder, &status) != 0)
-        return errno;
-    if (status.st_uid == owner && status.st_gid == owner)
-        return 0;
-    return ::fchown(folder, owner, owner) == 0 ? 0 : errno;
+    return ::fstat(folder, &status) == 0 && status.st_uid == owner && status.st_gid == owner;
 }
 
-// A container and its "tmp". The latter first, while the former is not the plug-in's yet; one that
-// a plug-in put something else in place of is left as it is.
-int give(int container, uid_t owner) {
+// A container and its "tmp". The latter first, while the former is not the plug-in's yet: where
+// that is, both were given. What a plug-in put in the place of its "tmp" is left as it is. 0, or an
+// errno value.
+int give(int container, bool isNewInside, uid_t owner) {
+    if (!isNewInside && belongsTo(container, owner))
+        return 0;
     const UniqueFd temporary(
         ::openat(container, "tmp", O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
-    if (temporary) {
-        if (const int failed = giveFolder(temporary.get(), owner))
-            return failed;
-    }
-    return giveFolder(container, owner);
+    if (temporary && ::fchown(temporary.get(), owner, owner) != 0)
+        return errno;
+    return ::fchown(container, owner, owner) == 0 ? 0 : errno;
 }
 
 } // namespace
@@ -52,9 +48,10 @@ std::expected<std::string, Error> FolderContainers::dataContainer(std::string_vi
     const UniqueFd container(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
     if (!container)
         return std::unexpected(posixError(errno, path));
-    if (::mkdirat(container.get(), "tmp", privateMode) != 0 && errno != EEXIST)
+    const bool isNewInside = ::mkdirat(container.get(), "tmp", privateMode) == 0;
+    if (!isNewInside && errno != EEXIST)
         return std::unexpected(posixError(errno, path + "/tmp"));
-    if (const int failed = owner ? give(container.get(), *owner) : 0)
+    if (const int failed = owner ? give(container.get(), isNewInside, *owner) : 0)
         return std::unexpected(posixError(failed, path));
     const auto canonical = canonicalPath(path);
     if (!canonical)

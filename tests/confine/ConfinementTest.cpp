@@ -189,3 +189,13 @@ TEST(Confinement, HoldsForAPlugInOfAnOrdinaryUser) {
         tryEverything(stage);
     });
 }
+
+// The daemon never asks for it; should it, root without its powers is a user like others.
+TEST(Confinement, HoldsForAPlugInOfRoots) {
+    if (::geteuid() != 0)
+        GTEST_SKIP() << "only root can run it";
+    const TestFolder folder;
+    const Stage stage{folder, std::nullopt};
+    makePlaces(stage, probeProgram());
+    tryEverything(stage);
+}
