@@ -33,6 +33,10 @@ bool requestOutputEnabled() noexcept {
     return zpd_request__output_semaphore != 0;
 }
 
+bool pluginReadyEnabled() noexcept {
+    return zpd_plugin__ready_semaphore != 0;
+}
+
 void clientNew(int pid) noexcept {
     STAP_PROBE1(zpd, client__new, pid);
 }

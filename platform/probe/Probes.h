@@ -18,6 +18,7 @@ void requestOutput(int pid, const char* text) noexcept;
 void discoverRaw(unsigned count) noexcept;
 void pluginAdd(const char* path) noexcept;
 void pluginRemove(const char* path, bool resolved) noexcept;
+[[nodiscard]] bool pluginReadyEnabled() noexcept;
 void pluginReady(const char* uuid) noexcept;
 void dbLoad(const char* path, std::uint64_t code) noexcept;
 

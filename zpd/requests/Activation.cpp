@@ -57,7 +57,8 @@ void Transaction::readyListed() {
     const auto plugIns = std::make_shared<PlugIns>();
     std::unordered_set<Uuid> seen;
     const auto check = [&](const ZPDPlugIn::Ptr& plugIn) {
-        platform::probe::pluginReady(plugIn->uuid().text().c_str());
+        if (platform::probe::pluginReadyEnabled())
+            platform::probe::pluginReady(plugIn->uuid().text().c_str());
         if (!seen.insert(plugIn->uuid()).second)
             return true; // nothing changes while this request has the queue
         if (!mayReady(*plugIn))
