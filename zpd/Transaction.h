@@ -232,6 +232,7 @@ private:
     const std::optional<std::string_view> type_; // in the request
     bool leftOpen_ = false;
     std::uint64_t changesBefore_ = 0; // of the annotations, when it was dispatched
+    bool replyWaited_ = false;        // for what it reports being on disk
     bool annotates_ = false;          // also when it stores what is stored already
     // What listed paths lead to, by their place in the list.
     std::unordered_map<std::size_t, platform::Uuid> foundByPath_;

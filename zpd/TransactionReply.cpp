@@ -14,12 +14,14 @@ void Transaction::setMatches(std::optional<platform::Value> matches) {
         reply().set(key, std::move(*matches));
 }
 
-// The reply is copied, since a handler that reports more than once goes on with it.
+// The reply is copied, since a handler that reports more than once goes on with it. A later one
+// never overtakes one that waits.
 void Transaction::done() {
     const std::uint64_t changes = server().annotationChanges();
     const bool mayNeedSaving = annotates_ || changes != changesBefore_;
-    if (!mayNeedSaving || server().areAnnotationsSaved(changes))
+    if (!mayNeedSaving || (!replyWaited_ && server().areAnnotationsSaved(changes)))
         return send(reply_);
+    replyWaited_ = true;
     server().whenAnnotationsSaved(
         changes, [self = shared_from_this(), reply = reply_] { self->send(reply); });
 }
