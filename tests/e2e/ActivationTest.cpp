@@ -8,8 +8,8 @@ namespace e2e {
 namespace {
 
 // Plug-ins: two sound ones, one that only brings data, one that asks its hosts for an entitlement,
-// two that name no executable, and one whose executable is a link, which the job manager does not
-// take.
+// two that name no executable, one whose executable is a link, which the job manager does not take,
+// and a keyboard.
 class ActivationTest : public DaemonTest {
 protected:
     ActivationTest() {
@@ -24,6 +24,9 @@ protected:
         add({.identifier = "linked"});
         fs::rename(pathOf("linked") + "/plugin", pathOf("linked") + "/real");
         fs::create_symlink("real", pathOf("linked") + "/plugin");
+        add({.identifier = "keys",
+             .point = "com.tovana.keyboard-service",
+             .attributes = Item::map({{"RequestsOpenAccess", true}})});
         start();
         for (const Item& form : match(*client))
             uuids[form["identifier"].text()] = form["uuid"].text();
@@ -157,6 +160,30 @@ TEST_F(ActivationTest, IssuesTokensInTheOrderOfTheList) {
         EXPECT_EQ(errorOf(answered), error);
         EXPECT_FALSE(answered.has("extensions"));
     }
+}
+
+TEST_F(ActivationTest, AsksWhatTheUserGrantedEachTime) {
+    const auto consent = [&](const char* act) {
+        Program tool({.command = {builtProgram("zpctl"), "consent", act, "com.example.Some",
+                                  "kConsentServiceKeyboardNetwork"},
+                      .settings = {{"ZEPHRIN_HOME", home.path()}},
+                      .errorFile = home / "zpctl.log"});
+        EXPECT_EQ(tool.exitStatus(), 0) << tool.errors();
+    };
+    const auto ready = [&] { EXPECT_EQ(answer(envelope("ready", listed({"keys"}))), ""); };
+    ready();
+    consent("grant");
+    ready();
+    consent("revoke");
+    ready();
+    consent("grant");
+    fs::permissions(home / "lib/Consent.plist", fs::perms(0666)); // it could be anybody's word
+    ready();
+    stop();
+    const std::string assigning = "ar info: assigning plug-in keys(1.0) " + uuids["keys"] + " to ";
+    expectLog({{assigning + "plugin sandbox", 1},
+               {assigning + "keyboard sandbox", 3},
+               {"default error: ignoring " + home / "lib/Consent.plist", 1}});
 }
 
 } // namespace

@@ -199,6 +199,21 @@ TEST_F(Activation, LetsAKeyboardOutOnlyWithConsent) {
     EXPECT_EQ(profile(), "keyboard");
 }
 
+// Where its paths lead is found out elsewhere; the request is still the host's when it comes back.
+TEST_F(Activation, RestrictsAHostThatNamesPlugInsByTheirPaths) {
+    const auto plugIn = addLaunchable("a");
+    platform_.signing.clientEntitlements =
+        Dictionary{{"com.tovana.developer.zephrin.allowedplugins",
+                    Dictionary{{"HXExtensionIdentifier", "b"}}}};
+    const Dictionary request{{"request", "ready"},
+                             {"version", 3},
+                             {"uuids", Array{platform::Uuid::random()}},
+                             {"paths", Array{*plugIn->path}}};
+    EXPECT_EQ(failureOf(request), "11 access to plugin a denied: the host's plug-in entitlement "
+                                  "does not allow this plug-in");
+    EXPECT_TRUE(platform_.jobs.added.empty());
+}
+
 TEST_F(Activation, FailsWithTheJobManagerOrWithoutAnExecutable) {
     const auto plugIn = addLaunchable("a");
     const std::string name = "a(" + plugIn->uuid.text() + ")";
