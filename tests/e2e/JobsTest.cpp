@@ -1,6 +1,8 @@
 // Plug-ins as processes: a host makes one ready, starts it, talks to it; and when it ends.
 
+#include <atomic>
 #include <csignal>
+#include <functional>
 #include <sstream>
 #include <thread>
 #include <unistd.h>
@@ -66,14 +68,22 @@ protected:
         return children.size() == 1 ? children.front() : 0;
     }
 
-    // Holds the plug-in, all its processes ended, and lets it go again.
-    void terminate() {
+    // Holds the plug-in, all its processes ended; answers the token.
+    [[nodiscard]] Item hold() {
         const Item held = client->request(
             envelope("lock", Item::map({{"paths", Item::array({bundle})}, {"flags", 5}})));
-        ASSERT_EQ(errorOf(held), "");
+        EXPECT_EQ(errorOf(held), "");
+        return held["uuids"];
+    }
+
+    void release(const Item& token) {
+        EXPECT_EQ(answer(envelope("lock", Item::map({{"uuids", Item::array({token})}}))), "");
+    }
+
+    void terminate() {
+        const Item token = hold();
         expectGone();
-        ASSERT_EQ(answer(envelope("lock", Item::map({{"uuids", Item::array({held["uuids"]})}}))),
-                  "");
+        release(token);
     }
 
     // At the moment of a reply.
@@ -179,6 +189,31 @@ TEST_F(Jobs, AFileThatWasSwappedIsNotRun) {
     EXPECT_EQ(startIn(*one), "4 the executable of plug-in com.example.worker has changed since it "
                              "was made ready");
     EXPECT_TRUE(eventually([&] { return makeReady(*one).empty() && startIn(*one) == "ready"; }));
+}
+
+TEST_F(Jobs, NothingRunsAtTheReplyHoweverManyAreStartedMeanwhile) {
+    constexpr int rounds = 40;
+    start();
+    const std::string ready = "ready " + findAt(*client, bundle)["uuid"].text();
+    std::atomic<bool> over = false;
+    const auto hammer = [&](Talk& host) {
+        while (!over) {
+            if (host.ask(ready).empty())
+                (void)startIn(host);
+        }
+    };
+    const auto one = hostAlone();
+    const auto two = hostAlone();
+    std::thread first(hammer, std::ref(*one));
+    std::thread second(hammer, std::ref(*two));
+    for (int i = 0; i < rounds; ++i) {
+        const Item token = hold();
+        EXPECT_TRUE(childrenOf(launcher()).empty());
+        release(token);
+    }
+    over = true;
+    first.join();
+    second.join();
 }
 
 // While the daemon stands still, the host goes and another process comes with its pid.
