@@ -18,7 +18,6 @@ namespace {
 using platform::Array;
 using platform::Dictionary;
 using platform::ProcessActivity;
-using platform::Value;
 using testing::HasSubstr;
 
 constexpr unsigned ofPlugIns = 1;
