@@ -168,7 +168,7 @@ std::vector<Attempt> ConfinementScene::attempts() const {
         {"keys", never, nobody},
         {"input", never, nobody},
         {"foreign", never, nobody},
-        {"clone3"},
+        {"clone3", never, nobody},
         // unix sockets
         {"unix " + folder + "/stream"},
         {"unixDatagram " + folder + "/datagram"},
