@@ -78,6 +78,7 @@ uid_t ARPlugInUsers::nextFree() {
     while (next_ < shared && given_.contains(next_))
         ++next_;
     if (next_ == shared && !std::exchange(toldOfFull_, true))
-        ARLog().error("all user ids of plug-ins are given: those that come now share %{public}u", shared);
+        ARLog().error("all user ids of plug-ins are given: those that come now share %{public}u",
+                      shared);
     return next_;
 }
