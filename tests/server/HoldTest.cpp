@@ -73,7 +73,7 @@ TEST_F(LockTest, WaitsForEveryTerminationButNobodyWaitsForIt) {
         EXPECT_TRUE(reply.get()->contains("uuids"));
     });
     EXPECT_EQ(platform_.jobs.removed, (std::vector<std::string>{"a 2", "b 1"}));
-    EXPECT_THAT(log, HasSubstr("jobd error attempting to terminate plug-ins: error=5 for uuid="));
+    EXPECT_THAT(log, HasSubstr("jobd error attempting to terminate plug-ins: error="));
     EXPECT_TRUE(begin(lock({}, terminate)).get()->contains("uuids")) << "with nothing to end";
 }
 
