@@ -76,11 +76,6 @@ private:
     std::string bytes_;
 };
 
-std::string pathOf(const e2e::Home& home, std::size_t number) {
-    return home / ("Applications/App" + std::to_string(number / Mix().perApplication) +
-                   ".app/PlugIns/P" + std::to_string(number) + ".appex");
-}
-
 } // namespace
 
 void annotateRows(const Run& run, Cores cores) {

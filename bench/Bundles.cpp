@@ -1,7 +1,9 @@
 #include "bench/Bundles.h"
 
 #include <algorithm>
+#include <filesystem>
 
+#include "tests/e2e/Daemon.h"
 #include "tests/e2e/PlistWriter.h"
 
 namespace bench {
@@ -54,12 +56,26 @@ void fill(const e2e::Home& home, const Mix& mix) {
     }
 }
 
+std::string pathOf(const e2e::Home& home, std::size_t number) {
+    return home / ("Applications/App" + std::to_string(number / Mix().perApplication) +
+                   ".app/PlugIns/P" + std::to_string(number) + ".appex");
+}
+
 std::string addPlugInWithForm(const e2e::Home& home, std::size_t size) {
     constexpr std::size_t rest = 1500; // what a form has besides its metadata, about
     e2e::PlugIn wanted = plugIn(0, size - rest);
     wanted.identifier = "com.example.bench.find";
     wanted.point = "com.example.bench.find";
     return e2e::addAppWith(home, "Find", wanted);
+}
+
+std::string addRunningPlugIn(const e2e::Home& home) {
+    const std::string path = e2e::addAppWith(
+        home, "Running", {.identifier = runningIdentifier, .point = "com.example.bench.running"});
+    std::filesystem::copy_file(e2e::builtProgram("bench_one_byte"), path + "/plugin",
+                               std::filesystem::copy_options::overwrite_existing);
+    std::filesystem::permissions(path + "/plugin", std::filesystem::perms(0755));
+    return path;
 }
 
 } // namespace bench

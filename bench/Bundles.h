@@ -21,8 +21,14 @@ struct Mix {
 };
 
 void fill(const e2e::Home& home, const Mix& mix);
+// Of a plug-in of the usual mix, by its number.
+[[nodiscard]] std::string pathOf(const e2e::Home& home, std::size_t number);
 
 // A plug-in of an extension point of its own, with a form of about `size` bytes; answers its path.
 [[nodiscard]] std::string addPlugInWithForm(const e2e::Home& home, std::size_t size);
+
+// One that can be launched: it says one byte and waits for its host's end.
+constexpr const char* runningIdentifier = "com.example.bench.running";
+[[nodiscard]] std::string addRunningPlugIn(const e2e::Home& home);
 
 } // namespace bench

@@ -24,6 +24,7 @@ namespace {
 constexpr const char* usage =
     "Usage: zpd-bench [--quick] [--cores one|two] [ROWS...]\n"
     "Rows: find match match-many nothing memory start annotate notify install\n"
+    "      ready launch tokens\n"
     "      (all of them when none is named)\n";
 
 constexpr const char* memoryFolder = "/dev/shm";
@@ -70,7 +71,10 @@ const Family families[] = {
     {"start", startRows, true, true},
     {"annotate", annotateRows, true, true},
     {"notify", notifyRows, true, true},
-    {"install", installRows, true, true}};
+    {"install", installRows, true, true},
+    {"ready", readyRows, true, false},
+    {"launch", launchRows, true, true},
+    {"tokens", tokenRows, true, false}};
 
 // Homes of a hundred thousand bundles take minutes to make and remove on a disk; nothing that is
 // measured there reads from it.

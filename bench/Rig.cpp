@@ -61,6 +61,17 @@ std::string annotateFrame(const std::string& uuid, int election, const std::stri
                                           {"uuids", Item::array({Item::uuid(uuid)})}}));
 }
 
+std::string readyFrame(const std::string& uuid) {
+    return frameOf("ready", Item::map({{"uuids", Item::array({Item::uuid(uuid)})}}));
+}
+
+std::string accessFrame(const std::vector<std::string>& uuids) {
+    Item list = Item::array({});
+    for (const std::string& uuid : uuids)
+        list.append(Item::uuid(uuid));
+    return frameOf("access", Item::map({{"uuids", list}}));
+}
+
 std::string matchFrame(const std::string& point) {
     const Item rules = Item::map({{"HXExtensionPointIdentifier", point}});
     return frameOf("match", Item::map({{"rules", rules}}));
@@ -71,6 +82,8 @@ std::size_t replySize(e2e::WireClient& client, const std::string& request) {
     const std::optional<e2e::Frame> reply = client.receive(std::chrono::seconds(60));
     if (!reply)
         throw std::runtime_error("the daemon ended the connection");
+    if (const Item body = e2e::decode(reply->body); body.has("error"))
+        throw std::runtime_error("the daemon refused: " + body["error"].text());
     return e2e::frameHeaderSize + reply->body.size();
 }
 

@@ -2,6 +2,7 @@
 
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "bench/Exchange.h"
 #include "bench/Floor.h"
@@ -44,8 +45,11 @@ struct FloorExchange {
 // "annotate" of one plug-in; the election, and whatever else is noted down.
 [[nodiscard]] std::string annotateFrame(const std::string& uuid, int election,
                                         const std::string& note = {});
+// "ready" of one plug-in, and "access" of some.
+[[nodiscard]] std::string readyFrame(const std::string& uuid);
+[[nodiscard]] std::string accessFrame(const std::vector<std::string>& uuids);
 [[nodiscard]] std::string matchFrame(const std::string& point);
-// Size of the reply to a request, header included.
+// Size of the reply to a request, header included; it must not be refused.
 [[nodiscard]] std::size_t replySize(e2e::WireClient& client, const std::string& request);
 
 } // namespace bench

@@ -39,6 +39,12 @@ void annotateRows(const Run& run, Cores cores);
 void installRows(const Run& run, Cores cores);
 // From a change to the observers' blocks.
 void notifyRows(const Run& run, Cores cores);
+// "ready" beside "find".
+void readyRows(const Run& run, Cores cores);
+// From a host's start of a plug-in to the first byte that this says.
+void launchRows(const Run& run, Cores cores);
+// Tokens: issued by "access", and made descriptors of.
+void tokenRows(const Run& run, Cores cores);
 // From the start of the program to the first answer.
 void startRows(const Run& run, Cores cores);
 
