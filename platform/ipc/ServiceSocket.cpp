@@ -24,6 +24,9 @@ constexpr unsigned socketMode = 0666;
 constexpr unsigned lockMode = 0600;
 constexpr int backlog = 1024; // connections that wait to be accepted
 
+// Whether a socket takes descriptors (kernel 6.16); the system's headers may be older.
+constexpr int passRights = 83;
+
 // How long a client waits for a daemon that has too many new connections to accept.
 constexpr timeval longestConnect{.tv_sec = 10, .tv_usec = 0};
 
@@ -84,6 +87,13 @@ std::string hiddenPath(std::string path) {
     return path;
 }
 
+// What clients send nobody wants, and whoever drops the last reference to it may wait: for as long as
+// a lingering TCP socket says. So it is not even taken, where the kernel can be told.
+void takeNoDescriptors(const UniqueFd& socket) {
+    const int off = 0;
+    (void)::setsockopt(socket.get(), SOL_SOCKET, passRights, &off, sizeof(off));
+}
+
 // A socket that clients can connect to at the path.
 std::expected<UniqueFd, Error> listeningAt(const std::string& path) {
     const auto address = addressOf(path);
@@ -94,10 +104,11 @@ std::expected<UniqueFd, Error> listeningAt(const std::string& path) {
     UniqueFd socket = newSocket(SOCK_NONBLOCK);
     if (!socket)
         return std::unexpected(posixError(errno, "socket"));
-    // Accepted sockets inherit this; so the writer of each byte is known from the first on.
+    // Accepted sockets inherit these; so the writer of each byte is known from the first on.
     const int on = 1;
     if (::setsockopt(socket.get(), SOL_SOCKET, SO_PASSCRED, &on, sizeof(on)) != 0)
         return std::unexpected(posixError(errno, "SO_PASSCRED"));
+    takeNoDescriptors(socket);
     if (::bind(socket.get(), reinterpret_cast<const sockaddr*>(&*address), sizeof(*address)) != 0)
         return std::unexpected(posixError(errno, "bind " + path));
     if (::chmod(path.c_str(), socketMode) != 0)
