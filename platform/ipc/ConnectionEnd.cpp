@@ -3,6 +3,7 @@
 
 #include "platform/ipc/ConnectionImpl.h"
 #include "platform/ipc/IpcLog.h"
+#include "platform/ipc/WaitBreaker.h"
 
 namespace platform::ipc {
 
@@ -16,6 +17,8 @@ void drain(int socket) {
     std::array<char, 16UL << 10> away{};
     ::shutdown(socket, SHUT_RDWR);
     for (int i = 0; i < mostDrains; ++i) {
+        if (isWaitBreakerNeeded())
+            breakWaits();
         if (::recv(socket, away.data(), away.size(), MSG_DONTWAIT) <= 0)
             return;
     }

@@ -7,6 +7,7 @@
 #include "platform/ipc/ConnectionImpl.h"
 #include "platform/ipc/IpcLog.h"
 #include "platform/ipc/SocketCalls.h"
+#include "platform/ipc/WaitBreaker.h"
 
 namespace platform::ipc {
 
@@ -51,6 +52,8 @@ Arrived readOnce(int socket, std::array<iovec, 2> room, pid_t pid) {
     message.msg_iovlen = held ? 2 : 1;
     message.msg_control = control.data();
     message.msg_controllen = CMSG_LEN(sizeof(ucred));
+    if (isWaitBreakerNeeded())
+        breakWaits();
     const ssize_t count = receiveMessage(socket, message, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
     const bool fromPeer = count > 0 && cameFrom(pid, message);
     return {count, fromPeer, fromPeer && !(message.msg_flags & MSG_CTRUNC)};

@@ -87,13 +87,6 @@ std::string hiddenPath(std::string path) {
     return path;
 }
 
-// What clients send nobody wants, and whoever drops the last reference to it may wait: for as long as
-// a lingering TCP socket says. So it is not even taken, where the kernel can be told.
-void takeNoDescriptors(const UniqueFd& socket) {
-    const int off = 0;
-    (void)::setsockopt(socket.get(), SOL_SOCKET, passRights, &off, sizeof(off));
-}
-
 // A socket that clients can connect to at the path.
 std::expected<UniqueFd, Error> listeningAt(const std::string& path) {
     const auto address = addressOf(path);
@@ -108,7 +101,7 @@ std::expected<UniqueFd, Error> listeningAt(const std::string& path) {
     const int on = 1;
     if (::setsockopt(socket.get(), SOL_SOCKET, SO_PASSCRED, &on, sizeof(on)) != 0)
         return std::unexpected(posixError(errno, "SO_PASSCRED"));
-    takeNoDescriptors(socket);
+    (void)takeNoDescriptors(socket.get()); // else there is the wait breaker
     if (::bind(socket.get(), reinterpret_cast<const sockaddr*>(&*address), sizeof(*address)) != 0)
         return std::unexpected(posixError(errno, "bind " + path));
     if (::chmod(path.c_str(), socketMode) != 0)
@@ -152,6 +145,13 @@ std::expected<ServiceSocket, Error> ServiceSocket::bind(const std::string& path)
 ServiceSocket::~ServiceSocket() {
     if (lock_)
         ::unlink(path_.c_str());
+}
+
+// What clients send nobody wants, and whoever drops the last reference to it may have to wait: for
+// as long as a lingering TCP socket says.
+bool takeNoDescriptors(int socket) noexcept {
+    const int off = 0;
+    return ::setsockopt(socket, SOL_SOCKET, passRights, &off, sizeof(off)) == 0;
 }
 
 std::expected<UniqueFd, Error> connectToService(const std::string& path) {

@@ -36,4 +36,8 @@ private:
 // A socket connected to the service at a path.
 [[nodiscard]] std::expected<UniqueFd, Error> connectToService(const std::string& path);
 
+// Has a socket, and those that it accepts, refuse descriptors. False when the kernel cannot do
+// that.
+bool takeNoDescriptors(int socket) noexcept;
+
 } // namespace platform::ipc
