@@ -5,6 +5,7 @@
 #include <fcntl.h>
 #include <filesystem>
 #include <sys/file.h>
+#include <sys/mount.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -167,6 +168,23 @@ TEST(Mounts, ThatProgramsServeAreToldByTheirType) {
         {27, false}, {270, true}, {28, false}, {2, true}, {29, true}};
     for (const auto& [mount, served] : cases)
         EXPECT_EQ(isServedByProgram(mount, info), served) << mount;
+}
+
+std::uint64_t mountAt(const std::string& path) {
+    struct ::statx seen = {};
+    EXPECT_EQ(::statx(AT_FDCWD, path.c_str(), 0, STATX_MNT_ID, &seen), 0);
+    return seen.stx_mnt_id;
+}
+
+TEST(Mounts, AreKnownAsTheyAreNow) {
+    const TestFolder folder;
+    ASSERT_FALSE(isServedByProgram(mountAt("/proc")));
+    if (::mount("none", folder.path().c_str(), "tmpfs", 0, nullptr) != 0)
+        GTEST_SKIP() << "may not mount";
+    const std::uint64_t mount = mountAt(folder.path());
+    EXPECT_FALSE(isServedByProgram(mount));
+    ASSERT_EQ(::umount2(folder.path().c_str(), MNT_DETACH), 0);
+    EXPECT_TRUE(isServedByProgram(mount)) << "nothing is known of it any more";
 }
 
 TEST(OwnershipTest, RefusesWhatBelongsToAnotherUser) {
