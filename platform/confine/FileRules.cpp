@@ -6,6 +6,7 @@
 #include <string>
 #include <sys/stat.h>
 #include <unistd.h>
+#include <vector>
 
 namespace platform {
 
@@ -87,17 +88,22 @@ private:
     const Rights known_;
 };
 
-// Where the system lies elsewhere than in /usr: plug-ins use its library, as they do there.
-void addOwnLibrary(const Adder& adder) {
+// Where the library of this system may lie; nowhere when it is in /usr.
+std::vector<std::string> placesOfOwnLibrary() {
     std::error_code failed;
     const auto program = std::filesystem::read_symlink("/proc/self/exe", failed);
+    if (failed || program.string().starts_with("/usr/"))
+        return {};
     const auto above = program.parent_path().parent_path();
-    for (const char* folder : {ZEPHRIN_LIBRARY_FOLDER, "lib"}) {
-        for (const auto& entry : std::filesystem::directory_iterator(above / folder, failed)) {
-            if (entry.path().filename().string().starts_with("libZephrin.so"))
-                (void)adder.add(entry.path(), mayRead);
-        }
-    }
+    return {above / ZEPHRIN_LIBRARY_FOLDER / ZEPHRIN_LIBRARY_NAME,
+            above / "lib" / ZEPHRIN_LIBRARY_NAME};
+}
+
+// Where the system lies elsewhere than in /usr: plug-ins use its library, as they do there.
+void addOwnLibrary(const Adder& adder) {
+    static const std::vector<std::string> places = placesOfOwnLibrary();
+    for (const std::string& place : places)
+        (void)adder.add(place, mayRead);
 }
 
 } // namespace
