@@ -33,10 +33,20 @@ std::optional<unsigned long> numberAfter(std::string_view status, std::string_vi
     return result.ec == std::errc() ? std::optional(number) : std::nullopt;
 }
 
+std::optional<std::string> mountNamespaceOf(const std::string& process) {
+    return linkText("/proc/" + process + "/ns/mnt");
+}
+
 bool hasKnownMounts(const Confinement& process, const Confinement& self,
                     const std::optional<Confinement>& first) {
     return process.mountNamespace == self.mountNamespace ||
            (first && process.mountNamespace == first->mountNamespace);
+}
+
+// The same of a process as it is now.
+bool hasKnownMounts(const std::string& process) {
+    const auto its = mountNamespaceOf(process);
+    return its && (its == mountNamespaceOf("self") || its == mountNamespaceOf("1"));
 }
 
 } // namespace
@@ -53,7 +63,7 @@ std::optional<Confinement> Confinement::of(pid_t pid) {
     const std::string process = "/proc/" + std::to_string(pid);
     const auto status = readRegularFile(process + "/status", largestStatus);
     const auto user = linkText(process + "/ns/user");
-    const auto mount = linkText(process + "/ns/mnt");
+    const auto mount = mountNamespaceOf(std::to_string(pid));
     if (!status || !user || !mount)
         return std::nullopt;
     return Confinement{seccompFiltersIn(status->bytes), *user, *mount};
@@ -69,11 +79,10 @@ bool isMoreConfined(const Confinement& process, const Confinement& self,
 }
 
 bool seesOurFiles(const ipc::Peer& peer) {
-    const auto process = Confinement::of(peer.pid);
-    const auto self = Confinement::of(::getpid());
-    if (!process || !self || !hasKnownMounts(*process, *self, Confinement::of(1)))
+    const std::string process = std::to_string(peer.pid);
+    if (peer.pid <= 0 || !hasKnownMounts(process))
         return false;
-    const auto root = FileGlance::throughProc("/proc/" + std::to_string(peer.pid) + "/root");
+    const auto root = FileGlance::throughProc("/proc/" + process + "/root");
     const auto ours = FileGlance::throughProc("/proc/self/root");
     return root && ours && root->isSameFileAs(*ours) && ipc::isAlive(peer);
 }
