@@ -2,11 +2,19 @@
 
 #include <utility>
 
+#include "zpd/ZPDIpcClient.h"
 #include "zpd/ZPDPlugIn.h"
 
 std::size_t ZPDHolds::countOf(const ZPDIpcClient& client) const {
     const auto found = byClient_.find(&client);
     return found == byClient_.end() ? 0 : found->second.size();
+}
+
+std::size_t ZPDHolds::countOfUser(uid_t user) const {
+    std::size_t count = 0;
+    for (const auto& [client, theirs] : byClient_)
+        count += client->peer()->uid == user ? theirs.size() : 0;
+    return count;
 }
 
 void ZPDHolds::add(const ZPDPlugInHold::Ptr& hold) {

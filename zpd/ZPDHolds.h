@@ -2,6 +2,7 @@
 
 #include <cstddef>
 #include <list>
+#include <sys/types.h>
 #include <unordered_map>
 #include <vector>
 
@@ -20,6 +21,8 @@ public:
 
     // How many this client has.
     [[nodiscard]] std::size_t countOf(const ZPDIpcClient& client) const;
+    // How many all clients of this user have.
+    [[nodiscard]] std::size_t countOfUser(uid_t user) const;
 
     void add(const ZPDPlugInHold::Ptr& hold);
 

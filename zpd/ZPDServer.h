@@ -93,8 +93,9 @@ public:
 
     // ---- Holds (ZPDServerHolds.cpp). Any thread.
 
-    // A client has at most so many holds.
+    // A client has at most so many holds, and so have all clients of a user together.
     static constexpr std::size_t mostHolds = 1'024;
+    static constexpr std::size_t mostHoldsOfUser = 8'192;
 
     [[nodiscard]] bool holdOnPlugIn(const ZPDPlugIn& plugIn);
     // Fails when its client has too many, or has gone.

@@ -38,10 +38,13 @@ std::optional<Error> ZPDServer::objectionTo(const ZPDPlugInHold& hold) const {
         return std::nullopt;
     if (!client->isConnected())
         return ZPDErrorMake(ZPDErrorCode::invalidRequest, "the client has gone");
-    if (holds_.countOf(*client) < mostHolds)
-        return std::nullopt;
-    return ZPDErrorMakeFormat(ZPDErrorCode::invalidRequest,
-                              "a client may have at most %d holds at a time", mostHolds);
+    if (holds_.countOf(*client) >= mostHolds)
+        return ZPDErrorMakeFormat(ZPDErrorCode::invalidRequest,
+                                  "a client may have at most %d holds at a time", mostHolds);
+    if (holds_.countOfUser(client->peer()->uid) >= mostHoldsOfUser)
+        return ZPDErrorMakeFormat(ZPDErrorCode::invalidRequest,
+                                  "a user may have at most %d holds at a time", mostHoldsOfUser);
+    return std::nullopt;
 }
 
 void ZPDServer::unholdToken(const platform::Uuid& token) {
