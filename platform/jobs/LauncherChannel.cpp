@@ -175,7 +175,8 @@ void LauncherChannel::writable() {
         takeFrames(); // those that came before
 }
 
-// What the socket does not take stays. A socket that is broken is found so by reading it.
+// What the socket does not take stays. When it fails (also because too many descriptors are under
+// way) it ends for both sides, which find that by reading: a mute channel would help nobody.
 void LauncherChannel::writeWaiting() {
     while (!waiting_.empty()) {
         Outgoing& frame = waiting_.front();
@@ -184,6 +185,7 @@ void LauncherChannel::writeWaiting() {
                       frame.descriptors);
         if (count < 0 && !isForLater(errno)) {
             broken_ = true;
+            ::shutdown(socket_.descriptor(), SHUT_RDWR);
             waiting_.clear();
             return waitForMore();
         }
