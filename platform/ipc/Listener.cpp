@@ -119,6 +119,8 @@ void Listener::Impl::admit(UniqueFd accepted) {
             peer->uid, peer->pid);
         return;
     }
+    if (limits.room > 0)
+        (void)::setsockopt(accepted.get(), SOL_SOCKET, SO_SNDBUF, &limits.room, sizeof limits.room);
     const auto connection = std::make_shared<Connection>(std::make_unique<Connection::Impl>(
         loop, std::move(accepted), std::move(*peer), account, limits));
     connection->impl().greet();

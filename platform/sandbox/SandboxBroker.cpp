@@ -22,8 +22,9 @@ namespace platform {
 
 namespace {
 
-// A connection is there for one call as a rule, and asks for one thing after another.
-constexpr ipc::Limits limits{.waitingRequests = 16, .userConnections = 64};
+// A connection is there for one call as a rule, and asks for one thing after another. What lies in
+// a socket unread is a descriptor each, of which the kernel lets a user have only so many.
+constexpr ipc::Limits limits{.waitingRequests = 16, .userConnections = 64, .room = 4096};
 
 constexpr std::string_view consumeRequest = "consume";
 constexpr std::string_view openRequest = "open";
