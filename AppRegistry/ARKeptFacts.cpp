@@ -13,6 +13,7 @@
 using platform::Array;
 using platform::Data;
 using platform::Dictionary;
+using platform::DictionaryEntry;
 using platform::Error;
 using platform::SharedBytes;
 using platform::Value;
@@ -24,8 +25,6 @@ constexpr const char* versionKey = "version";
 constexpr const char* addedKey = "added";
 constexpr const char* withdrawnKey = "removed";
 constexpr const char* usersKey = "users";
-constexpr const char* identifierKey = "identifier";
-constexpr const char* userKey = "user";
 constexpr std::size_t largestFile = std::size_t{64} << 20;
 constexpr unsigned fileMode = 0644;
 
@@ -46,34 +45,26 @@ Value valueOf(const std::vector<std::string>& paths) {
     return Array(std::move(values));
 }
 
+// One that cannot be a key of a property list is left to the database and its container's owner.
 Value valueOf(const std::vector<ARPlugInUser>& users) {
-    std::vector<Value> values;
-    for (const auto& [identifier, user] : users)
-        values.emplace_back(Dictionary{{identifierKey, valueOf(identifier)}, {userKey, user}});
-    return Array(std::move(values));
-}
-
-// Nothing for one that makes no sense.
-std::optional<ARPlugInUser> userIn(const Value& value) {
-    const Dictionary entry = value.dictionary() ? *value.dictionary() : Dictionary();
-    const Value* const identifier = entry.find(identifierKey);
-    const Value* const user = entry.find(userKey);
-    const auto number = user ? user->unsignedInteger() : std::nullopt;
-    if (!identifier || bytesOf(*identifier).empty() || !number ||
-        *number > std::numeric_limits<uid_t>::max())
-        return std::nullopt;
-    return ARPlugInUser(bytesOf(*identifier), static_cast<uid_t>(*number));
+    std::vector<DictionaryEntry> entries;
+    entries.reserve(users.size());
+    for (const auto& [identifier, user] : users) {
+        if (!platform::plist::objectionToXml(Value(identifier)))
+            entries.push_back({SharedBytes(identifier), user});
+    }
+    return Dictionary(std::move(entries));
 }
 
 // Files of old have none.
 std::optional<std::vector<ARPlugInUser>> usersIn(const Dictionary& content) {
     std::vector<ARPlugInUser> users;
-    const Array* const values = content.findArray(usersKey);
-    for (const Value& each : values ? *values : Array()) {
-        auto user = userIn(each);
-        if (!user)
+    const Dictionary* const entries = content.findDictionary(usersKey);
+    for (const auto& [identifier, value] : entries ? *entries : Dictionary()) {
+        const auto user = value.unsignedInteger();
+        if (identifier.view().empty() || !user || *user > std::numeric_limits<uid_t>::max())
             return std::nullopt;
-        users.push_back(std::move(*user));
+        users.emplace_back(identifier.view(), static_cast<uid_t>(*user));
     }
     return users;
 }
@@ -109,19 +100,20 @@ std::expected<ARKeptFacts::Facts, std::string> parse(std::string_view bytes) {
     return ARKeptFacts::Facts{std::move(*added), std::move(*withdrawn), std::move(*users)};
 }
 
-std::expected<ARKeptFacts::Facts, std::string> readTrusted(const std::string& file) {
+// Nothing when there is none; on failure the reason.
+std::expected<std::optional<std::string>, std::string> readTrusted(const std::string& file) {
     platform::OwnershipTest ownership;
     const auto canonical = platform::canonicalPath(file);
     if (!canonical && canonical.error() == ENOENT)
-        return ARKeptFacts::Facts();
+        return std::nullopt;
     if (!canonical)
         return std::unexpected(describe(platform::posixError(canonical.error(), file)));
     if (auto refusal = ownership.refusal(*canonical))
         return std::unexpected(std::move(*refusal));
-    const auto content = platform::readRegularFile(*canonical, largestFile);
+    auto content = platform::readRegularFile(*canonical, largestFile);
     if (!content)
         return std::unexpected(describe(content.error()));
-    return parse(content->bytes);
+    return std::move(content->bytes);
 }
 
 ARKeptFacts::Facts factsOf(const ARModel& model, const ARPlugInUsers& users) {
@@ -138,33 +130,37 @@ ARKeptFacts::Facts factsOf(const ARModel& model, const ARPlugInUsers& users) {
 
 } // namespace
 
-ARKeptFacts::Facts ARKeptFacts::read() {
+void ARKeptFacts::removeUnfinished() const {
     platform::removeUnfinishedFiles(file_);
-    auto facts = readTrusted(file_);
-    if (facts) {
-        held_ = *facts;
+}
+
+ARKeptFacts::Facts ARKeptFacts::read() const {
+    const auto bytes = readTrusted(file_);
+    if (bytes && !*bytes)
+        return {};
+    auto facts = bytes ? parse(**bytes) : std::unexpected(bytes.error());
+    if (facts)
         return std::move(*facts);
-    }
     ARLog().error("ignoring %{public}@: %{public}@", file_, facts.error());
     return {};
 }
 
-void ARKeptFacts::keep(const ARModel& model, const ARPlugInUsers& users) {
-    Facts facts = factsOf(model, users);
-    if (held_ == facts)
-        return;
-    held_.reset();
-    if (const auto error = write(facts))
-        return ARLog().error("what was registered by path cannot be kept: %{public}@", *error);
-    held_ = std::move(facts);
+void ARKeptFacts::keep(const ARModel& model, const ARPlugInUsers& users) const {
+    if (const auto error = bring(factsOf(model, users)))
+        ARLog().error("what was registered by path cannot be kept: %{public}@", *error);
 }
 
-std::optional<Error> ARKeptFacts::write(const Facts& facts) const {
+// By their text: no second copy of the facts is kept, nor read into values.
+std::optional<Error> ARKeptFacts::bring(const Facts& facts) const {
     const auto xml = platform::plist::writeXml(Dictionary{{versionKey, formatVersion},
                                                           {addedKey, valueOf(facts.added)},
                                                           {withdrawnKey, valueOf(facts.withdrawn)},
                                                           {usersKey, valueOf(facts.users)}});
     if (!xml)
         return xml.error();
+    const auto held = readTrusted(file_);
+    const bool hasNothing = held && !*held && facts == Facts();
+    if (hasNothing || (held && *held == *xml))
+        return std::nullopt;
     return platform::writeFileAtomically(file_, *xml, fileMode);
 }

@@ -29,16 +29,17 @@ public:
 
     explicit ARKeptFacts(std::string file) : file_(std::move(file)) {}
 
+    // What an interrupted write has left.
+    void removeUnfinished() const;
     // What the file holds. One that is missing, damaged or could have been written by others holds
     // nothing; the latter two are told in the log.
-    [[nodiscard]] Facts read();
+    [[nodiscard]] Facts read() const;
     // Brings the file to what the model and the users hold, and to the disk, unless it holds that
     // already. What cannot be written is told in the log, and written the next time.
-    void keep(const ARModel& model, const ARPlugInUsers& users);
+    void keep(const ARModel& model, const ARPlugInUsers& users) const;
 
 private:
-    [[nodiscard]] std::optional<platform::Error> write(const Facts& facts) const;
+    [[nodiscard]] std::optional<platform::Error> bring(const Facts& facts) const;
 
     const std::string file_;
-    std::optional<Facts> held_; // by the file; nothing when that is not known
 };

@@ -61,7 +61,10 @@ ARRegistry::ARRegistry(platform::Places places, std::shared_ptr<ARStore> store,
 ARRegistry::~ARRegistry() {
     context_->grants.onLearnt({});
     context_->users.onNew({});
-    queue_.sync([] {}); // what is queued still comes first
+    queue_.sync([this] { // what is queued still comes first
+        if (usersToKeep_)
+            keptFacts_.keep(model_, context_->users);
+    });
     context_->published.set(nullptr);
 }
 
@@ -77,17 +80,14 @@ auto ARRegistry::pass(Act&& act, Apply&& apply) {
 // A new database learns from the file beside it what the folders do not tell, and is complete only
 // then: what a crash left behind half made counts as new again.
 void ARRegistry::firstPass(bool isComplete) {
-    const ARKeptFacts::Facts kept = keptFacts_.read();
-    if (!isComplete)
-        context_->users.know(kept.users);
-    pass(
-        [&](ARPass& pass) {
-            pass.run(places_, ARDepth::roots, isComplete ? ARKeptFacts::Facts() : kept);
-        },
-        [this](ARBatch&& batch) {
-            store(batch);
-            return true;
-        });
+    keptFacts_.removeUnfinished();
+    const ARKeptFacts::Facts kept = isComplete ? ARKeptFacts::Facts() : keptFacts_.read();
+    context_->users.know(kept.users);
+    pass([&](ARPass& pass) { pass.run(places_, ARDepth::roots, kept); },
+         [this](ARBatch&& batch) {
+             store(batch);
+             return true;
+         });
     keptFacts_.keep(model_, context_->users);
     if (!isComplete)
         committer_.markComplete();
@@ -120,11 +120,13 @@ void ARRegistry::storeLearntGrants() {
     store(batch);
 }
 
+// A first "match" may give thousands of them. The file has them at the next change of paths, or at
+// the end: until then the database and the containers' owners are record enough.
 void ARRegistry::storeNewUsers() {
     ARBatch batch;
     batch.changes.users = context_->users.takeNew();
     store(batch);
-    keptFacts_.keep(model_, context_->users);
+    usersToKeep_ = true;
 }
 
 // What is stored is shown to readers, and then to the observer. REQUIRES: readers are held.

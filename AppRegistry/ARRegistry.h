@@ -113,6 +113,7 @@ private:
     // On the queue.
     ARCommitter committer_;
     ARKeptFacts keptFacts_;
+    bool usersToKeep_ = false; // in that, some time
     ARModel model_;
     ARComplaints complaints_;
     ARWatches watches_; // locks by itself
