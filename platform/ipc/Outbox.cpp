@@ -10,6 +10,7 @@
 #include "platform/ipc/CborEncoder.h"
 #include "platform/ipc/IpcLog.h"
 #include "platform/ipc/SocketCalls.h"
+#include "platform/ipc/WaitBreaker.h"
 
 namespace platform::ipc {
 
@@ -76,6 +77,10 @@ void Outbox::close() {
     const std::lock_guard lock(mutex_);
     closed_ = true;
     descriptor_ = -1;
+    // The last reference to a socket, it may be, with what was sent to that.
+    if (std::ranges::any_of(pieces_,
+                            [](const Piece& piece) { return piece.descriptor != nullptr; }))
+        breakWaits();
     pieces_.clear();
     gathered_.clear();
     waiting_.store(false, std::memory_order_release);

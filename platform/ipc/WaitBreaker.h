@@ -4,8 +4,9 @@
 // socket makes its dropper wait, as long as the stranger likes. A wait of this kind ends with a
 // signal, so the thread gets one every now and then, while it is at work.
 //
-// Where the kernel lets a socket refuse descriptors (6.16) none of it is needed. Functions for any
-// thread; the signal is its own, and the handler does nothing that others notice but EINTR.
+// Where the kernel lets a socket refuse descriptors (6.16) it is only needed for sockets that may
+// take some: those of plug-ins, when they are dropped unread. Functions for any thread; the signal
+// is its own, and the handler does nothing that others notice but EINTR.
 namespace platform::ipc {
 
 // Whether a socket cannot be told to take no descriptors.

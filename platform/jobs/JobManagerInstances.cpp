@@ -9,6 +9,7 @@
 #include <utility>
 
 #include "platform/confine/PreparedConfinement.h"
+#include "platform/ipc/WaitBreaker.h"
 #include "platform/jobs/JobError.h"
 #include "platform/jobs/JobLog.h"
 #include "platform/jobs/JobManager.h"
@@ -187,6 +188,7 @@ void JobManager::didStart(Number number, std::expected<Launcher::Started, Error>
     jobLog().info("started plug-in %{public}@ as process %{public}d", service->what.identifier,
                   outcome->pid);
     tellWhatIsLacking(*service, *outcome);
+    ipc::breakWaits(); // where the host has gone, for what the plug-in already sent it
     started(Started{outcome->pid, std::move(socket)});
 }
 
