@@ -117,6 +117,7 @@ TEST_F(LockTest, KeepsTheProcessBusyAndIsBoundedForEachClient) {
     EXPECT_EQ(textIn(*begin(lock({a})).get(), "error"),
               "a client may have at most 1024 holds at a time");
     EXPECT_EQ(failureOf(lock({a})), "") << "another client";
+    endClient();
     stopServer();
     EXPECT_EQ(ProcessActivity::openCount(), before);
 }
