@@ -7,7 +7,7 @@ SECONDS ?= 60
 BUILD = scripts/build.sh
 
 .DEFAULT_GOAL := help
-.PHONY: help demo test test-asan test-tsan bench fuzz lint format install clean
+.PHONY: help demo test test-asan test-tsan bench fuzz lint lint-product format install clean
 
 help:
 	@echo 'make demo                 build zpd, make sample applications and show the daemon at work'
@@ -17,6 +17,7 @@ help:
 	@echo 'make bench                print the table of measured ratios'
 	@echo 'make fuzz SECONDS=60      run each fuzz target for that long'
 	@echo 'make lint                 clang-format, include directions, clang-tidy'
+	@echo 'make lint-product         the same, clang-tidy without tests, benchmarks and fuzz targets'
 	@echo 'make format               let clang-format rewrite the sources'
 	@echo 'make install DESTDIR=DIR  install below DIR$(PREFIX)  (PREFIX=$(PREFIX))'
 	@echo 'make clean                remove build/'
@@ -55,6 +56,10 @@ fuzz:
 lint:
 	scripts/install-deps.sh build test bench lint
 	JOBS=$(JOBS) scripts/lint.sh
+
+lint-product:
+	scripts/install-deps.sh build test bench lint
+	JOBS=$(JOBS) scripts/lint.sh format includes tidy_product
 
 format:
 	scripts/install-deps.sh lint
