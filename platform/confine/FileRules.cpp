@@ -4,7 +4,6 @@
 #include <fcntl.h>
 #include <filesystem>
 #include <string>
-#include <sys/stat.h>
 #include <unistd.h>
 #include <vector>
 
@@ -14,6 +13,7 @@ namespace {
 
 using landlock::Rights;
 
+constexpr Rights mayReadFile = landlock::readFile;
 constexpr Rights mayRead = landlock::readFile | landlock::readFolder;
 constexpr Rights mayRun = mayRead | landlock::execute;
 constexpr Rights mayUseDevice = landlock::readFile | landlock::writeFile;
@@ -37,28 +37,44 @@ constexpr SystemPath systemPaths[] = {
     {"/lib", mayRun},
     {"/lib32", mayRun},
     {"/lib64", mayRun},
-    {"/etc/ld.so.cache", mayRead},
-    {"/etc/localtime", mayRead},
+    {"/etc/ld.so.cache", mayReadFile},
+    {"/etc/localtime", mayReadFile},
     {"/sys/devices/system/cpu", mayRead},
     {"/dev/null", mayUseDevice},
     {"/dev/zero", mayUseDevice},
     {"/dev/full", mayUseDevice},
     {"/dev/random", mayUseDevice},
     {"/dev/urandom", mayUseDevice},
-    {"/etc/resolv.conf", mayRead, true},
-    {"/etc/hosts", mayRead, true},
-    {"/etc/host.conf", mayRead, true},
-    {"/etc/nsswitch.conf", mayRead, true},
-    {"/etc/gai.conf", mayRead, true},
-    {"/etc/services", mayRead, true},
-    {"/etc/protocols", mayRead, true},
-    {"/etc/ssl/openssl.cnf", mayRead, true},
+    {"/etc/resolv.conf", mayReadFile, true},
+    {"/etc/hosts", mayReadFile, true},
+    {"/etc/host.conf", mayReadFile, true},
+    {"/etc/nsswitch.conf", mayReadFile, true},
+    {"/etc/gai.conf", mayReadFile, true},
+    {"/etc/services", mayReadFile, true},
+    {"/etc/protocols", mayReadFile, true},
+    {"/etc/ssl/openssl.cnf", mayReadFile, true},
     {"/etc/ssl/certs", mayRead, true},
     {"/etc/ca-certificates", mayRead, true},
     {"/run/systemd/resolve", mayRead, true}, // where resolv.conf may be a link to
     {"/run/resolvconf", mayRead, true},
     {"/run/connman", mayRead, true},
 };
+
+bool leadsToUsr(const SystemPath& system) {
+    std::error_code failed;
+    const std::string target = std::filesystem::read_symlink(system.path, failed).string();
+    return target.starts_with("usr/") || target.starts_with("/usr/");
+}
+
+// Without the folders that are links into /usr: each path takes time at each launch.
+std::vector<SystemPath> distinctPaths() {
+    std::vector<SystemPath> paths;
+    for (const SystemPath& system : systemPaths) {
+        if (system.rights != mayRun || !leadsToUsr(system))
+            paths.push_back(system);
+    }
+    return paths;
+}
 
 class Adder {
 public:
@@ -68,12 +84,13 @@ public:
     // 0, or an errno value.
     [[nodiscard]] int add(const std::string& path, Rights rights, int flags = 0) const {
         const UniqueFd open(::open(path.c_str(), O_PATH | O_CLOEXEC | flags));
-        struct ::stat status{};
-        if (!open || ::fstat(open.get(), &status) != 0)
+        if (!open)
             return errno;
-        if (!S_ISDIR(status.st_mode))
-            rights &= landlock::ofFile;
-        return landlock::allowBelow(ruleset_, open.get(), rights & known_);
+        const int failed = landlock::allowBelow(ruleset_, open.get(), rights & known_);
+        if (failed != EINVAL)
+            return failed;
+        // No folder, then, and of those rights it can only have some.
+        return landlock::allowBelow(ruleset_, open.get(), rights & known_ & landlock::ofFile);
     }
 
     // The same for a folder of our own, which no link leads to.
@@ -111,7 +128,8 @@ void addOwnLibrary(const Adder& adder) {
 std::optional<Error> addFileRules(int ruleset, const ConfinementPlan& plan, const Profile& profile,
                                   const KernelFeatures& features) {
     const Adder adder(ruleset, features);
-    for (const SystemPath& system : systemPaths) {
+    static const std::vector<SystemPath> paths = distinctPaths();
+    for (const SystemPath& system : paths) {
         if (profile.network || !system.forNetwork)
             (void)adder.add(system.path, system.rights);
     }
