@@ -30,7 +30,7 @@ void readByte(int socket) {
 class Launched {
 public:
     Launched(Rig& rig, const e2e::Home& home, const std::string& path)
-        : jobs_(home / "run/com.tovana.jobd"), identifier_(runningIdentifier) {
+        : jobs_(home / "run/com.tovana.jobd") {
         const std::string uuid = uuidAt(rig.client(), path);
         (void)replySize(rig.client(), readyFrame(uuid));
     }
@@ -38,7 +38,8 @@ public:
     std::chrono::nanoseconds once() {
         const Clock::time_point start = Clock::now();
         std::promise<std::expected<ZPStartedPlugIn, platform::Error>> answer;
-        jobs_.startPlugIn(identifier_, [&](auto outcome) { answer.set_value(std::move(outcome)); });
+        jobs_.startPlugIn(runningIdentifier,
+                          [&](auto outcome) { answer.set_value(std::move(outcome)); });
         auto started = answer.get_future().get();
         if (!started)
             throw std::runtime_error(started.error().description.value_or("it was not started"));
@@ -57,7 +58,6 @@ private:
     }
 
     ZPJobClient jobs_;
-    std::string identifier_;
 };
 
 // The same program, and nothing done for anybody's safety.

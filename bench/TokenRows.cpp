@@ -17,7 +17,6 @@ namespace bench {
 namespace {
 
 using Clock = std::chrono::steady_clock;
-using e2e::Item;
 
 constexpr std::size_t window = 64;
 
