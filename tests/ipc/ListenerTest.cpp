@@ -120,6 +120,31 @@ TEST_F(ListenerTest, WhatAClientSendsAlongHoldsNobodyUp) {
     EXPECT_FALSE(client.greeting.empty());
 }
 
+TEST_F(ListenerTest, WhatIsOnItsWayToAClientThatGoesHoldsNobodyUp) {
+    LingeringSocket socket;
+    std::array<int, 2> ends{};
+    ASSERT_EQ(::socketpair(AF_UNIX, SOCK_STREAM, 0, ends.data()), 0);
+    socket.sendThrough(UniqueFd(ends[0]).get());
+    ASSERT_TRUE(socket.sent);
+    auto passed = std::make_shared<const UniqueFd>(ends[1]);
+    EchoServer server(folder_ / "service", {}, [&](Connection& connection, const Message& message) {
+        Reply first = createReply(message);
+        first.body.set("data", Data{SharedBytes(std::string(4'000'000, 'x'))}); // which has to wait
+        connection.send(first);
+        Reply second = createReply(message);
+        second.descriptor = std::move(passed);
+        connection.send(second);
+    });
+    {
+        RawClient client(folder_ / "service");
+        ASSERT_TRUE(client.write(request(1, Dictionary{})));
+        ASSERT_TRUE(server.requests.reaches(1));
+        server.queue().sync([] {}); // both wait in the connection now
+    }
+    ASSERT_TRUE(server.gone.reaches(1));
+    EXPECT_FALSE(RawClient(folder_ / "service").greeting.empty());
+}
+
 TEST_F(ListenerTest, AWaitForADroppedSocketIsBroken) {
     using namespace std::chrono;
     std::array<int, 2> ends{};
