@@ -34,6 +34,11 @@ void logEvent(const ClientConnection::Event& event) {
     ZPDLogOps().error("Communications error: %{public}@", text);
 }
 
+bool isInterruption(const ClientConnection::Event& event) {
+    const auto* const error = std::get_if<platform::ipc::ConnectionError>(&event);
+    return error && *error == platform::ipc::ConnectionError::interrupted;
+}
+
 // REQUIRES: on the reply queue.
 void deliver(ZPDaemonClient::ReplyBlock& block, const ZPDaemonClient::Reply& reply) {
     const auto& traffic = ZPDLogTraffic();
@@ -54,12 +59,26 @@ std::optional<Value> converted(std::uint64_t version, Convert&& convert) {
 
 ZPDaemonClient::ZPDaemonClient(std::optional<std::string> serviceName)
     : replyQueue_(std::make_shared<platform::SerialQueue>("zpd_client")),
+      events_(std::make_shared<Events>()),
       zpd_(std::make_unique<ClientConnection>(socketPath(serviceName), replyQueue_)) {
-    zpd_->setEventHandler([](const ClientConnection::Event& event) { logEvent(event); });
+    zpd_->setEventHandler([its = events_](const ClientConnection::Event& event) {
+        if (its->letGo)
+            return;
+        logEvent(event);
+        if (isInterruption(event) && its->interruption)
+            its->interruption();
+    });
     zpd_->resume();
 }
 
-ZPDaemonClient::~ZPDaemonClient() = default;
+// The end of its own connection is nothing to report.
+ZPDaemonClient::~ZPDaemonClient() {
+    events_->letGo = true;
+}
+
+void ZPDaemonClient::setInterruptionBlock(std::function<void()> block) {
+    replyQueue_->sync([&] { events_->interruption = std::move(block); });
+}
 
 void ZPDaemonClient::send(const Dictionary& message, ReplyBlock reply) {
     ZPDLogTraffic().debug("request: %@", message);

@@ -56,6 +56,11 @@ public:
     ZPDaemonClient& operator=(const ZPDaemonClient&) = delete;
     ~ZPDaemonClient();
 
+    // What to do each time the daemon went away while this was connected to it: with it went what
+    // it kept for this process, which are holds, what was made ready, and tokens. Called on
+    // "zpd_client", before the answers to what was pending. Replaces the block before.
+    void setInterruptionBlock(std::function<void()> block);
+
     // The version that every request carries.
     [[nodiscard]] std::int64_t protocolVersion() const noexcept { return protocolVersion_; }
 
@@ -115,6 +120,15 @@ public:
 
 private:
     const std::shared_ptr<platform::SerialQueue> replyQueue_;
+
+    // What the connection's events come to, also those that come after the end. Its block is
+    // changed and called on the reply queue.
+    struct Events {
+        std::atomic<bool> letGo = false;
+        std::function<void()> interruption;
+    };
+
+    const std::shared_ptr<Events> events_;
     std::atomic<std::int64_t> protocolVersion_ = currentProtocolVersion;
     const std::unique_ptr<platform::ipc::ClientConnection> zpd_;
 };
