@@ -216,6 +216,8 @@ std::string describe(const ChildFailure& failure) {
                                       "it is a script, and only programs are launched",
                                       "it was ended before it ran"};
     const auto step = static_cast<std::size_t>(failure.step);
-    return std::string(step < steps.size() ? steps[step] : "it cannot be launched") + ": " +
-           std::strerror(failure.error);
+    const std::string what = step < steps.size() ? steps[step] : "it cannot be launched";
+    if (failure.step == ChildStep::script)
+        return what; // what the kernel says is of the interpreter
+    return what + ": " + std::strerror(failure.error);
 }

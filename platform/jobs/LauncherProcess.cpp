@@ -49,7 +49,8 @@ Launcher::Id LauncherProcess::launch(Launch launch, StartedBlock started, EndedB
     Impl& impl = *impl_;
     assert(impl.loop.isCurrent());
     const Id id = ++impl.lastId;
-    impl.instances.emplace(id, Impl::Instance{std::move(started), std::move(ended)});
+    impl.instances.emplace(id, Impl::Instance{std::move(started), std::move(ended),
+                                              launch.path.substr(launch.path.rfind('/') + 1)});
     const Dictionary message = launcher::encode(launcher::Launch{
         id, std::move(launch.path), std::move(launch.environment), std::move(launch.confinement)});
     if (!launch.executable || !launch.socket || !launcher::decodeOrder(message)) {

@@ -25,7 +25,8 @@ struct LauncherProcess::Impl : std::enable_shared_from_this<Impl> {
     struct Instance {
         StartedBlock started; // empty once called
         EndedBlock ended;
-        UniqueFd process; // pidfd; empty until it was made
+        std::string program; // the executable's file name, for log lines
+        UniqueFd process;    // pidfd; empty until it was made
         pid_t pid = 0;
     };
 

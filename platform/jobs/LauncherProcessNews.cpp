@@ -1,4 +1,6 @@
+#include <csignal>
 #include <fcntl.h>
+#include <string>
 #include <sys/wait.h>
 
 #include "platform/jobs/LauncherProcessImpl.h"
@@ -55,17 +57,29 @@ bool LauncherProcess::Impl::failed(launcher::Failed failed) {
     return true;
 }
 
+namespace {
+
+// How a process ended. Nobody else tells the plug-in's author, so what is no usual end is written
+// also when little is.
+void tellOfEnd(pid_t pid, const std::string& program, int status) {
+    const bool bySignal = WIFSIGNALED(status);
+    const int number = bySignal ? WTERMSIG(status) : WEXITSTATUS(status);
+    const bool asUsual = bySignal ? number == SIGTERM || number == SIGKILL : number == 0;
+    const char* const what = bySignal ? "signal" : "status";
+    constexpr const char* text = "process %{public}d (%{public}@) is gone: %{public}@ %{public}d";
+    if (asUsual)
+        launcherLog().info(text, pid, program, what, number);
+    else
+        launcherLog().standard(text, pid, program, what, number);
+}
+
+} // namespace
+
 bool LauncherProcess::Impl::gone(const launcher::Gone& gone) {
     const auto place = instances.find(gone.id);
     if (place == instances.end() || place->second.started)
         return false;
-    const int status = gone.status;
-    if (WIFSIGNALED(status))
-        launcherLog().info("process %{public}d is gone: signal %{public}d", place->second.pid,
-                           WTERMSIG(status));
-    else
-        launcherLog().info("process %{public}d is gone: status %{public}d", place->second.pid,
-                           WEXITSTATUS(status));
+    tellOfEnd(place->second.pid, place->second.program, gone.status);
     finish(gone.id, {});
     return true;
 }
