@@ -8,6 +8,7 @@
 
 #include "platform/file/FileGlance.h"
 #include "platform/ipc/Loop.h"
+#include "platform/jobs/JobLog.h"
 #include "platform/queue/SerialQueue.h"
 
 namespace platform {
@@ -41,7 +42,16 @@ JobManager::~JobManager() = default;
 
 int JobManager::addExternalService(const std::shared_ptr<const ipc::Peer>& host,
                                    const ExternalService& service, const Dictionary& overlay) {
-    auto made = JobService::create(service, overlay);
+    const int error = addMade(host, JobService::create(service, overlay));
+    if (error != 0)
+        jobLog().error("plug-in %{public}@ cannot be made ready for process %{public}d: "
+                       "%{errno}d (%@)",
+                       service.identifier, host->pid, error, service.executable);
+    return error;
+}
+
+int JobManager::addMade(const std::shared_ptr<const ipc::Peer>& host,
+                        std::expected<std::shared_ptr<const JobService>, int> made) {
     if (!made)
         return made.error();
     const std::lock_guard lock(mutex_);

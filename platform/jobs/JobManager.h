@@ -102,6 +102,8 @@ public:
 private:
     using Number = std::uint64_t; // of an instance, in their order
 
+    [[nodiscard]] int addMade(const std::shared_ptr<const ipc::Peer>& host,
+                              std::expected<std::shared_ptr<const JobService>, int> made);
     [[nodiscard]] std::unique_ptr<ipc::Watch> watch(const JobHost& host);
     void hostExited(const std::shared_ptr<const ipc::Peer>& host);
     void end(const std::vector<Number>& instances);
