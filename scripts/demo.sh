@@ -163,6 +163,7 @@ stop_talk() {
 # start_hold PATH: a hold until it is stopped; its token is in $token.
 start_hold() {
     echo "\$ zpctl hold $1 &"
+    : >"$home/hold"
     zpctl hold "$1" >"$home/hold" 2>&1 &
     hold=$!
     eventually grep -qF token "$home/hold" || fail "no hold"

@@ -4,8 +4,6 @@
 #include <future>
 #include <memory>
 
-#include "Zephrin/ZPDaemonClient.h"
-
 namespace example {
 
 namespace {
@@ -40,18 +38,17 @@ std::vector<ZPPlugInCore::Ptr> recordsOf(const ZPDaemonClient& client, const Dic
 } // namespace
 
 std::expected<std::vector<ZPPlugInCore::Ptr>, std::string>
-plugInsAt(const std::string& extensionPoint) {
-    ZPDaemonClient client;
+plugInsAt(ZPDaemonClient& daemon, const std::string& extensionPoint) {
     const auto arrived = std::make_shared<std::promise<Reply>>();
     auto arrival = arrived->get_future();
-    client.matchPlugIns(rulesFor(extensionPoint), 0,
+    daemon.matchPlugIns(rulesFor(extensionPoint), 0,
                         [arrived](const Reply& reply) { arrived->set_value(reply); });
     if (arrival.wait_for(patience) != std::future_status::ready)
         return std::unexpected("the daemon does not answer");
     const Reply reply = arrival.get();
     if (const auto error = ZPDaemonClient::errorInReply(reply))
         return std::unexpected(error->description.value_or("the daemon gave no reason"));
-    return recordsOf(client, *reply);
+    return recordsOf(daemon, *reply);
 }
 
 } // namespace example

@@ -4,6 +4,7 @@
 #include <string>
 #include <vector>
 
+#include "Zephrin/ZPDaemonClient.h"
 #include "Zephrin/ZPPlugInCore.h"
 
 namespace example {
@@ -12,6 +13,6 @@ namespace example {
 // identifier stands for all extension points. Waits for the daemon, a few seconds at most. The
 // other side of the result is a text for people.
 [[nodiscard]] std::expected<std::vector<ZPPlugInCore::Ptr>, std::string>
-plugInsAt(const std::string& extensionPoint);
+plugInsAt(ZPDaemonClient& daemon, const std::string& extensionPoint);
 
 } // namespace example

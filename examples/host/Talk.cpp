@@ -10,7 +10,6 @@
 #include <sys/stat.h>
 #include <utility>
 
-#include "Zephrin/ZPDaemonClient.h"
 #include "Zephrin/ZPJobClient.h"
 #include "Zephrin/ZPSandboxExtension.h"
 
@@ -48,8 +47,7 @@ std::expected<Dictionary, std::string> succeeded(const std::optional<Reply>& rep
     return **reply;
 }
 
-std::expected<UniqueFd, std::string> started(const ZPPlugInCore& plugIn) {
-    ZPDaemonClient daemon;
+std::expected<UniqueFd, std::string> started(ZPDaemonClient& daemon, const ZPPlugInCore& plugIn) {
     const auto ready = succeeded(awaited<Reply>([&](auto block) {
         daemon.readyPlugIns({{plugIn.path(), plugIn.uuid()}}, 0, std::nullopt, std::move(block));
     }));
@@ -87,8 +85,9 @@ bool say(const UniqueFd& socket, const std::string& line) {
 } // namespace
 
 std::expected<std::vector<std::string>, std::string>
-talkWith(const ZPPlugInCore& plugIn, const std::vector<std::string>& lines) {
-    const auto socket = started(plugIn);
+talkWith(ZPDaemonClient& daemon, const ZPPlugInCore& plugIn,
+         const std::vector<std::string>& lines) {
+    const auto socket = started(daemon, plugIn);
     if (!socket)
         return std::unexpected(socket.error());
     std::vector<std::string> answers;
@@ -101,9 +100,8 @@ talkWith(const ZPPlugInCore& plugIn, const std::vector<std::string>& lines) {
     return answers;
 }
 
-std::expected<std::size_t, std::string> sizeByToken(const ZPPlugInCore& plugIn,
-                                                    const std::string& file) {
-    ZPDaemonClient daemon;
+std::expected<std::size_t, std::string>
+sizeByToken(ZPDaemonClient& daemon, const ZPPlugInCore& plugIn, const std::string& file) {
     const auto reply = succeeded(awaited<Reply>([&](auto block) {
         daemon.accessPlugIns({{plugIn.path(), plugIn.uuid()}}, 0, std::move(block));
     }));

@@ -31,13 +31,14 @@ void print(const std::vector<ZPPlugInCore::Ptr>& plugIns) {
     std::cout << plugIns.size() << (plugIns.size() == 1 ? " plug-in\n" : " plug-ins\n");
 }
 
-int talk(const ZPPlugInCore& plugIn, const std::vector<std::string>& lines) {
-    const auto answers = example::talkWith(plugIn, lines);
+int talk(ZPDaemonClient& daemon, const ZPPlugInCore& plugIn,
+         const std::vector<std::string>& lines) {
+    const auto answers = example::talkWith(daemon, plugIn, lines);
     if (!answers)
         return complain(answers.error());
     for (const std::string& answer : *answers)
         std::cout << plugIn.identifier() << ": " << answer << '\n';
-    const auto size = example::sizeByToken(plugIn, "Info.plist");
+    const auto size = example::sizeByToken(daemon, plugIn, "Info.plist");
     if (!size)
         return complain(size.error());
     std::cout << "its Info.plist has " << *size << " bytes, as read by token\n";
@@ -47,7 +48,8 @@ int talk(const ZPPlugInCore& plugIn, const std::vector<std::string>& lines) {
 } // namespace
 
 int main(int argc, char** argv) {
-    const auto plugIns = example::plugInsAt(argc > 1 ? argv[1] : "");
+    ZPDaemonClient daemon;
+    const auto plugIns = example::plugInsAt(daemon, argc > 1 ? argv[1] : "");
     if (!plugIns)
         return complain(plugIns.error());
     if (argc <= 2)
@@ -55,5 +57,5 @@ int main(int argc, char** argv) {
     else if (plugIns->empty())
         return complain("no plug-in to talk to");
     else
-        return talk(*plugIns->front(), std::vector<std::string>(argv + 2, argv + argc));
+        return talk(daemon, *plugIns->front(), std::vector<std::string>(argv + 2, argv + argc));
 }
