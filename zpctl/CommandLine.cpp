@@ -52,8 +52,10 @@ std::string whatIsWrong(const CLI::App& app, const CLI::Error& error) {
 }
 
 std::string failureText(const CLI::App* app, const CLI::Error& error) {
-    return "zpctl: " + printable(whatIsWrong(*app, error)) +
-           "\nzpctl --help tells how it is used.\n";
+    const auto verbs = app->get_subcommands();
+    const std::string verb = verbs.empty() ? "" : " " + verbs.front()->get_name();
+    return "zpctl: " + printable(whatIsWrong(*app, error)) + "\nzpctl" + verb +
+           " --help tells how it is used.\n";
 }
 
 // Where the verb stands among the arguments, after the options before it.
@@ -66,7 +68,8 @@ std::size_t verbIn(const std::vector<std::string>& arguments) {
     return at;
 }
 
-// Takes the command off that stands after the first "--" of a verb that is to run one.
+// Takes the command off that stands after the first "--" of a verb that is to run one. Throws
+// CLI::ParseError when there is none: a script's variable was empty.
 std::vector<std::string> takeCommand(std::vector<std::string>& arguments) {
     const std::size_t at = verbIn(arguments);
     const auto takes = [&](const Verb& verb) {
@@ -76,6 +79,8 @@ std::vector<std::string> takeCommand(std::vector<std::string>& arguments) {
     if (std::ranges::none_of(verbs(), takes) || mark == arguments.end())
         return {};
     std::vector<std::string> command(mark + 1, arguments.end());
+    if (command.empty())
+        throw CLI::ValidationError(arguments[at], "no COMMAND after \"--\"");
     arguments.erase(mark, arguments.end());
     return command;
 }

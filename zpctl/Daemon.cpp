@@ -3,6 +3,8 @@
 #include <cstdio>
 #include <future>
 #include <memory>
+#include <poll.h>
+#include <sys/eventfd.h>
 #include <utility>
 
 #include "Zephrin/FileURL.h"
@@ -76,7 +78,17 @@ Failure unreadable(const char* what) {
 } // namespace
 
 Daemon::Daemon(const std::optional<std::string>& serviceName, std::chrono::milliseconds timeout)
-    : client_(serviceName), socketPath_(socketPathOf(serviceName)), timeout_(timeout) {}
+    : ended_(std::make_shared<platform::UniqueFd>(::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK))),
+      client_(serviceName),
+      socketPath_(socketPathOf(serviceName)),
+      timeout_(timeout) {
+    client_.setInterruptionBlock([ended = ended_] { (void)::eventfd_write(ended->get(), 1); });
+}
+
+bool Daemon::hasEnded() const {
+    ::pollfd watched = {ended(), POLLIN, 0};
+    return ::poll(&watched, 1, 0) > 0;
+}
 
 std::expected<Dictionary, Failure> Daemon::ask(const Request& request) {
     // Shared, because the reply may still come when nobody waits for it any more.

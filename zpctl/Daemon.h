@@ -4,11 +4,13 @@
 #include <cstdint>
 #include <expected>
 #include <functional>
+#include <memory>
 #include <optional>
 #include <string>
 #include <vector>
 
 #include "Zephrin/ZPDaemonClient.h"
+#include "platform/file/File.h"
 #include "platform/value/Value.h"
 #include "zpctl/Verb.h"
 
@@ -62,6 +64,12 @@ public:
                                                               std::uint64_t flags);
     [[nodiscard]] std::optional<Failure> release(const platform::Uuid& token);
 
+    // A descriptor that is readable once the daemon has ended since the first request, even when it
+    // is there again: holds ended with it.
+    [[nodiscard]] int ended() const { return ended_->get(); }
+
+    [[nodiscard]] bool hasEnded() const;
+
     // Bits of the flags of `hold`.
     static constexpr std::uint64_t holdPlugIns = 1; // the paths are of plug-ins, not applications
     static constexpr std::uint64_t holdUnlessBusy = 2;
@@ -76,6 +84,7 @@ private:
     [[nodiscard]] std::expected<platform::Value, Failure> askForMatches(const Request& request);
     [[nodiscard]] std::expected<platform::Dictionary, Failure> askForForm(const Request& request);
 
+    const std::shared_ptr<platform::UniqueFd> ended_; // counts; the client's block has it too
     ZPDaemonClient client_;
     const std::string socketPath_; // for messages
     const std::chrono::milliseconds timeout_;

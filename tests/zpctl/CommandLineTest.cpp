@@ -72,6 +72,7 @@ TEST_F(CommandLine, RefusesWrongUsage) {
         {"access", "--env", "A=B", uuid},
         {"hold", "--app"},
         {"hold", "--", "true"},
+        {"hold", "/x", "--"}, // which would hold until it is interrupted
         {"release", "x"},
         {"run", uuid, uuid},
         {"ps", "x"},

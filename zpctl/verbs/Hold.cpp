@@ -23,10 +23,15 @@ namespace zpctl {
 namespace {
 
 constexpr const char* aboutHolding =
-    R"(While the hold lasts nobody is offered these plug-ins, and nobody gets them ready. It lasts while
+    R"(zpctl hold [OPTIONS] PATH... [-- COMMAND [ARGUMENT...]]
+
+While the hold lasts nobody is offered these plug-ins, and nobody gets them ready. It lasts while
 COMMAND runs, whose exit status becomes zpctl's; without one until zpctl is interrupted or told to
-terminate. "release", with the token that is written when the hold is placed, ends it early, and so
-does the daemon's end.
+terminate. "release", with the token that is written when the hold is placed, ends it early.
+
+The daemon's end ends the hold too, also when it is started again at once. Without COMMAND zpctl says
+so and ends with status 3; else COMMAND goes on, and zpctl says so when it has ended. A zpctl that is
+killed (SIGKILL) lets the hold go, and COMMAND goes on.
 
 Each PATH is the folder of a plug-in, or with --app of an application: then all plug-ins in it are
 held. Without --terminate, what runs goes on, and what hosts made ready before can still be started. A
@@ -72,9 +77,11 @@ void tell(const platform::Uuid& token, const std::vector<std::string>& paths,
     session.out().flush();
 }
 
-void waitForTheEnd(const EndingSignals& signals, const Session& session) {
-    // Errors only of the second: nobody reads any more.
-    ::pollfd watched[] = {{signals.descriptor(), POLLIN, 0}, {session.outDescriptor(), 0, 0}};
+void waitForTheEnd(const EndingSignals& signals, Session& session) {
+    // Errors only of the last: nobody reads any more.
+    ::pollfd watched[] = {{signals.descriptor(), POLLIN, 0},
+                          {session.daemon().ended(), POLLIN, 0},
+                          {session.outDescriptor(), 0, 0}};
     while (::poll(watched, std::size(watched), -1) < 0 && errno == EINTR) {}
 }
 
@@ -86,6 +93,21 @@ Status runCommand(const EndingSignals& signals, const Session& session) {
     return session.fail({Status(error == ENOENT ? commandNotFound : commandNotRun),
                          session.command().front() + ": " + std::generic_category().message(error),
                          {}});
+}
+
+constexpr const char* lostText = "the daemon ended, and the hold with it";
+
+// At the end of the hold. What ran while there was none is told; its exit status stays its own.
+Status letGo(const platform::Uuid& token, Status status, Session& session) {
+    const auto failure = session.daemon().release(token);
+    const bool lost = session.daemon().hasEnded();
+    if (lost && session.command().empty() && status == Status::done)
+        return session.fail({Status::noDaemon, lostText, {}});
+    if (lost)
+        session.note(lostText);
+    else if (failure)
+        session.note("cannot release the hold: " + failure->message);
+    return status;
 }
 
 Status hold(const Arguments& arguments, Session& session) {
@@ -105,9 +127,7 @@ Status hold(const Arguments& arguments, Session& session) {
     } else {
         status = runCommand(signals, session);
     }
-    if (const auto failure = session.daemon().release(*token))
-        session.note("the hold had ended before: " + failure->message);
-    return status;
+    return letGo(*token, status, session);
 }
 
 Status release(const std::string& token, Session& session) {
