@@ -36,7 +36,7 @@ Relay::End Relay::run() {
         if (watched[3].revents != 0)
             return End::interrupted;
         if (!carry(watched[0].revents, watched[1].revents, watched[2].revents))
-            return End::unread;
+            return writeError_ == 0 || writeError_ == EPIPE ? End::unread : End::unwritable;
     }
     return End::hungUp;
 }
@@ -94,8 +94,10 @@ void Relay::readSocket() {
 bool Relay::writeOutput() {
     const ssize_t size =
         ::write(ends_.output, toOutput_.data(), std::min(toOutput_.size(), largestWrite));
-    if (size < 0)
-        return isForNow(errno);
+    if (size < 0) {
+        writeError_ = isForNow(errno) ? 0 : errno;
+        return writeError_ == 0;
+    }
     toOutput_.erase(0, static_cast<std::size_t>(size));
     return true;
 }

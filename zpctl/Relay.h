@@ -13,6 +13,7 @@ public:
         hungUp,      // the other side; all that it said is written
         interrupted, // `ending` became readable
         unread,      // nobody takes the output any more
+        unwritable,  // writing it failed: `writeError`
     };
 
     struct Ends {
@@ -26,6 +27,9 @@ public:
 
     // Until one of these. Never waits for one of the ends alone.
     [[nodiscard]] End run();
+
+    // The errno of the write that failed.
+    [[nodiscard]] int writeError() const { return writeError_; }
 
 private:
     [[nodiscard]] bool carry(short input, short output, short socket);
@@ -41,6 +45,7 @@ private:
     bool inputOpen_ = true;    // more may come from it
     bool socketTakes_ = true;  // it was not half-closed yet
     bool socketSpeaks_ = true; // more may come from it
+    int writeError_ = 0;
 };
 
 } // namespace zpctl

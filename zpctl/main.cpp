@@ -3,6 +3,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <exception>
+#include <fcntl.h>
 #include <iostream>
 #include <langinfo.h>
 #include <string>
@@ -30,9 +31,19 @@ void configureLog() {
         platform::log::silence();
 }
 
+// Whoever starts zpctl with one of the standard descriptors closed must not get a socket there.
+// What stands in for it fails like a closed one: each is open the wrong way round.
+void fillStandardDescriptors() {
+    for (int fd = STDIN_FILENO; fd <= STDERR_FILENO; ++fd) {
+        if (::fcntl(fd, F_GETFD) < 0)
+            (void)::open("/dev/null", fd == STDIN_FILENO ? O_WRONLY : O_RDONLY);
+    }
+}
+
 } // namespace
 
 int main(int argc, char** argv) {
+    fillStandardDescriptors();
     std::setlocale(LC_CTYPE, "");
     configureLog();
     const zpctl::Terminal terminal{.out = std::cout,

@@ -177,6 +177,20 @@ TEST_F(Tool, RunsAPlugInUntilItHangsUp) {
                 testing::StartsWith("1 zpctl: Transmission of environment variables requires the"));
     EXPECT_THAT(run({"access", uuid}), HasSubstr(uuid + "  zsx1;"));
 
+    const int full = ::open("/dev/full", O_WRONLY | O_CLOEXEC);
+    Program unwritten = begin({"run", uuid}, full);
+    EXPECT_EQ(unwritten.exitStatus(), 1);
+    EXPECT_EQ(unwritten.errors(), "zpctl: standard output: No space left on device\n");
+    ::close(full);
+    const std::string withoutOutput = "exec \"$0\" --service e2e run \"$1\" >&-";
+    Program closed({.command = {"/bin/sh", "-c", withoutOutput, builtProgram("zpctl"), uuid},
+                    .settings = {{"ZEPHRIN_HOME", home.path()}},
+                    .errorFile = home / "closed",
+                    .inputFile = input,
+                    .outputFile = home / "output"});
+    EXPECT_EQ(closed.exitStatus(), 1) << "no socket takes its place";
+    EXPECT_EQ(closed.errors(), "zpctl: standard output: Bad file descriptor\n");
+
     fs::remove(input);
     ASSERT_EQ(::mkfifo(input.c_str(), 0600), 0);
     const int silent = ::open(input.c_str(), O_RDWR | O_CLOEXEC);
@@ -229,6 +243,25 @@ TEST_F(Tool, HoldsWhileACommandRuns) {
     EXPECT_EQ(run({"ready", uuid}), "0 " + uuid + " can be launched\n");
     hold.signal(SIGINT);
     EXPECT_EQ(hold.exitStatus(), 0);
+}
+
+TEST_F(Tool, SaysThatAHoldEndedWithTheDaemon) {
+    (void)addTalker();
+    Program idle = begin({"hold", talker});
+    ASSERT_TRUE(eventually([&] { return output().ends_with(talker + "\n"); }));
+    kill();
+    EXPECT_EQ(idle.exitStatus(), 3);
+    EXPECT_EQ(idle.errors(), "zpctl: the daemon ended, and the hold with it\n");
+    start();
+    const std::string mark = home / "mark";
+    Program busy = begin({"hold", talker, "--", "sh", "-c",
+                          "echo on; until [ -e \"$0\" ]; do sleep 0.05; done; exit 5", mark});
+    ASSERT_TRUE(eventually([&] { return output() == "on\n"; }));
+    kill();
+    start(); // which knows nothing of the hold
+    writeFile(mark, "");
+    EXPECT_EQ(busy.exitStatus(), 5);
+    EXPECT_EQ(busy.errors(), "zpctl: note: the daemon ended, and the hold with it\n");
 }
 
 } // namespace

@@ -1,8 +1,10 @@
 // "run": a plug-in made ready, started, and talked to over standard input and output.
 
+#include <csignal>
 #include <memory>
 #include <ostream>
 #include <string>
+#include <system_error>
 #include <unistd.h>
 #include <vector>
 
@@ -22,9 +24,13 @@ namespace {
 constexpr const char* explanation =
     R"(Makes the plug-in ready, starts it in its sandbox as this process's own, and connects standard
 input and output to its socket. The end of the input half-closes the socket. Ends with status 0 when
-the plug-in has hung up, and all that it said is written; interrupted with 128 and the number of the
-signal, which ends the plug-in too. To give an environment needs the entitlement
-com.tovana.developer.zephrin.provide-environment.
+the plug-in has hung up, and all that it said is written or nobody reads it any more; with 1 when it
+cannot be written; interrupted with 128 and the number of the signal, which ends the plug-in too.
+
+A host does not learn how its plug-in ended, so neither does this: also one that crashes, or ends at
+once as a library is missing, is status 0. The daemon's log tells ("process ... is gone").
+
+To give an environment needs the entitlement com.tovana.developer.zephrin.provide-environment.
 
 Examples:
   echo co | zpctl run 2B4F0C52-5B8B-4C5B-9B0B-0F6C1B7C9E11
@@ -39,21 +45,35 @@ struct Arguments {
     std::vector<std::string> variables;
 };
 
-Status talk(const platform::UniqueFd& socket, const EndingSignals& signals) {
-    const auto end = Relay({STDIN_FILENO, STDOUT_FILENO, socket.get(), signals.descriptor()}).run();
-    return end == Relay::End::interrupted ? Status(signalBase + signals.take()) : Status::done;
+Status talk(const platform::UniqueFd& socket, const EndingSignals& signals,
+            const Session& session) {
+    Relay relay({STDIN_FILENO, STDOUT_FILENO, socket.get(), signals.descriptor()});
+    switch (relay.run()) {
+    case Relay::End::interrupted:
+        return Status(signalBase + signals.take());
+    case Relay::End::unwritable:
+        return session.fail(
+            {Status::refused,
+             "standard output: " + std::generic_category().message(relay.writeError()),
+             {}});
+    case Relay::End::hungUp:
+    case Relay::End::unread:
+        break;
+    }
+    return Status::done;
 }
 
 Status run(const Arguments& arguments, Session& session) {
     const auto uuid = platform::Uuid::parse(arguments.uuid).value();
     const EndingSignals signals;
+    std::signal(SIGPIPE, SIG_IGN); // a reader that is gone is no failure, however that is found out
     const auto environment = environmentOf(arguments.variables);
     if (const auto failure = session.daemon().ready({uuid}, environment))
         return session.fail(*failure);
     const auto socket = session.jobs().start(uuid);
     if (!socket)
         return session.fail(socket.error());
-    return talk(*socket, signals);
+    return talk(*socket, signals, session);
 }
 
 } // namespace
