@@ -1,5 +1,7 @@
 // "consent": what the user agreed to, for each application. Needs no daemon.
 
+#include "platform/consent/Consent.h"
+
 #include <algorithm>
 #include <memory>
 #include <ostream>
@@ -29,7 +31,8 @@ revoke write down what the user said; list shows it, for one application or for 
 looks at it whenever a plug-in of the application is made ready: what runs already goes on as it
 is. No daemon is needed.
 
-kConsentServiceKeyboardNetwork lets a keyboard that has RequestsOpenAccess use the network.
+kConsentServiceKeyboardNetwork lets a keyboard that has RequestsOpenAccess use the network. It is the
+only service; another name is written down all the same, with a note on standard error.
 
 Examples:
   zpctl consent grant com.example.keys kConsentServiceKeyboardNetwork
@@ -70,6 +73,8 @@ const char* wordFor(const ConsentFile::Record& record) {
 Status set(const ConsentFile& file, const ConsentFile::Record& record, const Session& session) {
     if (const auto failure = file.record(record))
         return session.fail({Status::refused, *failure, {}});
+    if (record.service != platform::kConsentServiceKeyboardNetwork)
+        session.note("nothing asks for a service of this name: " + record.service);
     return session.report(asJson(record), [&] {
         session.out() << printable(record.service + " is " + wordFor(record) + " to " +
                                    record.application)

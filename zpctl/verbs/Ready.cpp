@@ -18,9 +18,10 @@ namespace zpctl {
 namespace {
 
 constexpr const char* aboutReady =
-    R"(Tells whether this client may use the plug-ins and whether they can be launched: they are made
-ready for it, all of them or none. What was made ready goes with the process, so with zpctl as soon as
-it ends: "run" makes ready and starts. To give an environment needs the entitlement
+    R"(Tells whether this client may use the plug-ins and whether they have an executable: they are made
+ready for it, once all were found to be allowed. What is in the executable shows when it is started:
+scripts cannot be. What was made ready goes with the process, so with zpctl as soon as it ends: "run"
+makes ready and starts. To give an environment needs the entitlement
 com.tovana.developer.zephrin.provide-environment.
 
 Examples:
