@@ -11,7 +11,7 @@ struct Limits {
     std::size_t waitingRequests = 256;         // of a connection
     std::size_t waitingBytes = 16U << 20;      // of a connection; memory of the values included
     std::size_t userWaitingBytes = 64U << 20;  // of all connections of a user id
-    std::size_t userConnections = 1024;        // or a quarter of the descriptor limit
+    std::size_t userConnections = 1024;        // or what a quarter of the descriptors allows
     int room = 0;                              // bytes of a socket for replies; 0: as usual
     std::chrono::milliseconds stalled{30'000}; // without progress of what is to be written
 };

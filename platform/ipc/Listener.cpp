@@ -24,6 +24,8 @@ namespace platform::ipc {
 namespace {
 
 constexpr int acceptsPerTurn = 16;
+// Of a connection: its socket, the process twice, the file that it runs.
+constexpr std::size_t descriptorsEach = 4;
 constexpr std::chrono::milliseconds pauseWithoutDescriptors{100};
 
 std::size_t descriptorLimit() {
@@ -48,7 +50,8 @@ struct Listener::Impl final : SocketWatch::Target, std::enable_shared_from_this<
           service(std::move(itsSocket)),
           handler(std::move(itsHandler)),
           limits(itsLimits),
-          mostUserConnections(std::min(limits.userConnections, descriptorLimit() / 4)),
+          mostUserConnections(
+              std::min(limits.userConnections, descriptorLimit() / 4 / descriptorsEach)),
           highestDescriptor(descriptorLimit() - descriptorLimit() / 8),
           accounts(limits.userWaitingBytes) {}
 

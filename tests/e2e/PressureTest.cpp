@@ -93,8 +93,8 @@ TEST(Pressure, FiveHundredConnectionsAreServed) {
 
 TEST(Pressure, ConnectionsBeyondTheUsersShareAreClosedAtOnce) {
     const Home home;
-    // A quarter of the descriptors is this user's.
-    Daemon daemon(home.path(), {.logLevel = "default", .descriptors = 512});
+    // A quarter of the descriptors is this user's, and a connection takes four.
+    Daemon daemon(home.path(), {.logLevel = "default", .descriptors = 2048});
     std::vector<WireClient> clients;
     std::size_t refused = 0;
     for (int i = 0; i < 134; ++i) {
