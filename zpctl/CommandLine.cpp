@@ -19,7 +19,8 @@ NO_COLOR is set. Characters that could disturb a terminal are shown as \u{HEX}.
 
 --json output is for programs and stays as it is: dictionaries and arrays as JSON has them, dates
 as text in UTC ("2026-11-22T22:07:54Z"), data as Base64 text, UUIDs in upper case, characters that
-are not ASCII as \uXXXX. With it an error is {"error": {"message": ..., "code": ...}}.
+are not ASCII as \uXXXX. With it an error is {"error": {"message": ..., "code": ...}}; wrong usage and
+notes are told in words all the same.
 
 Exit status:
   0  done
