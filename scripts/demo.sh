@@ -398,11 +398,12 @@ run 0 zpctl match HXUserElection=1
 shows com.example.subtitle-shifter 2.3 elected '1 plug-in'
 hides "$subtitles"
 
-title "A new version over it, in one step: nobody ever sees half of one"
+title "A new version over it, in one step, while none of its plug-ins runs or can be started"
 cp -R "$build/examples/Applications/Cinema.app" "$home/Cinema.app"
 sed -i 's/>4\.2</>4.3</' "$home/Cinema.app/Info.plist"
 sed -i 's/>2\.3</>2.4</' "$home/Cinema.app/PlugIns/Subtitles.appex/Info.plist"
-run 0 zpctl install "$home/Cinema.app"
+run 0 zpctl hold --app --terminate "$ZEPHRIN_HOME/Applications/Cinema.app" -- \
+    zpctl install "$home/Cinema.app"
 shows 'com.example.cinema 4.3' 'in place of com.example.cinema 4.2'
 eventually tells 2.4 zpctl match HXExtensionIdentifier=com.example.subtitle-shifter || true
 run 0 zpctl match --flags 1 HXExtensionIdentifier=com.example.subtitle-shifter
