@@ -34,7 +34,8 @@ const log::Category& launcherLog() {
 LauncherProcess::LauncherProcess(ipc::Loop& loop, std::string program)
     : impl_(std::make_shared<Impl>(loop, std::move(program))) {
     ::prctl(PR_SET_CHILD_SUBREAPER, 1);
-    impl_->startLauncher();
+    // As soon as the loop runs, and so beside what else the program does when it starts.
+    loop.post(impl_->guarded([](Impl& self) { self.startLauncher(); }));
 }
 
 LauncherProcess::~LauncherProcess() {
