@@ -34,8 +34,9 @@ const log::Category& launcherLog() {
 LauncherProcess::LauncherProcess(ipc::Loop& loop, std::string program)
     : impl_(std::make_shared<Impl>(loop, std::move(program))) {
     ::prctl(PR_SET_CHILD_SUBREAPER, 1);
-    // As soon as the loop runs, and so beside what else the program does when it starts.
-    loop.post(impl_->guarded([](Impl& self) { self.startLauncher(); }));
+    // Right now, before this process has locks and sockets: one that is being started has them too
+    // until it runs its program, and who follows this process would find them in use.
+    impl_->startLauncher();
 }
 
 LauncherProcess::~LauncherProcess() {
